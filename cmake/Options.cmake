@@ -1,0 +1,37 @@
+# Compiler settings shared by every target of this project.
+#   morva_options   warnings, language, sanitizers; baseline x86-64
+#   morva_simd      in addition AVX2/FMA code; only for what runs behind the processor check
+option(MORVA_FUZZ "Build the fuzzers (clang)" OFF)
+set(MORVA_SANITIZE "" CACHE STRING "Sanitizers, as for -fsanitize=")
+
+if(CMAKE_CXX_FLAGS MATCHES "fast-math" OR CMAKE_C_FLAGS MATCHES "fast-math")
+    message(FATAL_ERROR "-ffast-math breaks the NaN handling that the engine promises")
+endif()
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_C_STANDARD 11)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_CXX_VISIBILITY_PRESET hidden)
+set(CMAKE_C_VISIBILITY_PRESET hidden)
+set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+
+add_library(morva_options INTERFACE)
+target_compile_options(morva_options INTERFACE
+    -Wall -Wextra -Wpedantic -Werror -Wshadow -Wconversion -Wno-sign-conversion
+    $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Wold-style-cast> -ffunction-sections -fdata-sections
+    -fno-math-errno -ffp-contract=on)
+target_link_options(morva_options INTERFACE -Wl,--gc-sections)
+if(MORVA_SANITIZE)
+    target_compile_options(morva_options INTERFACE -fsanitize=${MORVA_SANITIZE} -fno-omit-frame-pointer
+                           -fno-sanitize-recover=all -O1)
+    target_link_options(morva_options INTERFACE -fsanitize=${MORVA_SANITIZE})
+endif()
+if(MORVA_FUZZ)
+    target_compile_options(morva_options INTERFACE -fsanitize=fuzzer-no-link)
+endif()
+
+add_library(morva_simd INTERFACE)
+target_link_libraries(morva_simd INTERFACE morva_options)
+target_compile_options(morva_simd INTERFACE -march=x86-64-v3)
