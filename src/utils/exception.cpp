@@ -13,9 +13,8 @@ MORVA_Exception::MORVA_Exception(char const* message, char const* file, int line
     message_ = text.str();
 }
 
-void raise(std::string const& message, char const* file, char const* function,
-           std::source_location where) {
-    throw MORVA_Exception(message.c_str(), file, static_cast<int>(where.line()), function);
+void raise(std::string const& message, char const* file, char const* function, int line) {
+    throw MORVA_Exception(message.c_str(), file, line, function);
 }
 
 }  // namespace MORVA::UTILS

@@ -2,7 +2,6 @@
 #pragma once
 
 #include <exception>
-#include <source_location>
 #include <string>
 
 namespace MORVA::UTILS {
@@ -24,8 +23,9 @@ private:
     int line_;
 };
 
-// Throws with the caller's own line; `file` is the unit's path without its ending.
+// Throws with the caller's own line; `file` is the unit's path without its ending. (A builtin and
+// not std::source_location, which the fuzzers' compiler does not have yet.)
 [[noreturn]] void raise(std::string const& message, char const* file, char const* function,
-                        std::source_location where = std::source_location::current());
+                        int line = __builtin_LINE());
 
 }  // namespace MORVA::UTILS

@@ -1,0 +1,46 @@
+#include "utils/mean_energy.h"
+
+#include "utils/energy_history.h"
+#include "utils/exception.h"
+
+namespace MORVA::UTILS {
+namespace {
+
+std::size_t checked(std::size_t frames) {
+    if (frames == 0) {
+        raise("The energy mean needs at least one frame", "src/utils/mean_energy", "MeanEnergy");
+    }
+    return frames;
+}
+
+}  // namespace
+
+MeanEnergy::MeanEnergy(std::size_t K, std::size_t M, float activityThreshold, float initialEnergy)
+    : windowFrames(checked(K)),
+      activeFrames(checked(M)),
+      threshold(activityThreshold),
+      frameEnergies(K, 0.0),
+      activeEnergies(1, initialEnergy),
+      activeEnergySum(initialEnergy),
+      spareNodes(M - 1, 0.0) {}
+
+float MeanEnergy::setCurrentData(float const* frame, std::size_t n) {
+    double const energy = meanEnergy({frame, n});
+    frameEnergySum += replaceOldest(frameEnergies, energy / static_cast<double>(windowFrames));
+    // Here the window's mean decides, not the single frame.
+    if (frameEnergySum >= threshold) addActive(energy);
+    return static_cast<float>(activeEnergySum / static_cast<double>(activeCount));
+}
+
+void MeanEnergy::addActive(double energy) {
+    if (activeCount >= activeFrames) {
+        activeEnergySum += replaceOldest(activeEnergies, energy);
+        return;
+    }
+    ++activeCount;
+    activeEnergySum += energy;
+    activeEnergies.splice(activeEnergies.end(), spareNodes, spareNodes.begin());
+    activeEnergies.back() = energy;
+}
+
+}  // namespace MORVA::UTILS

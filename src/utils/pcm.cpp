@@ -1,0 +1,48 @@
+#include "utils/pcm.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <cstdint>
+
+namespace MORVA::UTILS {
+namespace {
+
+constexpr float fullScale = 32768.0f;
+constexpr float pcmMin = -32768.0f;
+constexpr float pcmMax = 32767.0f;
+constexpr float inputLimit = fullScale * 1e6f;
+
+// Written with selections only, so that the loops below become vector code.
+constexpr float limited(float x, float low, float high) {
+    float const number = x == x ? x : 0.0f;
+    float const raised = number < low ? low : number;
+    return raised > high ? high : raised;
+}
+
+}  // namespace
+
+void pcm16ToFloat(std::span<short const> in, std::span<float> out) {
+    for (std::size_t i = 0; i < in.size(); ++i) out[i] = static_cast<float>(in[i]);
+}
+
+void unitToPcm16Scale(std::span<float const> in, std::span<float> out) {
+    for (std::size_t i = 0; i < in.size(); ++i) {
+        out[i] = limited(in[i] * fullScale, -inputLimit, inputLimit);
+    }
+}
+
+void clipToPcm16(std::span<float> samples) {
+    for (float& sample : samples) sample = limited(sample, pcmMin, pcmMax);
+}
+
+void floatToPcm16(std::span<float const> in, std::span<short> out) {
+    for (std::size_t i = 0; i < in.size(); ++i) {
+        out[i] = static_cast<short>(static_cast<std::int32_t>(limited(in[i], pcmMin, pcmMax)));
+    }
+}
+
+void pcm16ScaleToUnit(std::span<float const> in, std::span<float> out) {
+    for (std::size_t i = 0; i < in.size(); ++i) out[i] = in[i] * (1.0f / fullScale);
+}
+
+}  // namespace MORVA::UTILS

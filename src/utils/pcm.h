@@ -1,0 +1,26 @@
+// Sample formats at the edges of a session. Inside the engine samples are floats on the scale of
+// 16-bit PCM, -32768 .. 32767. Input and output spans have equal lengths and may be the same
+// memory where the types agree. No allocation. Any thread.
+#pragma once
+
+#include <span>
+
+namespace MORVA::UTILS {
+
+// Each sample keeps its integer value.
+void pcm16ToFloat(std::span<short const> in, std::span<float> out);
+
+// -1 .. 1 to the 16-bit scale (x 32768). NaN becomes 0 and magnitudes end at 1e6 full scales, so
+// that one bad frame never leaves anything but finite numbers in a filter's memory.
+void unitToPcm16Scale(std::span<float const> in, std::span<float> out);
+
+// Limits to -32768 .. 32767; NaN becomes 0.
+void clipToPcm16(std::span<float> samples);
+
+// Truncates toward zero and saturates; NaN becomes 0.
+void floatToPcm16(std::span<float const> in, std::span<short> out);
+
+// 16-bit scale to -1 .. 1 (x 1 / 32768).
+void pcm16ScaleToUnit(std::span<float const> in, std::span<float> out);
+
+}  // namespace MORVA::UTILS

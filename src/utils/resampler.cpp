@@ -1,0 +1,121 @@
+#include "utils/resampler.h"
+
+#include <libresample.h>
+
+#include <algorithm>
+
+#include "utils/exception.h"
+
+namespace MORVA::UTILS {
+namespace {
+
+constexpr int highQuality = 1;
+constexpr int streamGoesOn = 0;
+constexpr double largestRatio = 256.0;
+constexpr int usualBlock = 3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
+
+}  // namespace
+
+void Resampler::Close::operator()(void* handle) const {
+    resample_close(handle);
+}
+
+Resampler::Resampler(unsigned long inRate, unsigned long outRate)
+    : factor_(static_cast<double>(outRate) / static_cast<double>(inRate)),
+      inRate_(static_cast<double>(inRate)),
+      outRate_(static_cast<double>(outRate)) {
+    // Also catches a rate of 0, which makes the factor 0, infinite or NaN.
+    if (!(factor_ >= 1.0 / largestRatio && factor_ <= largestRatio)) {
+        raise("The resampler cannot convert between these rates", "src/utils/resampler",
+              "Resampler");
+    }
+    handle_ = open();
+    if (factor_ != 1.0) buffer_.reserve(static_cast<std::size_t>(extraRoom_ + usualBlock));
+}
+
+unsigned Resampler::resample(std::vector<float> const& in, std::vector<float>& out) {
+    if (factor_ == 1.0) {
+        if (&in != &out) out = in;
+        return static_cast<unsigned>(in.size());
+    }
+    int const expected = static_cast<int>(factor_ * static_cast<double>(in.size()));
+    buffer_.resize(static_cast<std::size_t>(extraRoom_ + expected));
+    int const room = extraRoom_ + expected - heldOver_;
+    int const produced =
+        convert(in.data(), static_cast<int>(in.size()), buffer_.data() + heldOver_, room);
+    out.resize(static_cast<std::size_t>(expected));  // only now: it may be `in` itself
+    if (firstBlock_) {
+        startWithDelay(out, produced);
+    } else {
+        continueStream(out, produced);
+    }
+    firstBlock_ = false;
+    return static_cast<unsigned>(produced);
+}
+
+int Resampler::resample(float* in, int inCount, float* out, int outCapacity) {
+    return convert(in, inCount, out, outCapacity);
+}
+
+bool Resampler::reset() {
+    handle_.reset();
+    handle_ = open();
+    firstBlock_ = true;
+    heldOver_ = 0;
+    return true;
+}
+
+std::size_t Resampler::leadingZeros(std::size_t blockLength) const {
+    if (factor_ == 1.0) return 0;
+    Resampler fresh(static_cast<unsigned long>(inRate_), static_cast<unsigned long>(outRate_));
+    std::vector<float> const silence(blockLength);
+    std::vector<float> out;
+    unsigned const produced = fresh.resample(silence, out);
+    return out.size() + 1 - std::min<std::size_t>(produced, out.size() + 1);
+}
+
+Resampler::Handle Resampler::open() const {
+    Handle handle(resample_open(highQuality, factor_, factor_));
+    if (!handle) raise("Out of memory for the resampler", "src/utils/resampler", "Resampler");
+    return handle;
+}
+
+int Resampler::convert(float const* in, int inCount, float* out, int room) {
+    int consumed = 0;
+    int produced = 0;
+    while (true) {
+        int used = 0;
+        // The library's interface lacks the const; it only reads its input.
+        int const got = resample_process(handle_.get(), factor_, const_cast<float*>(in) + consumed,
+                                         inCount - consumed, streamGoesOn, &used, out + produced,
+                                         room - produced);
+        consumed += used;
+        if (got > 0) produced += got;
+        bool const stuck = got == 0 && (consumed == inCount || used == 0);
+        if (got < 0 || stuck) return produced;
+    }
+}
+
+// One sample is always kept back, so that a later block that yields one sample less than its share
+// still comes out whole.
+void Resampler::startWithDelay(std::vector<float>& out, int produced) {
+    int const expected = static_cast<int>(out.size());
+    int const zeros = std::clamp(expected - produced + 1, 0, expected);
+    int const delivered = expected - zeros;
+    std::fill_n(out.begin(), zeros, 0.0f);
+    std::copy_n(buffer_.begin(), delivered, out.begin() + zeros);
+    std::copy(buffer_.begin() + delivered, buffer_.begin() + produced, buffer_.begin());
+    heldOver_ = produced - delivered;
+}
+
+void Resampler::continueStream(std::vector<float>& out, int produced) {
+    int const expected = static_cast<int>(out.size());
+    int const available = heldOver_ + produced;
+    int const delivered = std::min(expected, available);
+    std::copy_n(buffer_.begin(), delivered, out.begin());
+    std::fill(out.begin() + delivered, out.end(), 0.0f);
+    std::copy(buffer_.begin() + delivered, buffer_.begin() + available, buffer_.begin());
+    heldOver_ = available - delivered;
+}
+
+}  // namespace MORVA::UTILS

@@ -1,0 +1,60 @@
+// Sample-rate conversion of one mono stream, block by block, with exact block lengths.
+//
+// Rates are ratios only: two block lengths of the same duration serve as well as two rates. The
+// first block is shifted right by leadingZeros() samples, the filter's delay. One thread at a time;
+// one resampler per stream and direction. No allocation after the first block of the largest size.
+#pragma once
+
+#include <cstddef>
+#include <memory>
+#include <vector>
+
+#include "utils/non_copyable.h"
+
+namespace MORVA::UTILS {
+
+class Resampler : private NonCopyMovable {
+public:
+    // Throws MORVA_Exception for a rate of 0, a ratio outside 1/256 .. 256, or when the filter
+    // cannot be built.
+    Resampler(unsigned long inRate, unsigned long outRate);
+
+    // Converts one block: `out` gets exactly ratio() * in.size() samples, truncated. Returns how
+    // many samples the filter delivered in this call (in.size() at equal rates, where `out` is a
+    // copy). `in` and `out` may be the same vector.
+    unsigned resample(std::vector<float> const& in, std::vector<float>& out);
+
+    // Plain streaming conversion without padding; returns the number of samples written.
+    int resample(float* in, int inCount, float* out, int outCapacity);
+
+    // Back to the state of a new object; always true. Throws when the filter cannot be built.
+    bool reset();
+
+    double ratio() const { return factor_; }
+
+    // Zeros that a first block of `blockLength` input samples starts with, in output samples: the
+    // latency of this conversion. 0 at equal rates. Converts a block: not for the audio thread.
+    std::size_t leadingZeros(std::size_t blockLength) const;
+
+private:
+    struct Close {
+        void operator()(void* handle) const;
+    };
+    using Handle = std::unique_ptr<void, Close>;
+
+    Handle open() const;
+    int convert(float const* in, int inCount, float* out, int room);
+    void startWithDelay(std::vector<float>& out, int produced);
+    void continueStream(std::vector<float>& out, int produced);
+
+    Handle handle_;
+    double factor_;
+    double inRate_;
+    double outRate_;
+    int extraRoom_ = 1024;
+    int heldOver_ = 0;
+    bool firstBlock_ = true;
+    std::vector<float> buffer_;
+};
+
+}  // namespace MORVA::UTILS
