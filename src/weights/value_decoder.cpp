@@ -1,0 +1,83 @@
+#include "weights/value_decoder.h"
+
+#include <cstdint>
+#include <iterator>
+#include <utility>
+#include <vector>
+
+#include "utils/matrix.h"
+#include "weights/serializers.h"
+
+namespace MORVA::WEIGHTS {
+
+namespace {
+
+using CONTAINERS::AnyMap;
+using CONTAINERS::InsertMode;
+using CONTAINERS::Matrix;
+using UTILS::BoundedReader;
+
+void decode(BoundedReader& reader, float& value) {
+    reader.readNumber(value);
+}
+
+void decode(BoundedReader& reader, int& value) {
+    reader.readNumber(value);
+}
+
+void decode(BoundedReader& reader, std::string& value) {
+    std::uint32_t size = 0;
+    if (reader.readNumber(size)) reader.readString(value, size);
+}
+
+void decode(BoundedReader& reader, std::vector<float>& value) {
+    std::uint32_t count = 0;
+    if (reader.readNumber(count)) reader.readFloats(value, count);
+}
+
+void decode(BoundedReader& reader, Matrix& value) {
+    UTILS::readMatrix(reader, value);
+}
+
+// The list grows with the elements that really arrive: an empty element takes more memory than its
+// four or eight bytes of file, so that the stored count alone must not decide how much is
+// allocated.
+template <class Element>
+void decode(BoundedReader& reader, std::vector<Element>& value) {
+    std::uint32_t count = 0;
+    reader.readNumber(count);
+    for (std::uint32_t i = 0; i < count && reader.good(); ++i) {
+        decode(reader, value.emplace_back());
+    }
+}
+
+template <class T>
+bool decodeAs(BoundedReader& reader, std::string const& name, AnyMap& values) {
+    T value{};
+    decode(reader, value);
+    if (!reader.good()) return false;
+    values.insert<T>(name, std::move(value), InsertMode::keep);
+    return true;
+}
+
+using Decoder = bool (*)(BoundedReader&, std::string const&, AnyMap&);
+
+// Indexed by type code.
+constexpr Decoder decoders[] = {
+    decodeAs<float>,
+    decodeAs<int>,
+    decodeAs<std::string>,
+    decodeAs<std::vector<float>>,
+    decodeAs<Matrix>,
+    decodeAs<std::vector<std::vector<float>>>,
+    decodeAs<std::vector<Matrix>>,
+};
+
+}  // namespace
+
+bool decodeValue(BoundedReader& reader, int typeCode, std::string const& name, AnyMap& values) {
+    if (typeCode < 0 || typeCode >= static_cast<int>(std::size(decoders))) return false;
+    return decoders[typeCode](reader, name, values);
+}
+
+}  // namespace MORVA::WEIGHTS
