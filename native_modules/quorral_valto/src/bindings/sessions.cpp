@@ -1,0 +1,195 @@
+// Sessions for script, over the exported entry points. A frame call allocates nothing of its own.
+#include "native_modules/quorral_valto/src/bindings/sessions.h"
+
+#include <array>
+#include <cstdint>
+#include <memory>
+#include <stdexcept>
+#include <string>
+
+#include "native/node_api/optional.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/models.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
+
+namespace quorral {
+namespace {
+
+// Codes of the engine for a handle that is none.
+constexpr int kNoNcSession = 2;
+constexpr double kNoVadSession = -4.0;
+
+struct Session {
+    void* handle = nullptr;
+    int (*closeHandle)(void*) = nullptr;
+
+    Session(void* opened, int (*close)(void*)) : handle(opened), closeHandle(close) {}
+    ~Session() { Close(); }
+    Session(const Session&) = delete;
+    Session& operator=(const Session&) = delete;
+
+    bool Is(int (*close)(void*)) const { return handle != nullptr && closeHandle == close; }
+    void Close() {
+        if (handle != nullptr) closeHandle(handle);
+        handle = nullptr;
+    }
+};
+
+void DestroySession(napi_env /*env*/, void* data, void* /*hint*/) {
+    const std::unique_ptr<Session> owned(static_cast<Session*>(data));
+}
+
+template <std::size_t N>
+std::array<napi_value, N> ArgumentsOf(napi_env env, napi_callback_info info) {
+    std::array<napi_value, N> values{};
+    std::size_t count = N;
+    napi_get_cb_info(env, info, &count, values.data(), nullptr, nullptr);
+    return values;
+}
+
+Session* SessionOf(napi_env env, napi_value value) {
+    napi_valuetype type = napi_undefined;
+    void* data = nullptr;
+    if (napi_typeof(env, value, &type) != napi_ok || type != napi_external ||
+        napi_get_value_external(env, value, &data) != napi_ok) {
+        return nullptr;
+    }
+    return static_cast<Session*>(data);
+}
+
+struct Samples {
+    std::int16_t* data = nullptr;
+    unsigned count = 0;
+};
+
+// Empty for anything but an Int16Array; a detached one has no samples either.
+Samples SamplesOf(napi_env env, napi_value value) {
+    bool isTyped = false;
+    napi_typedarray_type type{};
+    std::size_t length = 0;
+    void* data = nullptr;
+    if (napi_is_typedarray(env, value, &isTyped) != napi_ok || !isTyped ||
+        napi_get_typedarray_info(env, value, &type, &length, &data, nullptr, nullptr) != napi_ok ||
+        type != napi_int16_array) {
+        return {};
+    }
+    return {.data = static_cast<std::int16_t*>(data), .count = static_cast<unsigned>(length)};
+}
+
+napi_value Number(napi_env env, double number) {
+    napi_value value = nullptr;
+    napi_create_double(env, number, &value);
+    return value;
+}
+
+Optional<std::string> TextOf(napi_env env, napi_value value) {
+    std::size_t length = 0;
+    if (napi_get_value_string_utf8(env, value, nullptr, 0, &length) != napi_ok) return {};
+    std::string text(length + 1, '\0');
+    napi_get_value_string_utf8(env, value, text.data(), text.size(), &length);
+    text.resize(length);
+    return text;
+}
+
+using Opener = OpenResult (*)(int, int, const Optional<std::string>&);
+
+napi_value Open(napi_env env, napi_callback_info info, Opener open, int (*close)(void*)) {
+    const auto arguments = ArgumentsOf<3>(env, info);
+    std::int32_t rateHz = 0;
+    std::int32_t frameMs = 0;
+    napi_get_value_int32(env, arguments[0], &rateHz);
+    napi_get_value_int32(env, arguments[1], &frameMs);
+    try {
+        const OpenResult result = open(rateHz, frameMs, TextOf(env, arguments[2]));
+        if (result.status != OpenStatus::kOpen) return Number(env, static_cast<int>(result.status));
+        auto session = std::make_unique<Session>(result.session, close);
+        napi_value external = nullptr;
+        if (napi_create_external(env, session.get(), DestroySession, nullptr, &external) !=
+            napi_ok) {
+            return nullptr;
+        }
+        static_cast<void>(session.release());
+        return external;
+    } catch (const std::exception& failure) {
+        napi_throw_error(env, nullptr, failure.what());
+        return nullptr;
+    }
+}
+
+napi_value OpenNc(napi_env env, napi_callback_info info) {
+    return Open(env, info, OpenNcSession, ValtoNCReset);
+}
+
+napi_value OpenVad(napi_env env, napi_callback_info info) {
+    return Open(env, info, OpenVadSession, ValtoVADReset);
+}
+
+napi_value ProcessNc(napi_env env, napi_callback_info info) {
+    const auto [handle, input, output] = ArgumentsOf<3>(env, info);
+    const Session* const session = SessionOf(env, handle);
+    if (session == nullptr || !session->Is(ValtoNCReset)) return Number(env, kNoNcSession);
+    const Samples from = SamplesOf(env, input);
+    const Samples to = SamplesOf(env, output);
+    return Number(env, ValtoNCProcess(session->handle, from.data, from.count, to.data, to.count));
+}
+
+napi_value ProcessVad(napi_env env, napi_callback_info info) {
+    const auto [handle, input] = ArgumentsOf<2>(env, info);
+    const Session* const session = SessionOf(env, handle);
+    if (session == nullptr || !session->Is(ValtoVADReset)) return Number(env, kNoVadSession);
+    const Samples from = SamplesOf(env, input);
+    return Number(env, static_cast<double>(ValtoVADProcess(session->handle, from.data, from.count)));
+}
+
+napi_value Close(napi_env env, napi_callback_info info) {
+    if (Session* const session = SessionOf(env, ArgumentsOf<1>(env, info)[0])) session->Close();
+    return nullptr;
+}
+
+napi_value InitializeEngine(napi_env env, napi_callback_info /*info*/) {
+    try {
+        return Number(env, EnsureInitialized());
+    } catch (const std::exception& failure) {
+        napi_throw_error(env, nullptr, failure.what());
+        return nullptr;
+    }
+}
+
+}  // namespace
+
+napi_value RequestedSessions(napi_env env, napi_value exports) {
+    napi_value key = nullptr;
+    bool has = false;
+    napi_value target = nullptr;
+    napi_valuetype type = napi_undefined;
+    if (napi_create_string_utf8(env, "sessions", NAPI_AUTO_LENGTH, &key) != napi_ok ||
+        napi_has_own_property(env, exports, key, &has) != napi_ok || !has ||
+        napi_get_property(env, exports, key, &target) != napi_ok ||
+        napi_typeof(env, target, &type) != napi_ok || type != napi_object) {
+        return nullptr;
+    }
+    return target;
+}
+
+void InstallSessions(napi_env env, napi_value target) {
+    const auto method = [](const char* name, napi_callback callback) {
+        return napi_property_descriptor{.utf8name = name,
+                                        .name = nullptr,
+                                        .method = callback,
+                                        .getter = nullptr,
+                                        .setter = nullptr,
+                                        .value = nullptr,
+                                        .attributes = napi_enumerable,
+                                        .data = nullptr};
+    };
+    const std::array methods{
+        method("initialize", InitializeEngine), method("openNc", OpenNc),
+        method("openVad", OpenVad),             method("processNc", ProcessNc),
+        method("processVad", ProcessVad),       method("close", Close),
+    };
+    if (napi_define_properties(env, target, methods.size(), methods.data()) != napi_ok) {
+        throw std::runtime_error("The runtime refuses the session functions");
+    }
+}
+
+}  // namespace quorral

@@ -1,0 +1,104 @@
+// Exported entry points: argument defaults and model choice in front of the engine's C interface.
+// Setup takes the models lock; Process takes none.
+#include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <cstdio>
+#include <mutex>
+#include <string>
+
+#include "native_modules/quorral_valto/src/valto_wrapper/models.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/process_gate.h"
+#include "morva-sdk/morva-sdk.h"
+
+namespace quorral {
+namespace {
+
+constexpr std::array kRatesHz{8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
+constexpr int kDefaultRateHz = 16000;
+// 15 and 32 pass here although the engine refuses them: the caller then gets null.
+constexpr std::array kDurationsMs{10, 15, 20, 30, 32, 40};
+constexpr int kDefaultDurationMs = 10;
+
+// What a call returns when the process is ending: the engine's codes for a session it does not know.
+constexpr int kNoSession = 2;
+constexpr int kNothingToClose = -3;
+constexpr float kNoVoiceSession = -4.0F;
+
+MorvaSamplingRate AcceptRate(int rateHz) {
+    if (std::ranges::count(kRatesHz, rateHz) == 0) {
+        std::printf("The input sampling rate %zu is not supported; using default: %d\n",
+                    static_cast<std::size_t>(rateHz), kDefaultRateHz);
+        rateHz = kDefaultRateHz;
+    }
+    return static_cast<MorvaSamplingRate>(rateHz);
+}
+
+MorvaFrameDuration AcceptDuration(int durationMs) {
+    if (std::ranges::count(kDurationsMs, durationMs) == 0) {
+        std::printf("The input frame duration %zu is not supported; using default: %d\n",
+                    static_cast<std::size_t>(durationMs), kDefaultDurationMs);
+        durationMs = kDefaultDurationMs;
+    }
+    return static_cast<MorvaFrameDuration>(durationMs);
+}
+
+// The model for a caller's raw rate, or an empty name when none covers it.
+std::string ModelFor(int rateHz) {
+    if (!gNcModel.empty()) return gNcModel;
+    const auto model = std::ranges::find_if(
+        gNcModels, [&](const NcModel& candidate) { return candidate.maxSampleRate >= rateHz; });
+    return model == gNcModels.end() ? std::string() : model->name;
+}
+
+}  // namespace
+}  // namespace quorral
+
+using quorral::ProcessGate;
+
+void* ValtoNCSetup(int samplingRate, int frameDurationMs) {
+    const ProcessGate::Pass pass;
+    if (!pass) return nullptr;
+    const std::lock_guard guard(quorral::ModelsLock());
+    const std::string model = quorral::ModelFor(samplingRate);
+    if (model.empty()) return nullptr;
+    std::printf("Setting Valto model: %s\n", model.c_str());
+    const MorvaSamplingRate rate = quorral::AcceptRate(samplingRate);
+    const MorvaFrameDuration duration = quorral::AcceptDuration(frameDurationMs);
+    std::fflush(stdout);
+    return Morva_NC_CreateSession(rate, rate, duration, model.c_str());
+}
+
+int ValtoNCProcess(void* session, const short* input, unsigned int inputSize, short* output,
+                   unsigned int outputSize) {
+    const ProcessGate::Pass pass;
+    if (!pass) return quorral::kNoSession;
+    return Morva_NC_CleanAmbientNoiseInt16(session, input, inputSize, output, outputSize);
+}
+
+int ValtoNCReset(void* session) {
+    const ProcessGate::Pass pass;
+    return pass ? Morva_NC_CloseSession(session) : quorral::kNothingToClose;
+}
+
+void* ValtoVADSetup(int samplingRate, int frameDurationMs) {
+    const ProcessGate::Pass pass;
+    if (!pass) return nullptr;
+    const std::lock_guard guard(quorral::ModelsLock());
+    const MorvaSamplingRate rate = quorral::AcceptRate(samplingRate);
+    const MorvaFrameDuration duration = quorral::AcceptDuration(frameDurationMs);
+    std::fflush(stdout);
+    return Morva_VAD_CreateSession(rate, duration, quorral::gVadModel.c_str());
+}
+
+float ValtoVADProcess(void* session, const short* input, unsigned int inputSize) {
+    const ProcessGate::Pass pass;
+    return pass ? Morva_VAD_FrameInt16(session, input, inputSize) : quorral::kNoVoiceSession;
+}
+
+int ValtoVADReset(void* session) {
+    const ProcessGate::Pass pass;
+    return pass ? Morva_VAD_CloseSession(session) : quorral::kNothingToClose;
+}

@@ -1,0 +1,99 @@
+// Model lists, the script's choice, and set-up with a model of one's own.
+#include "native_modules/quorral_valto/src/valto_wrapper/models.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
+
+namespace quorral {
+
+std::vector<NcModel> gNcModels;
+std::string gNcModel;
+std::vector<std::string> gVadModels;
+std::string gVadModel;
+
+namespace {
+
+using SetupFunction = void* (*)(int, int);
+
+bool IsNcModel(const std::string& name) {
+    return std::ranges::any_of(gNcModels, [&](const NcModel& model) { return model.name == name; });
+}
+
+bool IsVadModel(const std::string& name) { return std::ranges::count(gVadModels, name) != 0; }
+
+// Puts a value in place for the length of a scope.
+class Substitute {
+public:
+    Substitute(std::string& target, std::string value)
+        : target_(target), previous_(std::exchange(target, std::move(value))) {}
+    ~Substitute() { target_.swap(previous_); }
+    Substitute(const Substitute&) = delete;
+    Substitute& operator=(const Substitute&) = delete;
+
+private:
+    std::string& target_;
+    std::string previous_;
+};
+
+OpenResult Open(SetupFunction setup, int rateHz, int frameMs, std::string& choice,
+                const Optional<std::string>& model, bool (*isRegistered)(const std::string&)) {
+    const std::lock_guard guard(ModelsLock());
+    if (!InitializeResult()) return {.status = OpenStatus::kNotInitialized};
+    if (model && !isRegistered(*model)) return {.status = OpenStatus::kUnknownModel};
+    const Substitute substitute(choice, model.value_or(choice));
+    void* const session = setup(rateHz, frameMs);
+    return {.status = session == nullptr ? OpenStatus::kRefused : OpenStatus::kOpen,
+            .session = session};
+}
+
+}  // namespace
+
+std::recursive_mutex& ModelsLock() {
+    static std::recursive_mutex lock;
+    return lock;
+}
+
+std::vector<std::string> NcModelNames() {
+    const std::lock_guard guard(ModelsLock());
+    std::vector<std::string> names;
+    names.reserve(gNcModels.size());
+    for (const auto& model : gNcModels) names.push_back(model.name);
+    return names;
+}
+
+std::vector<std::string> VadModelNames() {
+    const std::lock_guard guard(ModelsLock());
+    return gVadModels;
+}
+
+bool ChooseNcModel(const std::string& name) {
+    const std::lock_guard guard(ModelsLock());
+    if (!IsNcModel(name)) return false;
+    gNcModel = name;
+    return true;
+}
+
+bool ChooseVadModel(const std::string& name) {
+    const std::lock_guard guard(ModelsLock());
+    if (!IsVadModel(name)) return false;
+    gVadModel = name;
+    return true;
+}
+
+void ChooseNcModelByRate() {
+    const std::lock_guard guard(ModelsLock());
+    gNcModel.clear();
+}
+
+OpenResult OpenNcSession(int rateHz, int frameMs, const Optional<std::string>& model) {
+    return Open(ValtoNCSetup, rateHz, frameMs, gNcModel, model, IsNcModel);
+}
+
+OpenResult OpenVadSession(int rateHz, int frameMs, const Optional<std::string>& model) {
+    return Open(ValtoVADSetup, rateHz, frameMs, gVadModel, model, IsVadModel);
+}
+
+}  // namespace quorral
