@@ -14,7 +14,7 @@
 
 #include "utils/matrix.h"
 
-namespace MORVA::TESTS {
+namespace test_support {
 
 // Appends records; every add returns the writer for chaining. `recordEnds` tells where each one
 // ends.
@@ -22,7 +22,7 @@ class WeightWriter {
 public:
     using Vector = std::vector<float>;
     using Vectors = std::vector<Vector>;
-    using Matrix = CONTAINERS::Matrix;
+    using Matrix = MORVA::CONTAINERS::Matrix;
     using Matrices = std::vector<Matrix>;
 
     // Building blocks, for hostile data too.
@@ -160,7 +160,7 @@ public:
         for (auto& value : values) value = range(engine_);
         return values;
     }
-    CONTAINERS::Matrix matrix(int rows, int cols) {
+    MORVA::CONTAINERS::Matrix matrix(int rows, int cols) {
         auto const scale = std::sqrt(3.0F / static_cast<float>(rows));
         return {vector(rows * cols, -scale, scale), static_cast<std::size_t>(rows),
                 static_cast<std::size_t>(cols)};
@@ -291,4 +291,4 @@ inline std::string randomVadWeight(VadShape const& shape) {
     return writer.bytes();
 }
 
-}  // namespace MORVA::TESTS
+}  // namespace test_support

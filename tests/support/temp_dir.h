@@ -1,0 +1,40 @@
+// A folder of one test, removed with everything in it at the end.
+#pragma once
+
+#include <stdlib.h>
+
+#include <filesystem>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+
+#include "support/weight_writer.h"
+
+namespace test_support {
+
+class TempDir {
+public:
+    TempDir() {
+        auto pattern = (std::filesystem::temp_directory_path() / "morva-XXXXXX").string();
+        if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("no temporary folder");
+        path_ = pattern;
+    }
+    ~TempDir() {
+        std::error_code ignored;
+        std::filesystem::remove_all(path_, ignored);
+    }
+    TempDir(TempDir const&) = delete;
+    TempDir& operator=(TempDir const&) = delete;
+
+    std::filesystem::path const& path() const { return path_; }
+    std::filesystem::path write(std::string_view name, std::string_view bytes) const {
+        auto const file = path_ / name;
+        writeFile(file, bytes);
+        return file;
+    }
+
+private:
+    std::filesystem::path path_;
+};
+
+}  // namespace test_support
