@@ -1,0 +1,25 @@
+// Cleaning of one whole sound file, one session per channel.
+#pragma once
+
+#include <cstdint>
+#include <functional>
+#include <string>
+
+#include "jobs.h"
+#include "models.h"
+
+namespace morva::cli {
+
+struct CleanedFile {
+    std::int64_t frames = 0;
+    int channels = 0;
+    int rateHz = 0;
+    std::string model;
+};
+
+// `advance` is told of the input frames done since its last call. Throws Error; then no output
+// exists.
+CleanedFile cleanFile(Engine& engine, Models& models, Job const& job, int frameMs,
+                      std::function<void(std::int64_t)> const& advance);
+
+}  // namespace morva::cli

@@ -1,0 +1,99 @@
+#include "engine.h"
+
+#include <algorithm>
+#include <cmath>
+
+#include "error.h"
+#include "morva-ext.h"
+#include "morva-sdk.h"
+
+namespace morva::cli {
+namespace {
+
+std::string withReason(std::string const& what, EngineTalk const& talk) {
+    auto const reason = talk.reason();
+    return reason.empty() ? what : what + ": " + reason;
+}
+
+template <class Create>
+SessionHandle open(Engine& engine, SessionSetup const& setup, int (*close)(void*), Create create) {
+    EngineTalk const talk(engine.streams());
+    SessionHandle session(
+        create(static_cast<MorvaSamplingRate>(setup.rateHz),
+               static_cast<MorvaFrameDuration>(setup.frameMs), setup.model.c_str()),
+        close);
+    if (!session) throw Error(withReason(setup.model + ": the model cannot be used", talk));
+    return session;
+}
+
+unsigned int count(std::span<float const> frame) {
+    return static_cast<unsigned int>(frame.size());
+}
+
+// Scores and levels go through the integer calls: the float calls answer only results within 0..1
+// and print about every other one.
+void toIntegers(std::span<float const> frame, std::vector<std::int16_t>& samples) {
+    samples.resize(frame.size());
+    std::ranges::transform(frame, samples.begin(), [](float x) {
+        float const scaled = std::isnan(x) ? 0.0F : std::clamp(x * 32768.0F, -32768.0F, 32767.0F);
+        return static_cast<std::int16_t>(std::lrint(scaled));
+    });
+}
+
+}  // namespace
+
+Engine::Engine(Streams& streams, std::filesystem::path const& folder) : streams_(streams) {
+    EngineTalk const talk(streams_);
+    if (Morva_SDK_GlobalInit(folder.wstring().c_str(), 1) != 0) {
+        throw Error(withReason("the engine cannot start", talk));
+    }
+}
+
+Engine::~Engine() {
+    Morva_SDK_GlobalDestroy();
+}
+
+void Engine::addModel(std::filesystem::path const& file, std::string const& name) {
+    EngineTalk const talk(streams_);
+    if (Morva_SDK_SetModel(file.wstring().c_str(), name.c_str()) != 0) {
+        throw Error(withReason(file.string() + ": not a usable model", talk));
+    }
+}
+
+CleaningSession::CleaningSession(Engine& engine, SessionSetup const& setup)
+    : session_(open(engine, setup, &Morva_NC_CloseSession,
+                    [](auto rate, auto frame, auto model) {
+                        return Morva_NC_CreateSession(rate, rate, frame, model);
+                    })),
+      latencySamples_(MorvaExt_SessionLatencySamples(session_.get())) {
+    if (latencySamples_ < 0) throw Error("the engine does not say its latency");
+}
+
+void CleaningSession::clean(std::span<float const> in, std::span<float> out) {
+    if (Morva_NC_CleanAmbientNoiseFloat(session_.get(), in.data(), count(in), out.data(),
+                                        count(out)) != 0) {
+        throw Error("the engine refused a frame");
+    }
+}
+
+VoiceSession::VoiceSession(Engine& engine, SessionSetup const& setup)
+    : session_(open(engine, setup, &Morva_VAD_CloseSession, &Morva_VAD_CreateSession)) {}
+
+float VoiceSession::score(std::span<float const> frame) {
+    toIntegers(frame, samples_);
+    float const score = Morva_VAD_FrameInt16(session_.get(), samples_.data(), count(frame));
+    if (!(score >= 0.0F && score <= 1.0F)) {
+        throw Error("the voice-activity model gives scores outside 0..1: it is not calibrated");
+    }
+    return score;
+}
+
+LevelSession::LevelSession(Engine& engine, SessionSetup const& setup)
+    : session_(open(engine, setup, &Morva_NoiseDB_CloseSession, &Morva_NoiseDB_CreateSession)) {}
+
+float LevelSession::level(std::span<float const> frame) {
+    toIntegers(frame, samples_);
+    return Morva_NoiseDB_FrameInt16(session_.get(), samples_.data(), count(frame));
+}
+
+}  // namespace morva::cli

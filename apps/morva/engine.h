@@ -1,0 +1,83 @@
+// The engine as objects: one Engine per process, sessions that close themselves. Everything goes
+// through the C interface.
+//
+// Frames are mono floats in -1..1, rate * duration / 1000 samples.
+// Threads: sessions may be opened and used on different threads; one thread at a time per session.
+// The Engine outlives its sessions.
+#pragma once
+
+#include <cstdint>
+#include <filesystem>
+#include <memory>
+#include <span>
+#include <string>
+#include <vector>
+
+#include "streams.h"
+
+namespace morva::cli {
+
+// What a session runs on.
+struct SessionSetup {
+    int rateHz = 0;
+    int frameMs = 10;
+    std::string model;  // name under which it was registered
+};
+
+class Engine {
+public:
+    // Relative weight paths inside control files are resolved against `folder`. Throws Error when
+    // the processor lacks what the engine needs.
+    Engine(Streams& streams, std::filesystem::path const& folder);
+    ~Engine();
+    Engine(Engine const&) = delete;
+    Engine& operator=(Engine const&) = delete;
+
+    // Registers a weight or control file under `name`; throws Error with the engine's reason.
+    void addModel(std::filesystem::path const& file, std::string const& name);
+    Streams& streams() { return streams_; }
+
+private:
+    Streams& streams_;
+};
+
+// Closes a session of one kind.
+using SessionHandle = std::unique_ptr<void, int (*)(void*)>;
+
+class CleaningSession {
+public:
+    CleaningSession(Engine& engine, SessionSetup const& setup);
+
+    // Both spans hold one frame.
+    void clean(std::span<float const> in, std::span<float> out);
+    // Samples by which the output lags the input.
+    int latencySamples() const { return latencySamples_; }
+
+private:
+    SessionHandle session_;
+    int latencySamples_;
+};
+
+class VoiceSession {
+public:
+    VoiceSession(Engine& engine, SessionSetup const& setup);
+    // 0..1; throws Error for a model that does not keep to that range.
+    float score(std::span<float const> frame);
+
+private:
+    SessionHandle session_;
+    std::vector<std::int16_t> samples_;
+};
+
+class LevelSession {
+public:
+    LevelSession(Engine& engine, SessionSetup const& setup);
+    // Decibels re one squared unit of the 16-bit sample scale.
+    float level(std::span<float const> frame);
+
+private:
+    SessionHandle session_;
+    std::vector<std::int16_t> samples_;
+};
+
+}  // namespace morva::cli

@@ -1,0 +1,51 @@
+// Entry point of the command line: one subcommand per task, exit status 0 done, 1 failed, 2
+// misused.
+#include <cstdio>
+#include <exception>
+
+#include "command.h"
+
+namespace morva::cli {
+
+void addEngineOptions(CLI::App& command, EngineOptions& options) {
+    command
+        .add_option("--model", options.models.model, "Weight (.mvw) or control file (.cfg) to use")
+        ->type_name("FILE");
+    command.add_option("--models", options.models.folder, "Folder of the shipped models")
+        ->type_name("DIR");
+    command
+        .add_option("--control", options.models.control,
+                    "Control file (.cfg) with model parameters")
+        ->type_name("FILE");
+    command.add_option("--frame", options.frameMs, "Frame length in milliseconds")
+        ->check(CLI::IsMember({10, 20, 30, 40}))
+        ->capture_default_str();
+    command.add_flag("--verbose", options.verbose, "Show what the engine prints");
+}
+
+}  // namespace morva::cli
+
+int main(int argc, char** argv) {
+    CLI::App app{
+        "Real-time voice processing on sound files: noise suppression, voice activity, noise level",
+        "morva"};
+    app.require_subcommand(1);
+    app.set_version_flag("--version", MORVA_VERSION);
+    morva::cli::Action action;
+    morva::cli::addDenoise(app, action);
+    morva::cli::addInspect(app, action);
+    morva::cli::addVad(app, action);
+    morva::cli::addLevel(app, action);
+    morva::cli::addReport(app, action);
+    try {
+        app.parse(argc, argv);
+    } catch (CLI::ParseError const& error) {
+        return app.exit(error) == 0 ? 0 : 2;
+    }
+    try {
+        return action();
+    } catch (std::exception const& error) {
+        std::fprintf(stderr, "morva: %s\n", error.what());
+        return 1;
+    }
+}

@@ -1,0 +1,207 @@
+#include "report_page.h"
+
+#include <algorithm>
+#include <cmath>
+#include <cstdint>
+#include <nlohmann/json.hpp>
+#include <numeric>
+#include <span>
+#include <string_view>
+
+#include "report_template.h"
+#include "text_output.h"
+
+namespace morva::cli {
+namespace {
+
+void appendLittleEndian(std::string& bytes, std::uint32_t value, int size) {
+    for (int i = 0; i < size; ++i) bytes += static_cast<char>(value >> (8 * i) & 0xFFU);
+}
+
+// A 16-bit mono WAV file.
+std::string wavBytes(std::span<float const> samples, int rateHz) {
+    auto const dataSize = static_cast<std::uint32_t>(samples.size() * 2);
+    std::string bytes = "RIFF";
+    appendLittleEndian(bytes, 36 + dataSize, 4);
+    bytes += "WAVEfmt ";
+    appendLittleEndian(bytes, 16, 4);
+    appendLittleEndian(bytes, 1, 2);  // integer samples
+    appendLittleEndian(bytes, 1, 2);  // one channel
+    appendLittleEndian(bytes, static_cast<std::uint32_t>(rateHz), 4);
+    appendLittleEndian(bytes, static_cast<std::uint32_t>(rateHz) * 2, 4);
+    appendLittleEndian(bytes, 2, 2);
+    appendLittleEndian(bytes, 16, 2);
+    bytes += "data";
+    appendLittleEndian(bytes, dataSize, 4);
+    for (float const sample : samples) {
+        float const scaled =
+            std::isnan(sample) ? 0.0F : std::clamp(sample * 32768.0F, -32768.0F, 32767.0F);
+        appendLittleEndian(bytes, static_cast<std::uint32_t>(std::lrint(scaled)), 2);
+    }
+    return bytes;
+}
+
+std::string base64(std::string_view bytes) {
+    constexpr std::string_view digits =
+        "ABCDEFGHIJKLMNOPQRSTUVWXYZabcdefghijklmnopqrstuvwxyz0123456789+/";
+    std::string text;
+    text.reserve((bytes.size() + 2) / 3 * 4);
+    for (std::size_t at = 0; at < bytes.size(); at += 3) {
+        auto const group = bytes.substr(at, 3);
+        std::uint32_t bits = 0;
+        for (std::size_t i = 0; i < 3; ++i) {
+            bits = bits << 8 | (i < group.size() ? static_cast<unsigned char>(group[i]) : 0U);
+        }
+        for (std::size_t i = 0; i < 4; ++i) {
+            text += i <= group.size() ? digits[bits >> (18 - 6 * i) & 63U] : '=';
+        }
+    }
+    return text;
+}
+
+std::string html(std::string_view text) {
+    std::string safe;
+    for (char const c : text) {
+        switch (c) {
+            case '&':
+                safe += "&amp;";
+                break;
+            case '<':
+                safe += "&lt;";
+                break;
+            case '>':
+                safe += "&gt;";
+                break;
+            default:
+                safe += c;
+        }
+    }
+    return safe;
+}
+
+// JSON that cannot end the script element it stands in.
+std::string scriptSafe(nlohmann::ordered_json const& page) {
+    auto text = page.dump(-1, ' ', true, nlohmann::json::error_handler_t::replace);
+    for (auto at = text.find('<'); at != std::string::npos; at = text.find('<', at)) {
+        text.replace(at, 1, "\\u003c");
+    }
+    return text;
+}
+
+// Replaces each {{NAME}} once, in one pass over the template.
+std::string fill(std::string_view page,
+                 std::vector<std::pair<std::string_view, std::string>> const& values) {
+    std::string text;
+    while (!page.empty()) {
+        auto const open = page.find("{{");
+        text += page.substr(0, open);
+        if (open == std::string_view::npos) break;
+        auto const close = page.find("}}", open);
+        auto const name = page.substr(open + 2, close - open - 2);
+        auto const value =
+            std::ranges::find(values, name, &std::pair<std::string_view, std::string>::first);
+        if (value != values.end()) text += value->second;
+        page.remove_prefix(close + 2);
+    }
+    return text;
+}
+
+double power(std::span<float const> samples) {
+    return std::transform_reduce(samples.begin(), samples.end(), 0.0, std::plus<>(), [](float x) {
+        return static_cast<double>(x) * static_cast<double>(x);
+    });
+}
+
+double db(double meanPower) {
+    return 10.0 * std::log10(meanPower + 1e-12);
+}
+
+double lengthSeconds(Report const& report) {
+    return static_cast<double>(report.before.size()) / std::max(report.rateHz, 1);
+}
+
+std::vector<std::pair<std::string, std::string>> summary(Report const& report) {
+    std::vector<std::pair<std::string, std::string>> items{
+        {"Length", formatted("%.2f s", lengthSeconds(report))},
+        {"Rate", formatted("%d Hz", report.rateHz)}};
+    if (auto const pauses = pauseLevels(report); pauses.found) {
+        items.emplace_back("Pauses before", formatted("%.1f dBFS", pauses.beforeDb));
+        items.emplace_back("Pauses after", formatted("%.1f dBFS", pauses.afterDb));
+        items.emplace_back("Noise reduction",
+                           formatted("%.1f dB", pauses.beforeDb - pauses.afterDb));
+    }
+    if (!report.scores.empty()) {
+        double speechMs = 0.0;
+        for (auto const& segment : report.segments) speechMs += segment.endMs - segment.startMs;
+        items.emplace_back("Speech", formatted("%.2f s in %zu segments", speechMs / 1000.0,
+                                               report.segments.size()));
+    }
+    if (!report.levelsDb.empty()) {
+        auto levels = report.levelsDb;
+        auto const middle = levels.begin() + static_cast<std::ptrdiff_t>(levels.size() / 2);
+        std::ranges::nth_element(levels, middle);
+        items.emplace_back("Median noise level",
+                           formatted("%.1f dBFS", static_cast<double>(*middle)));
+    }
+    return items;
+}
+
+}  // namespace
+
+PauseLevels pauseLevels(Report const& report) {
+    struct Frame {
+        double before;
+        double after;
+    };
+    auto const size = static_cast<std::size_t>(std::max(report.rateHz * report.frameMs / 1000, 1));
+    std::vector<Frame> frames;
+    for (std::size_t at = 0; at + size <= report.before.size(); at += size) {
+        double const middleMs =
+            (static_cast<double>(at) + static_cast<double>(size) / 2) * 1000.0 / report.rateHz;
+        bool const speech = std::ranges::any_of(report.segments, [&](Segment const& segment) {
+            return segment.startMs <= middleMs && middleMs < segment.endMs;
+        });
+        if (speech) continue;
+        frames.push_back({power(std::span(report.before).subspan(at, size)),
+                          power(std::span(report.after).subspan(at, size))});
+    }
+    if (report.scores.empty()) {
+        std::ranges::sort(frames, {}, &Frame::before);
+        frames.resize((frames.size() + 9) / 10);
+    }
+    if (frames.empty()) return {};
+    double const samples = static_cast<double>(frames.size() * size);
+    PauseLevels levels{0.0, 0.0, true};
+    for (auto const& frame : frames) {
+        levels.beforeDb += frame.before;
+        levels.afterDb += frame.after;
+    }
+    levels.beforeDb = db(levels.beforeDb / samples);
+    levels.afterDb = db(levels.afterDb / samples);
+    return levels;
+}
+
+std::string renderPage(Report const& report) {
+    nlohmann::ordered_json data{{"file", report.file},
+                                {"seconds", lengthSeconds(report)},
+                                {"sampleRate", report.rateHz},
+                                {"frameMs", report.frameMs},
+                                {"summary", summary(report)},
+                                {"notes", report.notes},
+                                {"threshold", report.rules.threshold},
+                                {"release", report.rules.release},
+                                {"segments", nlohmann::json::array()},
+                                {"scores", nullptr},
+                                {"levels", nullptr}};
+    if (!report.scores.empty()) data["scores"] = report.scores;
+    if (!report.levelsDb.empty()) data["levels"] = report.levelsDb;
+    for (auto const& segment : report.segments) {
+        data["segments"].push_back({segment.startMs / 1000.0, segment.endMs / 1000.0});
+    }
+    return fill(reportTemplate, {{"TITLE", html(report.file)},
+                                 {"BEFORE", base64(wavBytes(report.before, report.rateHz))},
+                                 {"AFTER", base64(wavBytes(report.after, report.rateHz))},
+                                 {"DATA", scriptSafe(data)}});
+}
+
+}  // namespace morva::cli

@@ -1,0 +1,36 @@
+// One self-contained page that shows a sound before and after cleaning; drawn by its own script.
+#pragma once
+
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "segments.h"
+
+namespace morva::cli {
+
+struct Report {
+    std::string file;
+    int rateHz = 0;
+    int frameMs = 0;
+    std::vector<float> before;  // mono, -1..1
+    std::vector<float> after;   // as long as before
+    std::vector<float> scores;  // empty: no voice-activity model
+    std::vector<Segment> segments;
+    SegmentRules rules;
+    std::vector<float> levelsDb;  // re full scale; empty: no noise-level model
+    std::vector<std::string> notes;
+};
+
+// Mean power in decibels re full scale of the pauses, before and after. Pauses are the frames
+// outside the speech segments or, without voice scores, the quietest tenth of the frames.
+struct PauseLevels {
+    double beforeDb = 0.0;
+    double afterDb = 0.0;
+    bool found = false;
+};
+PauseLevels pauseLevels(Report const& report);
+
+std::string renderPage(Report const& report);
+
+}  // namespace morva::cli

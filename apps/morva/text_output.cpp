@@ -1,0 +1,48 @@
+#include "text_output.h"
+
+#include <cerrno>
+#include <cstdarg>
+#include <cstdio>
+#include <cstring>
+#include <fstream>
+
+#include "error.h"
+
+namespace morva::cli {
+
+std::string TextOutput::chosenFormat() const {
+    if (!format.empty()) return format;
+    auto const ending = file.extension();
+    return ending == ".csv" ? "csv" : ending == ".json" ? "json" : "text";
+}
+
+void TextOutput::write(Streams& streams, std::string const& text) const {
+    if (file.empty()) return streams.out(text);
+    std::ofstream stream(file, std::ios::binary);
+    stream << text << std::flush;
+    if (!stream) throw Error(file.string() + ": cannot be written: " + std::strerror(errno));
+}
+
+void addTextOutput(CLI::App& command, TextOutput& output) {
+    command.add_option("-o,--output", output.file, "File to write instead of standard output");
+    command
+        .add_option("--format", output.format,
+                    "text, csv or json (default: by the output's ending)")
+        ->check(CLI::IsMember({"text", "csv", "json"}));
+}
+
+std::string formatted(char const* format, ...) {
+    char text[512];
+    va_list arguments;
+    va_start(arguments, format);
+    int const length = std::vsnprintf(text, sizeof text, format, arguments);
+    va_end(arguments);
+    return std::string(text,
+                       std::min(static_cast<std::size_t>(std::max(length, 0)), sizeof text - 1));
+}
+
+std::string seconds(double milliseconds) {
+    return formatted("%.3f", milliseconds / 1000.0);
+}
+
+}  // namespace morva::cli
