@@ -139,6 +139,18 @@ TEST(HostileWeight, AnUnknownTypeCodeMakesItsValueTheNextRecord) {
     }
 }
 
+// What was read already does not count as left.
+TEST(HostileWeight, ACutRecordBehindABigOneAllocatesNothing) {
+    auto const read = [](std::string const& bytes) {
+        return measureAllocations([&] { Weight().read(bytes.data(), bytes.size()); }).total;
+    };
+    WeightWriter writer;
+    writer.add("big", WeightWriter::Vector(10'000));
+    auto const before = read(writer.bytes());
+    writer.header("cut", 3).number(9'000U);
+    EXPECT_LE(read(writer.bytes()), before + 1'000);
+}
+
 TEST(HostileWeight, ManyEmptyElementsAreKept) {
     WeightWriter writer;
     writer.add("rows", WeightWriter::Vectors(10'000)).add("end", 1);
