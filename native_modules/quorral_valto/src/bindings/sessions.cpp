@@ -82,6 +82,13 @@ napi_value Number(napi_env env, double number) {
     return value;
 }
 
+// A code as an integer needs no heap number.
+napi_value Code(napi_env env, int code) {
+    napi_value value = nullptr;
+    napi_create_int32(env, code, &value);
+    return value;
+}
+
 Optional<std::string> TextOf(napi_env env, napi_value value) {
     std::size_t length = 0;
     if (napi_get_value_string_utf8(env, value, nullptr, 0, &length) != napi_ok) return {};
@@ -101,7 +108,7 @@ napi_value Open(napi_env env, napi_callback_info info, Opener open, int (*close)
     napi_get_value_int32(env, arguments[1], &frameMs);
     try {
         const OpenResult result = open(rateHz, frameMs, TextOf(env, arguments[2]));
-        if (result.status != OpenStatus::kOpen) return Number(env, static_cast<int>(result.status));
+        if (result.status != OpenStatus::kOpen) return Code(env, static_cast<int>(result.status));
         auto session = std::make_unique<Session>(result.session, close);
         napi_value external = nullptr;
         if (napi_create_external(env, session.get(), DestroySession, nullptr, &external) !=
@@ -127,10 +134,10 @@ napi_value OpenVad(napi_env env, napi_callback_info info) {
 napi_value ProcessNc(napi_env env, napi_callback_info info) {
     const auto [handle, input, output] = ArgumentsOf<3>(env, info);
     const Session* const session = SessionOf(env, handle);
-    if (session == nullptr || !session->Is(ValtoNCReset)) return Number(env, kNoNcSession);
+    if (session == nullptr || !session->Is(ValtoNCReset)) return Code(env, kNoNcSession);
     const Samples from = SamplesOf(env, input);
     const Samples to = SamplesOf(env, output);
-    return Number(env, ValtoNCProcess(session->handle, from.data, from.count, to.data, to.count));
+    return Code(env, ValtoNCProcess(session->handle, from.data, from.count, to.data, to.count));
 }
 
 napi_value ProcessVad(napi_env env, napi_callback_info info) {
@@ -148,7 +155,7 @@ napi_value Close(napi_env env, napi_callback_info info) {
 
 napi_value InitializeEngine(napi_env env, napi_callback_info /*info*/) {
     try {
-        return Number(env, EnsureInitialized());
+        return Code(env, EnsureInitialized());
     } catch (const std::exception& failure) {
         napi_throw_error(env, nullptr, failure.what());
         return nullptr;

@@ -1,0 +1,141 @@
+/// <reference lib="esnext.disposable" />
+
+/** Sampling rates in hertz that sessions take. */
+export type SampleRate = 8000 | 12000 | 16000 | 24000 | 32000 | 44100 | 48000 | 88200 | 96000;
+
+/** Frame lengths in milliseconds that sessions take. */
+export type FrameDuration = 10 | 20 | 30 | 40;
+
+export declare const SAMPLE_RATES: readonly SampleRate[];
+export declare const FRAME_DURATIONS: readonly FrameDuration[];
+
+/** What went wrong, for programs. Codes never change their meaning. */
+export type ValtoErrorCode =
+  /** The native module cannot be loaded; the message lists the tried paths and a remedy. */
+  | 'ERR_VALTO_LOAD'
+  /** The processor lacks SSE 4.1 or AVX2. */
+  | 'ERR_VALTO_CPU'
+  /** The engine could not be created. */
+  | 'ERR_VALTO_ENGINE'
+  /** The install path holds a character that the engine cannot open files under. */
+  | 'ERR_VALTO_PATH'
+  /** A weight file is not beside the native module. */
+  | 'ERR_VALTO_WEIGHT_MISSING'
+  /** A weight file is damaged. */
+  | 'ERR_VALTO_WEIGHT_INVALID'
+  /** A session was opened before `initialize()`. */
+  | 'ERR_VALTO_NOT_INITIALIZED'
+  /** No registered model has that name. */
+  | 'ERR_VALTO_MODEL'
+  /** An argument has the wrong type. */
+  | 'ERR_VALTO_ARGUMENT'
+  /** The sampling rate is not one of `SAMPLE_RATES`. */
+  | 'ERR_VALTO_SAMPLE_RATE'
+  /** The frame length is not one of `FRAME_DURATIONS`. */
+  | 'ERR_VALTO_FRAME_DURATION'
+  /** A frame does not hold `frameSize` samples. */
+  | 'ERR_VALTO_FRAME_SIZE'
+  /** The engine refused to open the session. */
+  | 'ERR_VALTO_SESSION'
+  /** The engine failed on a frame. */
+  | 'ERR_VALTO_PROCESS'
+  /** The session was closed. */
+  | 'ERR_VALTO_CLOSED';
+
+/** The one error class of this package. */
+export declare class ValtoError extends Error {
+  readonly name: 'ValtoError';
+  readonly code: ValtoErrorCode;
+  /** The native layer's own code, where there is one. */
+  readonly nativeCode?: number;
+}
+
+/**
+ * Starts the engine and registers the shipped models. Succeeds when the engine is already running in
+ * this process, whoever started it. Blocks for some milliseconds while the weights are read.
+ * @throws {ValtoError}
+ */
+export declare function initialize(): void;
+
+/** Names of the noise-cancellation models, in the order of their sampling rates. */
+export declare function getNcModels(): Promise<string[]>;
+
+/**
+ * Chooses the noise-cancellation model for sessions opened from now on, in the whole process.
+ * `null` goes back to choosing by sampling rate. Open sessions keep their model.
+ * @throws {ValtoError} `ERR_VALTO_MODEL` for a name that is not registered.
+ */
+export declare function setNcModel(name: string | null): void;
+
+/** Names of the voice-activity models. */
+export declare function getVadModels(): Promise<string[]>;
+
+/**
+ * Chooses the voice-activity model for sessions opened from now on, in the whole process.
+ * @throws {ValtoError} `ERR_VALTO_MODEL` for a name that is not registered.
+ */
+export declare function setVadModel(name: string): void;
+
+export interface SessionOptions {
+  /** Sampling rate of the audio, in hertz. */
+  sampleRate: SampleRate;
+  /** Length of one frame, in milliseconds. */
+  frameMs: FrameDuration;
+  /** Model for this session alone; left out or `null`: the process's choice. */
+  model?: string | null;
+}
+
+declare class Session {
+  readonly sampleRate: SampleRate;
+  readonly frameMs: FrameDuration;
+  /** Samples per frame: `sampleRate * frameMs / 1000`. */
+  readonly frameSize: number;
+  readonly closed: boolean;
+  /** Ends the session and frees its state. Further calls do nothing. */
+  close(): void;
+  /** The same as `close()`, for `using`. */
+  [Symbol.dispose](): void;
+}
+
+/**
+ * Removes background noise from one stream of 16-bit mono audio, frame by frame. A multi-channel
+ * stream takes one session per channel.
+ */
+export declare class NoiseCanceller extends Session {
+  /** @throws {ValtoError} */
+  constructor(options: SessionOptions);
+  /**
+   * Cleans one frame into `output`, by default into the frame itself, and returns what it wrote to.
+   * Allocates nothing. The output runs a constant few tens of milliseconds behind the input.
+   * @throws {ValtoError}
+   */
+  process(frame: Int16Array): Int16Array;
+  process<Output extends Int16Array>(frame: Int16Array, output: Output): Output;
+}
+
+/** Tells frame by frame how likely one stream of 16-bit mono audio holds voice. */
+export declare class VoiceActivityDetector extends Session {
+  /** @throws {ValtoError} */
+  constructor(options: SessionOptions);
+  /**
+   * The voice score of one frame, 0 to 1; 0.5 is the model's best threshold.
+   * @throws {ValtoError}
+   */
+  process(frame: Int16Array): number;
+}
+
+/** The native module's own functions, unchanged. */
+export interface RawModule {
+  /** Throws an `Error` that names the start-up code; -4 when the engine is already running. */
+  _initialize(): void;
+  /** Calls back on a later turn of the event loop. */
+  _getNcModels(callback: (names: string[]) => void): void;
+  /** Anything but a string goes back to choosing by sampling rate. */
+  setNcModel(name: unknown): void;
+  /** Calls back on a later turn of the event loop. */
+  _getVadModels(callback: (names: string[]) => void): void;
+  /** Anything but a string changes nothing. */
+  setVadModel(name: unknown): void;
+}
+
+export declare const raw: RawModule;

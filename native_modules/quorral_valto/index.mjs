@@ -1,0 +1,16 @@
+// The same objects for `import`.
+import valto from './index.cjs';
+
+export const {
+  raw,
+  initialize,
+  getNcModels,
+  setNcModel,
+  getVadModels,
+  setVadModel,
+  NoiseCanceller,
+  VoiceActivityDetector,
+  ValtoError,
+  SAMPLE_RATES,
+  FRAME_DURATIONS,
+} = valto;

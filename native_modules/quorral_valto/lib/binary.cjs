@@ -1,0 +1,61 @@
+'use strict';
+// Finds and loads the native module. Its weight files and its resampling library lie beside it, so it
+// is always loaded from where it is installed, never from a copy.
+
+const fs = require('node:fs');
+const path = require('node:path');
+const { ValtoError } = require('./errors.cjs');
+
+const FILE = 'quorral_valto.node';
+const target = `${process.platform}-${process.arch}`;
+
+// An archive cannot be mapped by the system's loader; packagers put such files beside the archive.
+const outsideArchive = (file) => file.replace(/\.asar(?=[\\/])/g, '.asar.unpacked');
+
+function candidates() {
+  const root = path.join(__dirname, '..');
+  const packaged = path.join(root, 'prebuilds', target, FILE);
+  const built = path.join(root, '..', '..', 'build', 'release', 'quorral_valto', FILE);
+  return [...new Set([outsideArchive(packaged), packaged, built])];
+}
+
+function isMusl() {
+  return process.platform === 'linux' && !process.report?.getReport?.().header.glibcVersionRuntime;
+}
+
+function remedy() {
+  if (target !== 'linux-x64') return 'Only linux-x64 has a prebuilt binary.';
+  if (isMusl()) return 'The binary needs glibc; this system runs another C library (musl?).';
+  return (
+    'Reinstall the package. When the application is packed into an archive, keep the folder ' +
+    '"prebuilds" of this package unpacked.'
+  );
+}
+
+function load() {
+  const tried = [];
+  for (const file of candidates()) {
+    if (!fs.existsSync(file)) {
+      tried.push({ file, reason: 'no such file' });
+      continue;
+    }
+    try {
+      const raw = require(file);
+      // The same file once more, asked for its second export object.
+      const second = { exports: { sessions: {} } };
+      process.dlopen(second, file);
+      return { raw, sessions: second.exports.sessions, directory: path.dirname(file) };
+    } catch (cause) {
+      tried.push({ file, reason: cause.message, cause });
+    }
+  }
+  const lines = tried.map(({ file, reason }) => `  ${file}: ${reason}`);
+  throw new ValtoError(
+    'ERR_VALTO_LOAD',
+    `Cannot load the native module for ${target} (Node.js ${process.version}). Tried:\n` +
+      `${lines.join('\n')}\n${remedy()}`,
+    { cause: tried.find((attempt) => attempt.cause)?.cause },
+  );
+}
+
+module.exports = { load };

@@ -1,0 +1,70 @@
+'use strict';
+// Start-up and model choice over the five raw functions.
+
+const fs = require('node:fs');
+const path = require('node:path');
+const { ValtoError } = require('./errors.cjs');
+
+// Start-up codes -5 to -8 name the weight file that could not be registered.
+const WEIGHTS = {
+  '-5': 'NC_small_8k.mvw',
+  '-6': 'NC_small_16k.mvw',
+  '-7': 'c6.xs.f.ca03f4.mvw',
+  '-8': 'VAD_weight.mvw',
+};
+
+function startupError(nativeCode, directory) {
+  const fail = (code, message) => new ValtoError(code, message, { nativeCode });
+  if (nativeCode === -1) return fail('ERR_VALTO_CPU', 'The processor does not support SSE 4.1');
+  if (nativeCode === -2) return fail('ERR_VALTO_CPU', 'The processor does not support AVX2');
+  const weight = WEIGHTS[nativeCode];
+  if (weight === undefined) return fail('ERR_VALTO_ENGINE', 'The engine could not be created');
+  const file = path.join(directory, weight);
+  if (/[\u{10000}-\u{10FFFF}]/u.test(directory)) {
+    return fail(
+      'ERR_VALTO_PATH',
+      `The install path holds a character outside the Basic Multilingual Plane (an emoji?), ` +
+        `which the engine cannot open files under: ${directory}`,
+    );
+  }
+  if (!fs.existsSync(file)) {
+    return fail('ERR_VALTO_WEIGHT_MISSING', `The weight file is missing: ${file}`);
+  }
+  return fail('ERR_VALTO_WEIGHT_INVALID', `The weight file cannot be used: ${file}`);
+}
+
+function createModelFunctions({ raw, sessions, directory }) {
+  const choose = (setter, name) => {
+    try {
+      setter(name);
+    } catch (cause) {
+      throw new ValtoError('ERR_VALTO_MODEL', `${cause.message}: ${JSON.stringify(name)}`, {
+        cause,
+      });
+    }
+  };
+  const requireString = (name, allowed) => {
+    if (typeof name !== 'string') {
+      throw new ValtoError('ERR_VALTO_ARGUMENT', `A model is ${allowed}, not ${typeof name}`);
+    }
+  };
+
+  return {
+    initialize() {
+      const code = sessions.initialize();
+      if (code !== 0) throw startupError(code, directory);
+    },
+    getNcModels: () => new Promise((resolve) => raw._getNcModels(resolve)),
+    getVadModels: () => new Promise((resolve) => raw._getVadModels(resolve)),
+    setNcModel(name) {
+      if (name !== null) requireString(name, 'a string or null');
+      choose(raw.setNcModel, name);
+    },
+    setVadModel(name) {
+      requireString(name, 'a string');
+      choose(raw.setVadModel, name);
+    },
+  };
+}
+
+module.exports = { createModelFunctions };
