@@ -46,7 +46,7 @@ double gateModel(std::vector<double> const& frames, std::vector<double> const& a
 
 // Loud and quiet passages, as speech has them.
 Frame frameOf(Random& random, int step) {
-    float const level = step / 25 % 2 == 0 ? 900.0f : 90.0f;
+    float const level = step / 25 % 2 == 0 ? 900.0f : 160.0f;
     std::size_t const length = random.between(20, 60);
     return random.normal(length, level * random.uniform(0.5f, 1.5f));
 }
@@ -64,7 +64,7 @@ TEST_P(EnergyStatistics, GateFollowsTheModel) {
     TRACE_SEED(random);
     std::size_t const K = random.between(2, 12);
     std::size_t const M = random.between(1, 60);
-    float const threshold = 90.0f * 90.0f / static_cast<float>(K);
+    float const threshold = 400.0f * 400.0f / static_cast<float>(K);
     EnThreshold gate(K, M, threshold);
     std::vector<double> frames;
     std::vector<double> active;
