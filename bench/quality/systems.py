@@ -1,0 +1,63 @@
+"""What can be scored: weight files, other programs, and doing nothing.
+
+A system is named on the command line:
+    none                 the input as it is
+    NAME=model.mvw       a noise model, run by the NumPy reference of the engine
+    NAME=command         any program called as `command in.wav out.wav`
+"""
+from __future__ import annotations
+
+import shlex
+import subprocess
+import sys
+import tempfile
+from pathlib import Path
+from typing import Callable
+
+import numpy as np
+import soundfile
+
+sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "training"))
+
+from morva_training import mvw  # noqa: E402
+from morva_training.engine import NoiseModel  # noqa: E402
+
+from metrics import at_rate  # noqa: E402
+
+Process = Callable[[np.ndarray, int], np.ndarray]
+
+
+def from_weight(path: Path) -> Process:
+    weight = mvw.read(path)
+
+    def process(samples: np.ndarray, rate: int) -> np.ndarray:
+        model = NoiseModel(weight)
+        at_model = at_rate(samples, rate, model.layout.rate) * 32768.0
+        hop = model.layout.hop
+        padded = np.append(at_model, np.zeros(3 * hop - len(at_model) % hop, np.float32))
+        clean = np.concatenate([model.process(padded[i : i + hop]) for i in range(0, len(padded), hop)])
+        clean = clean[hop : hop + len(at_model)]  # the model's delay
+        return at_rate(clean / 32768.0, model.layout.rate, rate)[: len(samples)]
+
+    return process
+
+
+def from_command(command: str) -> Process:
+    def process(samples: np.ndarray, rate: int) -> np.ndarray:
+        with tempfile.TemporaryDirectory() as folder:
+            source, target = Path(folder) / "in.wav", Path(folder) / "out.wav"
+            soundfile.write(source, samples, rate, "PCM_16")
+            subprocess.run([*shlex.split(command), source, target], check=True, stdout=subprocess.DEVNULL)
+            result, result_rate = soundfile.read(target, dtype="float32", always_2d=True)
+        return at_rate(result[:, 0], result_rate, rate)
+
+    return process
+
+
+def parse(text: str) -> tuple[str, Process]:
+    if text == "none":
+        return "none", lambda samples, _rate: samples
+    name, _, rest = text.partition("=")
+    if not rest:
+        raise SystemExit(f"{text!r} is neither none nor NAME=model.mvw nor NAME=command")
+    return name, from_weight(Path(rest)) if rest.endswith(".mvw") else from_command(rest)

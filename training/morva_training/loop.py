@@ -1,0 +1,127 @@
+"""The training loop shared by all models: schedule, averaged weights, checkpoints, log.
+
+The learning rate warms up, stays, and falls to nothing over the last part of the run; a run that
+is resumed with another number of steps simply continues on the new schedule. The weights that are
+exported are an exponential moving average of the trained ones.
+"""
+from __future__ import annotations
+
+import copy
+import json
+import math
+import time
+from dataclasses import asdict, dataclass
+from pathlib import Path
+from typing import Callable, Iterator
+
+import torch
+from torch import Tensor, nn
+from tqdm import tqdm
+
+
+@dataclass
+class Schedule:
+    steps: int
+    peak: float = 1e-3
+    warm_up: int = 50
+    decay_share: float = 0.35
+    average: float = 0.998  # of the moving average of the weights
+    checkpoint_every: int = 50
+    validate_every: int = 100
+
+    def rate(self, step: int) -> float:
+        if step < self.warm_up:
+            return self.peak * (step + 1) / self.warm_up
+        left = (self.steps - step) / max(1.0, self.decay_share * self.steps)
+        return self.peak * (0.5 - 0.5 * math.cos(math.pi * min(1.0, max(0.0, left))))
+
+
+class Run:
+    """State of one training run in a folder: `checkpoint.pt`, `log.jsonl`."""
+
+    def __init__(self, network: nn.Module, folder: Path, schedule: Schedule, extra: dict | None = None) -> None:
+        self.network = network
+        self.folder = folder
+        self.schedule = schedule
+        self.extra = extra or {}
+        self.step = 0
+        self.seconds = 0.0
+        folder.mkdir(parents=True, exist_ok=True)
+        self.optimiser = torch.optim.AdamW(network.parameters(), lr=schedule.peak, betas=(0.9, 0.98), weight_decay=1e-3)
+        self.averaged = copy.deepcopy(network)
+        if self.checkpoint.exists():
+            self._resume()
+
+    @property
+    def checkpoint(self) -> Path:
+        return self.folder / "checkpoint.pt"
+
+    def _resume(self) -> None:
+        state = torch.load(self.checkpoint, map_location="cpu")
+        self.network.load_state_dict(state["network"])
+        self.averaged.load_state_dict(state["averaged"])
+        self.optimiser.load_state_dict(state["optimiser"])
+        self.step, self.seconds = state["step"], state["seconds"]
+        self.extra.update(state["extra"])
+
+    def save(self) -> None:
+        state = {
+            "network": self.network.state_dict(),
+            "averaged": self.averaged.state_dict(),
+            "optimiser": self.optimiser.state_dict(),
+            "step": self.step,
+            "seconds": self.seconds,
+            "extra": self.extra,
+            "schedule": asdict(self.schedule),
+        }
+        partial = self.checkpoint.with_suffix(".partial")
+        torch.save(state, partial)
+        partial.rename(self.checkpoint)
+
+    def log(self, entry: dict) -> None:
+        with (self.folder / "log.jsonl").open("a") as handle:
+            handle.write(json.dumps({"step": self.step, "seconds": round(self.seconds), **entry}) + "\n")
+
+    def _update_average(self) -> None:
+        decay = min(self.schedule.average, (self.step + 1) / (self.step + 10))
+        with torch.no_grad():
+            for slow, fast in zip(self.averaged.parameters(), self.network.parameters()):
+                slow.lerp_(fast, 1.0 - decay)
+
+    def train(
+        self,
+        batches: Iterator[dict[str, Tensor]],
+        loss_of: Callable[[nn.Module, dict[str, Tensor]], tuple[Tensor, dict[str, float]]],
+        validate: Callable[[nn.Module], dict[str, float]] | None = None,
+    ) -> None:
+        """Runs until the schedule's last step. A loss that is not finite is skipped and counted."""
+        sums: dict[str, float] = {}
+        started, before = time.monotonic(), self.seconds
+        bar = tqdm(total=self.schedule.steps, initial=self.step, mininterval=10.0, desc=self.folder.name)
+        while self.step < self.schedule.steps:
+            for group in self.optimiser.param_groups:
+                group["lr"] = self.schedule.rate(self.step)
+            loss, parts = loss_of(self.network, next(batches))
+            self.optimiser.zero_grad(set_to_none=True)
+            if torch.isfinite(loss):
+                loss.backward()
+                norm = nn.utils.clip_grad_norm_(self.network.parameters(), 1.0)
+                if torch.isfinite(norm):
+                    self.optimiser.step()
+                    self._update_average()
+            else:
+                parts = {"not_finite": 1.0}
+            self.step += 1
+            self.seconds = before + time.monotonic() - started
+            for name, value in parts.items():
+                sums[name] = sums.get(name, 0.0) + value
+            bar.update()
+            if self.step % self.schedule.checkpoint_every == 0 or self.step == self.schedule.steps:
+                every = self.schedule.checkpoint_every
+                self.log({name: round(value / every, 4) for name, value in sums.items()})
+                sums = {}
+                self.save()
+            if validate and (self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps):
+                result = validate(self.averaged)
+                self.log({f"dev_{name}": round(value, 4) for name, value in result.items()})
+        bar.close()

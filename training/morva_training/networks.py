@@ -1,0 +1,153 @@
+"""The three networks as PyTorch modules that run over whole sequences.
+
+All weights are stored inputs-down, outputs-across (x W + b), the way the weight file holds them,
+and every matrix that also sees the recurrent state has the state's rows first. Products with the
+features are done once for the whole sequence; only the state's share stays in the time loop.
+
+Shapes: features [B, T, F], state [B, H], results [B, T, K] before the output sigmoid.
+"""
+from __future__ import annotations
+
+import math
+from typing import List, Tuple
+
+import torch
+from torch import Tensor, nn
+from torch.nn import functional
+
+
+@torch.jit.script
+def normalised_recurrence(
+    inputs: Tensor, state: Tensor, gates: Tensor, branches: Tensor, gain: Tensor, bias: Tensor
+) -> Tuple[Tensor, Tensor]:
+    """Time loop of the layer-normalised gated layer.
+
+    inputs [T, B, 4H] (update, reset, rectified, linear), gates and branches [H, 2H],
+    gain and bias [2, H] (rectified, linear). Returns the states [T, B, H] and the last one.
+    """
+    size = state.shape[1]
+    states: List[Tensor] = []
+    for step in inputs.unbind(0):
+        open_ = torch.sigmoid(torch.addmm(step[:, : 2 * size], state, gates))
+        keep = open_[:, :size]
+        both = torch.addmm(step[:, 2 * size :], open_[:, size:] * state, branches)
+        both = functional.layer_norm(both.view(-1, 2, size), [size], None, None, 1e-12) * gain + bias
+        new = torch.relu(both[:, 0]) + both[:, 1]
+        state = new + keep * (state - new)
+        states.append(state)
+    return torch.stack(states), state
+
+
+@torch.jit.script
+def plain_recurrence(inputs: Tensor, state: Tensor, weights: Tensor) -> Tuple[Tensor, Tensor]:
+    """Time loop of the layer without normalisation and reset gate.
+
+    inputs [T, B, 3H] (gate, rectified, linear), weights [H, 3H]. The gate weighs the new value.
+    Returns the layer's outputs [T, B, H] (not the states) and the last state.
+    """
+    size = state.shape[1]
+    outputs: List[Tensor] = []
+    for step in inputs.unbind(0):
+        sums = torch.addmm(step, state, weights)
+        new = torch.relu(sums[:, size : 2 * size]) + sums[:, 2 * size :]
+        state = state + torch.sigmoid(sums[:, :size]) * (new - state)
+        outputs.append(new)
+    return torch.stack(outputs), state
+
+
+def _matrix(rows: int, cols: int) -> nn.Parameter:
+    bound = 1.0 / math.sqrt(rows)
+    return nn.Parameter(torch.empty(rows, cols).uniform_(-bound, bound))
+
+
+def _vector(size: int, value: float = 0.0) -> nn.Parameter:
+    return nn.Parameter(torch.full((size,), value))
+
+
+class LayerNormGatedNetwork(nn.Module):
+    """Network of the noise models of version 0.0.6."""
+
+    def __init__(self, features: int, hidden: int, outputs: int, layers: int = 3) -> None:
+        super().__init__()
+        if layers < 2:
+            raise ValueError("a network without a hidden layer has no memory")
+        self.features, self.hidden, self.outputs, self.layers = features, hidden, outputs, layers
+        width = hidden + features
+        self.update, self.update_bias = _matrix(width, hidden), _vector(hidden, 1.0)
+        self.reset, self.reset_bias = _matrix(width, hidden), _vector(hidden, 1.0)
+        rows = [width] + [hidden] * (layers - 2)
+        self.linear = nn.ParameterList([_matrix(r, hidden) for r in rows])
+        self.linear_bias = nn.ParameterList([_vector(hidden) for _ in rows])
+        self.rectified = nn.ParameterList([_matrix(r, hidden) for r in rows])
+        self.rectified_bias = nn.ParameterList([_vector(hidden) for _ in rows])
+        self.linear_gain = nn.ParameterList([_vector(hidden, 0.5) for _ in rows])
+        self.linear_offset = nn.ParameterList([_vector(hidden) for _ in rows])
+        self.rectified_gain = nn.ParameterList([_vector(hidden, 0.5) for _ in rows])
+        self.rectified_offset = nn.ParameterList([_vector(hidden) for _ in rows])
+        self.output, self.output_bias = _matrix(hidden, outputs), _vector(outputs, 1.0)
+
+    def initial_state(self, batch: int) -> Tensor:
+        return self.output.new_zeros(batch, self.hidden)
+
+    def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
+        first = (self.update, self.reset, self.rectified[0], self.linear[0])
+        biases = (self.update_bias, self.reset_bias, self.rectified_bias[0], self.linear_bias[0])
+        h = self.hidden
+        inputs = x.transpose(0, 1) @ torch.cat([w[h:] for w in first], 1) + torch.cat(biases)
+        y, state = normalised_recurrence(
+            inputs,
+            state,
+            torch.cat([w[:h] for w in first[:2]], 1),
+            torch.cat([w[:h] for w in first[2:]], 1),
+            torch.stack([self.rectified_gain[0], self.linear_gain[0]]),
+            torch.stack([self.rectified_offset[0], self.linear_offset[0]]),
+        )
+        for i in range(1, self.layers - 1):
+            a = functional.layer_norm(y @ self.rectified[i] + self.rectified_bias[i], [h], eps=1e-12)
+            b = functional.layer_norm(y @ self.linear[i] + self.linear_bias[i], [h], eps=1e-12)
+            a = a * self.rectified_gain[i] + self.rectified_offset[i]
+            y = torch.relu(a) + b * self.linear_gain[i] + self.linear_offset[i]
+        return (y @ self.output + self.output_bias).transpose(0, 1), state
+
+    def macs_per_frame(self) -> int:
+        """Multiply-adds of the matrix products for one frame."""
+        width, h = self.hidden + self.features, self.hidden
+        return 4 * width * h + 2 * h * h * (self.layers - 2) + h * self.outputs
+
+
+class PlainGatedNetwork(nn.Module):
+    """Network of version 0.0.5; with `linear_output` that of the voice-activity model."""
+
+    def __init__(self, features: int, hidden: int, outputs: int, layers: int = 3, linear_output: bool = False) -> None:
+        super().__init__()
+        if layers < 2:
+            raise ValueError("a network without a hidden layer has no memory")
+        self.features, self.hidden, self.outputs, self.layers = features, hidden, outputs, layers
+        self.linear_output = linear_output
+        width = hidden + features
+        self.update, self.update_bias = _matrix(width, hidden), _vector(hidden, -1.0)
+        rows = [width] + [hidden] * (layers - 2)
+        self.linear = nn.ParameterList([_matrix(r, hidden) for r in rows])
+        self.linear_bias = nn.ParameterList([_vector(hidden) for _ in rows])
+        self.rectified = nn.ParameterList([_matrix(r, hidden) for r in rows])
+        self.rectified_bias = nn.ParameterList([_vector(hidden) for _ in rows])
+        self.output = _matrix(hidden, outputs)
+        self.output_bias = _vector(outputs, 0.0 if linear_output else 1.0)
+
+    def initial_state(self, batch: int) -> Tensor:
+        return self.output.new_zeros(batch, self.hidden)
+
+    def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
+        h = self.hidden
+        first = (self.update, self.rectified[0], self.linear[0])
+        biases = (self.update_bias, self.rectified_bias[0], self.linear_bias[0])
+        inputs = x.transpose(0, 1) @ torch.cat([w[h:] for w in first], 1) + torch.cat(biases)
+        y, state = plain_recurrence(inputs, state, torch.cat([w[:h] for w in first], 1))
+        for i in range(1, self.layers - 1):
+            a = y @ self.rectified[i] + self.rectified_bias[i]
+            y = torch.relu(a) + y @ self.linear[i] + self.linear_bias[i]
+        return (y @ self.output + self.output_bias).transpose(0, 1), state
+
+    def macs_per_frame(self) -> int:
+        width, h = self.hidden + self.features, self.hidden
+        return 3 * width * h + 2 * h * h * (self.layers - 2) + h * self.outputs

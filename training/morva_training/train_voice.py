@@ -1,0 +1,128 @@
+"""Trains and calibrates the voice-activity model (8 kHz) and writes its weight file.
+
+The calibration uses the validation share of the training speakers: the middle is the logit with
+the best F1, low and high are the 1st and 99th percentile.
+"""
+from __future__ import annotations
+
+import argparse
+from pathlib import Path
+
+import numpy as np
+import torch
+from torch import Tensor, nn
+from torch.utils.data import DataLoader
+
+from . import mvw
+from .convert import plain_network, plain_values, timestamp
+from .loop import Run, Schedule
+from .mvw import Weight
+from .networks import PlainGatedNetwork
+from .voice import CONTEXT, FEATURES, FRAME, RATE, VoiceBatches, network_input
+
+SKIPPED_FRAMES = 5
+
+
+def area_under_curve(scores: np.ndarray, labels: np.ndarray) -> float:
+    order = np.sort(scores[~labels])
+    hits = scores[labels]
+    below = np.searchsorted(order, hits, "left") + np.searchsorted(order, hits, "right")
+    return float(below.mean() / (2 * max(1, len(order))))
+
+
+def best_threshold(scores: np.ndarray, labels: np.ndarray) -> tuple[float, float]:
+    """Threshold with the best F1, and that F1."""
+    order = np.argsort(-scores)
+    hits = np.cumsum(labels[order])
+    f1 = 2 * hits / (np.arange(1, len(scores) + 1) + labels.sum())
+    best = int(np.argmax(f1))
+    return float(scores[order][best]), float(f1[best])
+
+
+def voice_weight(network: PlainGatedNetwork, mean: np.ndarray, variance: np.ndarray, points: list[float]) -> Weight:
+    """A whole voice model; `points` are the logits for scores 0, one half and 1."""
+    low, middle, high = (np.array([p], np.float32) for p in points)
+    weight: Weight = {
+        "Version": b"VAD_0.0.1",
+        "ModelName": b"vad8",
+        "TimeStamp": timestamp(),
+        "SampleRate": RATE,
+        "FrameLength": FRAME,
+        "MU": mean.astype(np.float32),
+        "SD": variance.astype(np.float32),
+        "Test_MINMAX": np.concatenate([low, high]),
+        "Test_BestF1": middle,
+    }
+    weight.update(plain_values(network))
+    return weight
+
+
+def parse() -> argparse.Namespace:
+    parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
+    parser.add_argument("--store", type=Path, required=True)
+    parser.add_argument("--run", type=Path, required=True)
+    parser.add_argument("--out", type=Path, required=True)
+    parser.add_argument("--start", type=Path, help="weight file to start from")
+    parser.add_argument("--hidden", type=int, default=96)
+    parser.add_argument("--steps", type=int, default=1500)
+    parser.add_argument("--batch", type=int, default=48)
+    parser.add_argument("--rate", type=float, default=2e-3)
+    parser.add_argument("--seed", type=int, default=3)
+    parser.add_argument("--workers", type=int, default=1)
+    return parser.parse_args()
+
+
+def main() -> None:
+    args = parse()
+    device = torch.device("cuda" if torch.cuda.is_available() else "cpu")
+    torch.manual_seed(args.seed)
+    if device.type == "cpu":
+        torch.set_num_threads(1)
+    done = torch.load(args.run / "checkpoint.pt")["step"] if (args.run / "checkpoint.pt").exists() else 0
+    source = VoiceBatches(args.store, args.batch, args.seed + 7919 * done)
+    loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers, prefetch_factor=4))
+    if args.start:
+        weight = mvw.read(args.start)
+        network, mean, variance = plain_network(weight), weight["MU"], weight["SD"]
+    else:
+        some = torch.cat([next(loader)["features"].flatten(0, 1) for _ in range(4)])
+        mean, variance = some.mean(0).numpy(), some.var(0).clamp_min(1e-2).numpy()
+        network = PlainGatedNetwork(CONTEXT * FEATURES, args.hidden, 1, linear_output=True)
+    schedule = Schedule(args.steps, args.rate)
+    run = Run(network.to(device), args.run, schedule, {"mean": mean.tolist(), "variance": variance.tolist()})
+    mean_, variance_ = (torch.tensor(run.extra[k], device=device) for k in ("mean", "variance"))
+
+    def logits_of(model: nn.Module, features: Tensor) -> Tensor:
+        x = network_input(features.to(device), mean_, variance_)
+        return model(x, model.initial_state(len(x)))[0][..., 0]
+
+    def loss_of(model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
+        y = logits_of(model, batch["features"])[:, SKIPPED_FRAMES:]
+        voice, weight = (batch[k].to(device)[:, SKIPPED_FRAMES:] for k in ("voice", "weight"))
+        loss = nn.functional.binary_cross_entropy_with_logits(y, voice, weight)
+        return loss, {"loss": loss.item()}
+
+    held = iter(VoiceBatches(args.store, 48, 5, split="dev", blocks=1))
+    dev = [next(held) for _ in range(3)]
+
+    def dev_scores(model: nn.Module) -> tuple[np.ndarray, np.ndarray]:
+        with torch.no_grad():
+            scores = torch.cat([logits_of(model, b["features"])[:, SKIPPED_FRAMES:].flatten().cpu() for b in dev])
+        sure = torch.cat([b["weight"][:, SKIPPED_FRAMES:].flatten() for b in dev]) >= 1.0
+        voice = torch.cat([b["voice"][:, SKIPPED_FRAMES:].flatten() for b in dev]) > 0.5
+        return scores[sure].numpy(), voice[sure].numpy()
+
+    def validate(model: nn.Module) -> dict[str, float]:
+        scores, voice = dev_scores(model)
+        return {"auc": area_under_curve(scores, voice), "f1": best_threshold(scores, voice)[1]}
+
+    run.train(loader, loss_of, validate)
+    scores, voice = dev_scores(run.averaged)
+    low, high = np.percentile(scores, [1, 99])
+    points = [float(low), best_threshold(scores, voice)[0], float(high)]
+    mvw.write(args.out, voice_weight(run.averaged.cpu(), np.array(run.extra["mean"]), np.array(run.extra["variance"]), points))
+    print("calibration", points, validate(run.averaged))
+
+
+if __name__ == "__main__":
+    main()
