@@ -21,6 +21,7 @@ from scipy.signal import resample_poly
 from tqdm import tqdm
 
 BASE_RATE = 32000
+EXCLUDED_SPEAKERS = ("p232", "p257")  # the customary test speakers of VCTK: never trained on
 AUDIO_SUFFIXES = {".opus", ".wav", ".flac", ".ogg"}
 
 
@@ -37,9 +38,10 @@ class Clip:
 
 
 def read_manifest(table: Path) -> list[dict[str, str]]:
-    """Rows of a tab-separated manifest with a header line."""
+    """Rows of a tab-separated manifest with a header line, without the excluded speakers."""
     with table.open(newline="", encoding="utf-8") as handle:
-        return list(csv.DictReader(handle, delimiter="\t"))
+        rows = list(csv.DictReader(handle, delimiter="\t"))
+    return [row for row in rows if not row.get("speaker", "").endswith(EXCLUDED_SPEAKERS)]
 
 
 def rows_of_folder(folder: Path, kind: str) -> list[dict[str, str]]:
