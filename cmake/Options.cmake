@@ -21,6 +21,7 @@ add_library(morva_options INTERFACE)
 target_compile_options(morva_options INTERFACE
     -Wall -Wextra -Wpedantic -Werror -Wshadow -Wconversion -Wno-sign-conversion
     $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Wold-style-cast> -ffunction-sections -fdata-sections
+    $<$<CXX_COMPILER_ID:GNU>:-Wno-restrict>  # false alarms on std::string in GCC 12
     -fno-math-errno -ffp-contract=on)
 target_link_options(morva_options INTERFACE -Wl,--gc-sections)
 if(MORVA_SANITIZE)

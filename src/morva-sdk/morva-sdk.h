@@ -9,10 +9,11 @@
  *   4. Morva_SDK_GlobalDestroy, which also frees every session that is still open.
  *
  * Threads
- *   [control thread]  takes the engine's lock, allocates, prints; never call it from an audio callback.
- *   [audio thread]    takes no lock and, after the first frames, allocates nothing. One thread at a time
- *                     per session; different sessions may run on different threads at the same time.
- *   Do not close a session while a frame call on it runs, nor destroy the engine while any call runs.
+ *   [control thread]  takes the engine's lock, allocates, prints; never call it from an audio
+ * callback. [audio thread]    takes no lock and, after the first frames, allocates nothing. One
+ * thread at a time per session; different sessions may run on different threads at the same time.
+ *   Do not close a session while a frame call on it runs, nor destroy the engine while any call
+ * runs.
  *
  * Processor
  *   The engine needs an x86-64 processor with AVX2, FMA and BMI2; on any other Morva_SDK_GlobalInit
@@ -28,11 +29,11 @@
  *
  * Frames
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
- *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and are
- *   limited to that range (float output lies in -1..0.999969482421875). A NaN counts as 0, an infinite
- *   or absurdly large sample as a very loud one: the frame comes out limited, and nothing of it stays in
- *   the session beyond the network's normal memory.
- *   Input and output may be the same buffer.
+ *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and
+ * are limited to that range (float output lies in -1..0.999969482421875). A NaN counts as 0, an
+ * infinite or absurdly large sample as a very loud one: the frame comes out limited, and nothing of
+ * it stays in the session beyond the network's normal memory. Input and output may be the same
+ * buffer.
  */
 #ifndef MORVA_SDK_H
 #define MORVA_SDK_H
@@ -47,46 +48,42 @@
 #define MORVA_API
 #endif
 
+/* Enumerations cross the interface as plain 32-bit integers. */
 #ifdef __cplusplus
+#define MORVA_ENUM(name) enum name : int
 extern "C" {
+#else
+#define MORVA_ENUM(name) enum name
 #endif
 
 /* Sampling rates in hertz that the engine takes; nothing between them. */
-typedef enum MorvaSamplingRate {
-    MORVA_RATE_8000 = 8000,
-    MORVA_RATE_12000 = 12000,
-    MORVA_RATE_16000 = 16000,
-    MORVA_RATE_24000 = 24000,
-    MORVA_RATE_32000 = 32000,
-    MORVA_RATE_44100 = 44100,
-    MORVA_RATE_48000 = 48000,
-    MORVA_RATE_88200 = 88200,
-    MORVA_RATE_96000 = 96000
-} MorvaSamplingRate;
+typedef MORVA_ENUM(MorvaSamplingRate){
+    MORVA_RATE_8000 = 8000,   MORVA_RATE_12000 = 12000, MORVA_RATE_16000 = 16000,
+    MORVA_RATE_24000 = 24000, MORVA_RATE_32000 = 32000, MORVA_RATE_44100 = 44100,
+    MORVA_RATE_48000 = 48000, MORVA_RATE_88200 = 88200, MORVA_RATE_96000 = 96000} MorvaSamplingRate;
 
 /* Frame lengths in milliseconds that a session takes. */
-typedef enum MorvaFrameDuration {
-    MORVA_FRAME_10_MS = 10,
-    MORVA_FRAME_20_MS = 20,
-    MORVA_FRAME_30_MS = 30,
-    MORVA_FRAME_40_MS = 40
-} MorvaFrameDuration;
+typedef MORVA_ENUM(MorvaFrameDuration){MORVA_FRAME_10_MS = 10, MORVA_FRAME_20_MS = 20,
+                                       MORVA_FRAME_30_MS = 30,
+                                       MORVA_FRAME_40_MS = 40} MorvaFrameDuration;
 
-/* [control thread] Creates the engine. Relative model paths are resolved against `workingPath` (may be
- * null: no prefix). A `threads` of 1..8 is passed on to the math library; the sequential layer that the
- * engine links runs on the calling thread whatever the count. -3 when the engine exists already. */
+/* [control thread] Creates the engine. Relative model paths are resolved against `workingPath` (may
+ * be null: no prefix). A `threads` of 1..8 is passed on to the math library; the sequential layer
+ * that the engine links runs on the calling thread whatever the count. -3 when the engine exists
+ * already. */
 MORVA_API int Morva_SDK_GlobalInit(wchar_t const* workingPath, unsigned int threads);
 
 /* [control thread] Frees the engine, its models and all open sessions. -3 when there is none. */
 MORVA_API int Morva_SDK_GlobalDestroy(void);
 
 /* [control thread] Registers a model under a name of your choice, from a weight file ("mvw") or a
- * control file ("cfg": lines of key and value; WEIGHT names the weight file, every other key is a model
- * parameter). 0 when registered, 2 when not (reason on standard output). */
+ * control file ("cfg": lines of key and value; WEIGHT names the weight file, every other key is a
+ * model parameter). 0 when registered, 2 when not (reason on standard output). */
 MORVA_API int Morva_SDK_SetModel(wchar_t const* weightPath, char const* modelName);
 
 /* [control thread] The same from the bytes of a weight file in memory; the bytes are copied. */
-MORVA_API int Morva_SDK_SetModel_Blob(char const* weightBytes, unsigned int size, char const* modelName);
+MORVA_API int Morva_SDK_SetModel_Blob(char const* weightBytes, unsigned int size,
+                                      char const* modelName);
 
 /* [control thread] Open a session; null on failure. With a null `modelName` the engine takes the
  * registered model of the highest rate that is not above the input rate. */
@@ -102,30 +99,33 @@ MORVA_API int Morva_NC_CloseSession(void* session);
 MORVA_API int Morva_VAD_CloseSession(void* session);
 MORVA_API int Morva_NoiseDB_CloseSession(void* session);
 
-/* [audio thread] Brings a noise-level session back to its start: the same input then gives bit-equal
- * results again. Returns 1 (one) on success, -3 for a wrong handle. Rebuilds the resamplers, so it does
- * allocate. */
+/* [audio thread] Brings a noise-level session back to its start: the same input then gives
+ * bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle. Rebuilds the
+ * resamplers, so it does allocate. */
 MORVA_API int Morva_NoiseDB_ResetSession(void* session);
 
-/* [audio thread] Clean one frame. `inputSize` is the frame size at the input rate, `outputSize` at the
- * output rate; anything else is refused with 1 and changes nothing. 2 for a wrong handle. */
-MORVA_API int Morva_NC_CleanAmbientNoiseInt16(void* session, short const* input, unsigned int inputSize,
-                                              short* output, unsigned int outputSize);
-MORVA_API int Morva_NC_CleanAmbientNoiseFloat(void* session, float const* input, unsigned int inputSize,
-                                              float* output, unsigned int outputSize);
+/* [audio thread] Clean one frame. `inputSize` is the frame size at the input rate, `outputSize` at
+ * the output rate; anything else is refused with 1 and changes nothing. 2 for a wrong handle. */
+MORVA_API int Morva_NC_CleanAmbientNoiseInt16(void* session, short const* input,
+                                              unsigned int inputSize, short* output,
+                                              unsigned int outputSize);
+MORVA_API int Morva_NC_CleanAmbientNoiseFloat(void* session, float const* input,
+                                              unsigned int inputSize, float* output,
+                                              unsigned int outputSize);
 
-/* [audio thread] Voice score of one frame, 0..1 for a calibrated model. Negative on failure: -1.0 an
- * exception of unknown type, -2.0 a standard exception, -3.0 an engine exception (Int16: also a wrong frame size), -4.0 a wrong
- * handle (Float: also a wrong frame size, and any result outside 0..1). */
+/* [audio thread] Voice score of one frame, 0..1 for a calibrated model. Negative on failure: -1.0
+ * an exception of unknown type, -2.0 a standard exception, -3.0 an engine exception (Int16: also a
+ * wrong frame size), -4.0 a wrong handle (Float: also a wrong frame size, and any result outside
+ * 0..1). */
 MORVA_API float Morva_VAD_FrameInt16(void* session, short const* input, unsigned int inputSize);
 MORVA_API float Morva_VAD_FrameFloat(void* session, float const* input, unsigned int inputSize);
 
 /* [audio thread] Noise level after one frame, in decibels re one squared unit of the 16-bit sample
- * scale: -60 for silence, about 90.3 for a full-scale square wave. Errors of the Int16 call as above (a
- * level equal to one of those codes cannot be told from it).
- * The Float call answers only levels within 0..1 dB; every other level is refused like a wrong handle:
- * "THE CLEANING ERROR OUTPUT result <level>" and the wrong-session line are printed and -4.0 returned,
- * while the session goes on as usual. Use the Int16 call for levels. */
+ * scale: -60 for silence, about 90.3 for a full-scale square wave. Errors of the Int16 call as
+ * above (a level equal to one of those codes cannot be told from it). The Float call answers only
+ * levels within 0..1 dB; every other level is refused like a wrong handle: "THE CLEANING ERROR
+ * OUTPUT result <level>" and the wrong-session line are printed and -4.0 returned, while the
+ * session goes on as usual. Use the Int16 call for levels. */
 MORVA_API float Morva_NoiseDB_FrameInt16(void* session, short const* input, unsigned int inputSize);
 MORVA_API float Morva_NoiseDB_FrameFloat(void* session, float const* input, unsigned int inputSize);
 

@@ -1,0 +1,9 @@
+// The processor check of the C interface. Runs on any x86-64. [any thread]
+#pragma once
+
+namespace MORVA::MORVA_SDK {
+
+// The missing feature's name, or null when the engine's code can run here.
+char const* missingProcessorFeature();
+
+}  // namespace MORVA::MORVA_SDK

@@ -1,0 +1,48 @@
+// Turns whatever a body throws into a line on standard error and a result: the one way by which
+// failures leave the C interface. [any thread]
+#pragma once
+
+#include <exception>
+#include <iostream>
+#include <string>
+
+#include "utils/exception.h"
+
+namespace MORVA::MORVA_SDK {
+
+// What a function returns for the three classes of exception.
+template <class Result>
+struct FailureCodes {
+    Result unknown;
+    Result standard;
+    Result engine;
+};
+
+inline constexpr FailureCodes<int> kIntFailures{-1, -2, -3};
+inline constexpr FailureCodes<float> kFloatFailures{-1.0f, -2.0f, -3.0f};
+inline constexpr FailureCodes<void*> kHandleFailures{nullptr, nullptr, nullptr};
+
+inline void printError(char const* text) noexcept {
+    try {
+        std::cerr << text << std::endl;
+    } catch (...) {  // a stream that throws is set up by the host; there is nobody left to tell
+    }
+}
+
+template <class Result, class Body>
+Result funnel(FailureCodes<Result> const& codes, Body&& body) noexcept {
+    try {
+        return body();
+    } catch (UTILS::MORVA_Exception const& failure) {
+        printError(failure.what());
+        return codes.engine;
+    } catch (std::exception const& failure) {
+        printError(failure.what());
+        return codes.standard;
+    } catch (...) {
+        printError("UNDEFINED EXCEPTION");
+        return codes.unknown;
+    }
+}
+
+}  // namespace MORVA::MORVA_SDK

@@ -1,0 +1,122 @@
+#include "morva-sdk/instance.h"
+
+#include <algorithm>
+#include <atomic>
+#include <iostream>
+
+#include "utils/exception.h"
+
+namespace MORVA::MORVA_SDK {
+namespace {
+
+constexpr char const* kUnit = "src/morva-sdk/instance";
+
+// Sessions without sound of their own are built for this output rate.
+constexpr MorvaSamplingRate kValueSessionRate = MORVA_RATE_16000;
+
+// What audio threads read; the holder inside Instance owns it.
+std::atomic<MorvaInstanceT*> current{nullptr};
+
+}  // namespace
+
+MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
+    static std::unique_ptr<MorvaInstanceT> holder;
+    switch (mode) {
+        case MODE::get: {
+            auto* const instance = current.load(std::memory_order_acquire);
+            if (instance == nullptr) {
+                UTILS::raise("TRY TO GET NULL INSTANCE,ISN'T INITIALIZED", kUnit, "Instance");
+            }
+            return instance;
+        }
+        case MODE::create: {
+            std::lock_guard const lock(mutexForInputs_);
+            if (holder) {
+                UTILS::raise("DOUBLE INITIALIZATION WITHOUT DESTROYING", kUnit, "Instance");
+            }
+            holder = std::make_unique<MorvaInstanceT>(path != nullptr ? path : L"");
+            current.store(holder.get(), std::memory_order_release);
+            return holder.get();
+        }
+        case MODE::destroy: {
+            std::lock_guard const lock(mutexForInputs_);
+            if (!holder) UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
+            current.store(nullptr, std::memory_order_release);
+            auto const dying = std::move(holder);
+            return nullptr;
+        }
+    }
+    UTILS::raise("Incorrect instance access mode...", kUnit, "Instance");
+}
+
+MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : workingPath_(path) {}
+
+MorvaInstanceT::~MorvaInstanceT() {
+    clearAll();
+}
+
+MorvaSessionT* MorvaInstanceT::createSession(MorvaSamplingRate inputRate,
+                                             MorvaSamplingRate outputRate,
+                                             MorvaFrameDuration duration, char const* modelName,
+                                             MorvaSessionType type) {
+    std::lock_guard const lock(mutexForInputs_);
+    std::list<std::unique_ptr<MorvaSessionT>> fresh;
+    fresh.push_back(
+        std::make_unique<MorvaSessionT>(inputRate, outputRate, duration, modelName, type));
+    auto* const session = fresh.back().get();
+    directory_.add(session);
+    sessions_.splice(sessions_.end(), fresh);
+    return session;
+}
+
+MorvaSessionT* MorvaInstanceT::createNCSession(MorvaSamplingRate inputRate,
+                                               MorvaSamplingRate outputRate,
+                                               MorvaFrameDuration duration, char const* modelName) {
+    return createSession(inputRate, outputRate, duration, modelName,
+                         MorvaSessionType::NoiseCancellation);
+}
+
+MorvaSessionT* MorvaInstanceT::createVADSession(MorvaSamplingRate rate, MorvaFrameDuration duration,
+                                                char const* modelName) {
+    return createSession(rate, kValueSessionRate, duration, modelName,
+                         MorvaSessionType::VoiceActivity);
+}
+
+MorvaSessionT* MorvaInstanceT::createNoiseDBSession(MorvaSamplingRate rate,
+                                                    MorvaFrameDuration duration,
+                                                    char const* modelName) {
+    return createSession(rate, kValueSessionRate, duration, modelName,
+                         MorvaSessionType::NoiseLevel);
+}
+
+bool MorvaInstanceT::isSessionTrue(MorvaSessionT* session) const {
+    return directory_.contains(session);
+}
+
+MorvaSessionType MorvaInstanceT::getSessionType(MorvaSessionT* session) const {
+    return directory_.contains(session) ? session->getType() : MorvaSessionType::Unknown;
+}
+
+bool MorvaInstanceT::destroySession(MorvaSessionT* session) {
+    std::lock_guard const lock(mutexForInputs_);
+    auto const found = std::ranges::find(sessions_, session, &std::unique_ptr<MorvaSessionT>::get);
+    if (found == sessions_.end()) {
+        std::cout << "WARNING SESSION ISN'T FOUND" << std::endl;
+        return false;
+    }
+    directory_.remove(session);
+    sessions_.erase(found);
+    return true;
+}
+
+bool MorvaInstanceT::clearAll() {
+    for (auto const& session : sessions_) directory_.remove(session.get());
+    sessions_.clear();
+    while (!modelEnvironments_.empty()) modelEnvironments_.pop_back();
+    modelNames_.clear();
+    weightIdentities_.clear();
+    workingPath_ = UTILS::Path(L"");
+    return true;
+}
+
+}  // namespace MORVA::MORVA_SDK

@@ -1,0 +1,193 @@
+#include "morva-sdk/session.h"
+
+#include <algorithm>
+#include <iostream>
+#include <span>
+
+#include "noise_canceller/hop_pipeline.h"
+#include "utils/exception.h"
+#include "utils/flush_to_zero.h"
+#include "utils/pcm.h"
+
+namespace MORVA::MORVA_SDK {
+namespace {
+
+constexpr char const* kUnit = "src/morva-sdk/session";
+
+// The two sample types differ in their texts and conversions, and in nothing else.
+struct Int16Samples {
+    static constexpr char const* sizeError =
+        "ERROR input dataSize or output dataSize or pointers of inputData output Data is wrong\n "
+        "input "
+        "size must be ";
+    static void read(std::span<short const> in, std::span<float> out) {
+        UTILS::pcm16ToFloat(in, out);
+    }
+    static void write(std::span<float const> in, std::span<short> out) {
+        UTILS::floatToPcm16(in, out);
+    }
+};
+
+struct FloatSamples {
+    static constexpr char const* sizeError =
+        "ERROR input dataSize or output dataSize is wrong \n input size must be ";
+    static void read(std::span<float const> in, std::span<float> out) {
+        UTILS::unitToPcm16Scale(in, out);
+    }
+    static void write(std::span<float const> in, std::span<float> out) {
+        UTILS::pcm16ScaleToUnit(in, out);
+    }
+};
+
+constexpr bool isSessionDuration(MorvaFrameDuration duration) {
+    int const ms = duration;
+    return ms == 10 || ms == 20 || ms == 30 || ms == 40;
+}
+
+// What a voice-activity session answers frames with has no samples.
+std::size_t outputSamples(MorvaFrameDuration duration, MorvaSamplingRate rate,
+                          MorvaSessionType type) {
+    return type == MorvaSessionType::VoiceActivity ? static_cast<std::size_t>(duration) / 1000
+                                                   : getSampleCount(duration, rate);
+}
+
+}  // namespace
+
+std::size_t getSampleCount(MorvaFrameDuration duration, MorvaSamplingRate rate) {
+    double const samples = static_cast<double>(rate) * static_cast<double>(duration) / 1000.0;
+    return samples > 0.0 ? static_cast<std::size_t>(samples) : 0;
+}
+
+MorvaSessionT::MorvaSessionT(MorvaSamplingRate inputRate, MorvaSamplingRate outputRate,
+                             MorvaFrameDuration duration, char const* modelName,
+                             MorvaSessionType type)
+    : type_(type),
+      cleaner_(NOISE_CANCELLER::NoiseCleaner::create(inputRate, duration, modelName, type)) {
+    // After the model, so that a missing model is what the caller hears about first; before the
+    // resamplers, which cannot be built for every duration.
+    if (!isSessionDuration(duration)) {
+        UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
+    }
+    auto const modelRate = cleaner_->environment()->first->getWeightInfo().first;
+    auto const modelFrame = getSampleCount(duration, modelRate);
+    auto const soundRate = type == MorvaSessionType::VoiceActivity ? modelRate : outputRate;
+    inputFrameSize_ = getSampleCount(duration, inputRate);
+    outputFrameSize_ = outputSamples(duration, outputRate, type);
+    inputResampler_ = std::make_unique<UTILS::Resampler>(inputFrameSize_, modelFrame);
+    outputResampler_ =
+        std::make_unique<UTILS::Resampler>(modelFrame, getSampleCount(duration, soundRate));
+    auto const longest = std::max({inputFrameSize_, modelFrame, outputFrameSize_});
+    frame_.reserve(longest);
+    resampled_.reserve(longest);
+}
+
+void MorvaSessionT::through(UTILS::Resampler& resampler) {
+    if (resampler.ratio() == 1.0) return;
+    if (resampler.resample(frame_, resampled_) > 0) frame_.swap(resampled_);
+}
+
+void MorvaSessionT::cleanFrame() {
+    through(*inputResampler_);
+    UTILS::clipToPcm16(frame_);
+    cleaner_->cleanNoise(frame_);
+    through(*outputResampler_);
+    UTILS::clipToPcm16(frame_);
+}
+
+template <class Format, class Sample>
+bool MorvaSessionT::cleanSamples(Sample const* input, std::size_t inputSize, Sample* output,
+                                 std::size_t outputSize) {
+    if (input == nullptr || output == nullptr || inputSize != inputFrameSize_ ||
+        outputSize != outputFrameSize_) {
+        std::cerr << Format::sizeError << inputFrameSize_ << "\n output size must be "
+                  << outputFrameSize_ << std::endl;
+        return false;
+    }
+    UTILS::ScopedFlushToZero const fast;
+    frame_.resize(inputSize);
+    Format::read({input, inputSize}, frame_);
+    cleanFrame();
+    std::size_t const written = std::min(frame_.size(), outputSize);
+    Format::write({frame_.data(), written}, {output, written});
+    return true;
+}
+
+bool MorvaSessionT::cleanNoise(short const* input, std::size_t inputSize, short* output,
+                               std::size_t outputSize) {
+    return cleanSamples<Int16Samples>(input, inputSize, output, outputSize);
+}
+
+bool MorvaSessionT::cleanNoise(float const* input, std::size_t inputSize, float* output,
+                               std::size_t outputSize) {
+    return cleanSamples<FloatSamples>(input, inputSize, output, outputSize);
+}
+
+template <class Format, class Sample>
+bool MorvaSessionT::takeFrame(Sample const* input, std::size_t inputSize) {
+    if (input == nullptr || inputSize != inputFrameSize_) {
+        std::cerr << Format::sizeError << inputFrameSize_ << "\n output size must be " << std::endl;
+        return false;
+    }
+    frame_.resize(inputSize);
+    Format::read({input, inputSize}, frame_);
+    return true;
+}
+
+float MorvaSessionT::modelValue() {
+    UTILS::ScopedFlushToZero const fast;
+    through(*inputResampler_);
+    UTILS::clipToPcm16(frame_);
+    cleaner_->cleanNoise(frame_);
+    return frame_.front();
+}
+
+float MorvaSessionT::frameValue(short const* input, std::size_t inputSize, char const* function) {
+    if (!takeFrame<Int16Samples>(input, inputSize)) {
+        UTILS::raise("ERROR in input values", kUnit, function);
+    }
+    return modelValue();
+}
+
+float MorvaSessionT::frameValue(float const* input, std::size_t inputSize) {
+    return takeFrame<FloatSamples>(input, inputSize) ? modelValue() : -2.0f;
+}
+
+float MorvaSessionT::frameVad(short const* input, std::size_t inputSize) {
+    return frameValue(input, inputSize, "frameVad");
+}
+
+float MorvaSessionT::frameVad(float const* input, std::size_t inputSize) {
+    return frameValue(input, inputSize);
+}
+
+float MorvaSessionT::frameNoiseDB(short const* input, std::size_t inputSize) {
+    return frameValue(input, inputSize, "frameNoiseDB");
+}
+
+float MorvaSessionT::frameNoiseDB(float const* input, std::size_t inputSize) {
+    return frameValue(input, inputSize);
+}
+
+bool MorvaSessionT::resetNoiseDBSession() {
+    cleaner_->resetSession();
+    inputResampler_->reset();
+    outputResampler_->reset();
+    return true;
+}
+
+double MorvaSessionT::latencySamples() const {
+    if (type_ != MorvaSessionType::NoiseCancellation) return 0.0;
+    auto const [modelRate, modelFrameMs] = cleaner_->environment()->first->getWeightInfo();
+    double const toModel = inputResampler_->ratio();
+    double const toOutput = outputResampler_->ratio();
+    auto const modelFrame = static_cast<double>(inputFrameSize_) * toModel;
+    double const frameMs = modelFrame * 1000.0 / static_cast<double>(modelRate);
+    auto const pipelineMs = NOISE_CANCELLER::pipelineDelayMs(
+        static_cast<std::size_t>(modelFrameMs), static_cast<std::size_t>(frameMs + 0.5));
+    auto const pipeline = pipelineMs * static_cast<std::size_t>(modelRate) / 1000;
+    auto const before = inputResampler_->leadingZeros(inputFrameSize_) + pipeline;
+    auto const after = outputResampler_->leadingZeros(static_cast<std::size_t>(modelFrame + 0.5));
+    return static_cast<double>(before) * toOutput + static_cast<double>(after);
+}
+
+}  // namespace MORVA::MORVA_SDK

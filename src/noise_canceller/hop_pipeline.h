@@ -1,0 +1,73 @@
+// Fits the caller's frames to the model's hops: queues samples, calls the model once per hop on a
+// frame of two hops, overlap-adds what it returns, and hands back frames of the caller's length at
+// a fixed delay. All lengths in samples at the model's rate unless a name says Ms. One thread at a
+// time.
+#pragma once
+
+#include <cstddef>
+#include <span>
+#include <vector>
+
+#include "utils/cyclic_block_data.h"
+
+namespace MORVA::NOISE_CANCELLER {
+
+// The pipeline's delay in milliseconds for a model frame and a session frame of these lengths; 0
+// for a pair that is not supported.
+std::size_t pipelineDelayMs(std::size_t modelFrameMs, std::size_t sessionFrameMs);
+
+class HopPipeline {
+public:
+    struct Shape {
+        std::size_t rateHz;
+        std::size_t hop;
+        std::size_t modelFrameMs;
+        std::size_t sessionFrameMs;
+    };
+
+    // The hop of input that a model step stands for, and the hop of output that it completes.
+    struct CompletedHop {
+        std::span<float const> input;
+        std::span<float const> output;
+    };
+
+    explicit HopPipeline(Shape const& shape);
+
+    // Empties both queues and fills them with their initial silence.
+    void reset();
+
+    std::size_t delay() const { return delay_; }
+
+    // `model(float const* in, std::vector<float>& out)` reads two hops and leaves two windowed
+    // hops. `observe(CompletedHop)` is called after each of them. `frame` holds one session frame;
+    // it is replaced by as many delayed output samples.
+    template <class Model, class Observe>
+    void process(std::vector<float>& frame, Model&& model, Observe&& observe) {
+        input_.push_back(frame.data(), frame.size());
+        while (input_.unread() >= 2 * shape_.hop) {
+            model(input_.readPosition(), modelFrame_);
+            overlapAdd();
+            observe(CompletedHop{{input_.readPosition(), shape_.hop}, completedOutput()});
+            input_.start += shape_.hop;
+        }
+        takeOutput(frame);
+    }
+
+    template <class Model>
+    void process(std::vector<float>& frame, Model&& model) {
+        process(frame, model, [](CompletedHop const&) {});
+    }
+
+private:
+    void overlapAdd();
+    std::span<float const> completedOutput() const;
+    void takeOutput(std::vector<float>& frame);
+
+    Shape shape_;
+    std::size_t delay_;
+    CONTAINERS::CyclicBlockData input_;
+    CONTAINERS::CyclicBlockData output_;
+    std::vector<float> modelFrame_;
+};
+
+}  // namespace MORVA::NOISE_CANCELLER

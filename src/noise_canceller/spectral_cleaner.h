@@ -1,0 +1,72 @@
+// One model frame from samples to features and, with the network's mask, back to samples. The
+// network runs between the two halves and belongs to the model class:
+//
+//   analyse(in, x)      window, FFT, level reference, band powers, compression, log features,
+//   context
+//   ... network: x from features to compressed mask ...
+//   applyMask(x)        mask shaping, energy gate, inverse FFT, output gain; leaves the frame in
+//   frame()
+//   ... stages that work on the cleaned frame ...
+//   finish(out)         synthesis window, peak limiter
+//
+// Samples are on the 16-bit scale. One thread at a time; windows and transform are shared and only
+// read.
+#pragma once
+
+#include <complex>
+#include <optional>
+#include <vector>
+
+#include "noise_canceller/feature_context.h"
+#include "noise_canceller/mask_shaper.h"
+#include "noise_canceller/shared_objects.h"
+#include "noise_canceller/spectral_params.h"
+#include "utils/en_threshold.h"
+#include "utils/mean_energy.h"
+#include "utils/noise.h"
+
+namespace MORVA::NOISE_CANCELLER {
+
+class SpectralCleaner {
+public:
+    // `params` must outlive this object.
+    SpectralCleaner(SpectralParams const& params, CONTAINERS::AnyMap& environment,
+                    Generation const& generation);
+
+    // Back to the state after construction.
+    void reset();
+
+    // `in` holds FrameLength samples; `x` receives the network's input.
+    void analyse(float const* in, std::vector<float>& x);
+    // `mask` holds one value per band.
+    void applyMask(std::vector<float> const& mask);
+    // The cleaned frame between applyMask and finish.
+    std::vector<float>& frame() { return frame_; }
+    void finish(std::vector<float>& out);
+
+    // The window that the cleaned frame goes through.
+    std::vector<float> const& synthesisWindow() const { return *synthesis_; }
+
+private:
+    void buildLevelReference();
+    float levelGain(float const* in);
+
+    SpectralParams const& params_;
+    LevelReference level_;
+    SharedWindow analysis_;
+    SharedWindow synthesis_;
+    SharedTransform transform_;
+
+    std::optional<UTILS::EnThreshold> gate_;
+    std::optional<UTILS::MeanEnergy> meanEnergy_;
+    std::optional<UTILS::Noise> noiseMean_;
+    FeatureContext context_;
+    MaskShaper shaper_;
+
+    std::vector<float> windowed_;
+    std::vector<std::complex<float>> spectrum_;
+    std::vector<float> features_;
+    std::vector<float> frame_;
+};
+
+}  // namespace MORVA::NOISE_CANCELLER
