@@ -8,7 +8,7 @@
 #include <string>
 #include <string_view>
 
-#include "support/weight_writer.h"
+#include "support/record_writer.h"
 
 namespace test_support {
 

@@ -1,102 +1,20 @@
-// Writes weight data for tests: single records of every type, and whole models with consistent
-// shapes. Everything is a function of its arguments (seeds included), so a failing case can be made
-// again.
+// Writes whole models for tests, with consistent shapes. Everything is a function of its arguments
+// (seeds included), so a failing case can be made again.
 #pragma once
 
+#include <algorithm>
 #include <cmath>
-#include <cstdint>
-#include <filesystem>
-#include <fstream>
 #include <random>
 #include <string>
-#include <string_view>
 #include <vector>
 
-#include "utils/matrix.h"
+#include "support/record_writer.h"
 
 namespace test_support {
 
-// Appends records; every add returns the writer for chaining. `recordEnds` tells where each one
-// ends.
-class WeightWriter {
-public:
-    using Vector = std::vector<float>;
-    using Vectors = std::vector<Vector>;
-    using Matrix = MORVA::CONTAINERS::Matrix;
-    using Matrices = std::vector<Matrix>;
-
-    // Building blocks, for hostile data too.
-    template <class Number>
-    WeightWriter& number(Number value) {
-        static_assert(sizeof(value) == 4);
-        bytes_.append(reinterpret_cast<char const*>(&value), sizeof(value));
-        return *this;
-    }
-    WeightWriter& raw(std::string_view bytes) {
-        bytes_.append(bytes);
-        return *this;
-    }
-    WeightWriter& header(std::string_view name, std::int32_t typeCode) {
-        return count(name.size()).raw(name).number(typeCode);
-    }
-
-    WeightWriter& add(std::string_view name, float value) {
-        return header(name, 0).number(value).endRecord();
-    }
-    WeightWriter& add(std::string_view name, int value) {
-        return header(name, 1).number(value).endRecord();
-    }
-    WeightWriter& add(std::string_view name, std::string_view value) {
-        return header(name, 2).count(value.size()).raw(value).endRecord();
-    }
-    WeightWriter& add(std::string_view name, char const* value) {
-        return add(name, std::string_view(value));
-    }
-    WeightWriter& add(std::string_view name, Vector const& value) {
-        return header(name, 3).block(value).endRecord();
-    }
-    WeightWriter& add(std::string_view name, Matrix const& value) {
-        return header(name, 4).block(value).endRecord();
-    }
-    WeightWriter& add(std::string_view name, Vectors const& value) {
-        return header(name, 5).blocks(value).endRecord();
-    }
-    WeightWriter& add(std::string_view name, Matrices const& value) {
-        return header(name, 6).blocks(value).endRecord();
-    }
-
-    std::string const& bytes() const { return bytes_; }
-    std::vector<std::size_t> const& recordEnds() const { return recordEnds_; }
-
-private:
-    WeightWriter& count(std::size_t value) { return number(static_cast<std::uint32_t>(value)); }
-    WeightWriter& floats(Vector const& values) {
-        return raw({reinterpret_cast<char const*>(values.data()), values.size() * sizeof(float)});
-    }
-    WeightWriter& block(Vector const& value) { return count(value.size()).floats(value); }
-    WeightWriter& block(Matrix const& value) {
-        return count(value.rows).count(value.cols).floats(value.data);
-    }
-    template <class Values>
-    WeightWriter& blocks(Values const& values) {
-        count(values.size());
-        for (auto const& value : values) block(value);
-        return *this;
-    }
-    WeightWriter& endRecord() {
-        recordEnds_.push_back(bytes_.size());
-        return *this;
-    }
-
-    std::string bytes_;
-    std::vector<std::size_t> recordEnds_;
-};
-
-inline void writeFile(std::filesystem::path const& path, std::string_view bytes) {
-    std::ofstream(path, std::ios::binary).write(bytes.data(), static_cast<long>(bytes.size()));
-}
-
-// A noise-cancellation weight. `version` is "0.0.6", or "0.0.5" (no reset gate, no normalisation).
+// A noise-cancellation weight of version "0.0.1" to "0.0.6". What a generation does not have is
+// left out: reset gate and normalisation before 0.0.6, band compression before 0.0.4, the gate
+// before 0.0.3.
 struct NcShape {
     std::string version = "0.0.6";
     int sampleRate = 16000;
@@ -112,8 +30,13 @@ struct NcShape {
     std::string modelName = "test";
     std::string timeStamp = "210301";
 
+    int generation() const { return version.back() - '0'; }
     int bands() const { return filtrEnd - filtrBegin; }
-    int compressedBands() const { return bands() * (compressRate + 2) >> (compressRate + 1); }
+    int compressedBands() const {
+        int const depth = generation() >= 4 ? compressRate : 0;
+        return bands() * (depth + 2) >> (depth + 1);
+    }
+    int stateWidth() const { return generation() >= 3 ? hidden : 0; }
     int features() const { return previewFrames * compressedBands(); }
     int coefficients() const { return frameLength / 2 + 1; }
 };
@@ -152,7 +75,9 @@ struct VadShape {
 // one.
 class RandomValues {
 public:
-    explicit RandomValues(unsigned seed) : engine_(seed) {}
+    // Matrices are multiplied by `matrixGain` in addition.
+    explicit RandomValues(unsigned seed, float matrixGain = 1.0F)
+        : engine_(seed), matrixGain_(matrixGain) {}
 
     std::vector<float> vector(int size, float low, float high) {
         std::uniform_real_distribution<float> range(low, high);
@@ -161,13 +86,14 @@ public:
         return values;
     }
     MORVA::CONTAINERS::Matrix matrix(int rows, int cols) {
-        auto const scale = std::sqrt(3.0F / static_cast<float>(rows));
+        auto const scale = matrixGain_ * std::sqrt(3.0F / static_cast<float>(rows));
         return {vector(rows * cols, -scale, scale), static_cast<std::size_t>(rows),
                 static_cast<std::size_t>(cols)};
     }
 
 private:
     std::mt19937 engine_;
+    float matrixGain_;
 };
 
 namespace DETAIL {
@@ -179,19 +105,20 @@ inline WeightWriter::Vectors vectors(RandomValues& random, int count, int size, 
     return values;
 }
 
-// Layer 0 takes state and features, every later one the state's width; the last is `outputs` wide.
-inline WeightWriter::Matrices layers(RandomValues& random, int count, int hidden, int features,
+// Layer 0 takes `inputs` values, every later one `hidden`; the last is `outputs` wide.
+inline WeightWriter::Matrices layers(RandomValues& random, int count, int inputs, int hidden,
                                      int outputs) {
     WeightWriter::Matrices values;
     for (int i = 0; i < count; ++i) {
         values.push_back(
-            random.matrix(i == 0 ? hidden + features : hidden, i == count - 1 ? outputs : hidden));
+            random.matrix(i == 0 ? inputs : hidden, i == count - 1 ? outputs : hidden));
     }
     return values;
 }
 
 inline void addNcStructure(WeightWriter& writer, NcShape const& shape) {
-    auto const suffix = shape.version == "0.0.5" ? "_v0_0_5" : "_v0_0_6";
+    auto suffix = "_v" + shape.version;
+    std::ranges::replace(suffix, '.', '_');
     writer.add("Version", shape.version)
         .add("SampleRate", shape.sampleRate)
         .add("FrameLength", shape.frameLength)
@@ -202,45 +129,35 @@ inline void addNcStructure(WeightWriter& writer, NcShape const& shape) {
         .add("FiltrEnd", shape.filtrEnd)
         .add("PreviewFrames", shape.previewFrames)
         .add("CoefficientNumber", shape.coefficients())
-        .add(std::string("CONTROL_MORVA_COMPRESS_RATE") + suffix, shape.compressRate);
+        .add("CONTROL_MORVA_COMPRESS_RATE" + suffix, shape.compressRate);
 }
 
-// `scale` 0 makes every product 0; `outputBias` is what the output layer adds.
-inline std::string ncWeight(NcShape const& shape, float scale, float outputBias) {
-    RandomValues random(shape.seed);
+// A `matrixGain` of 0 makes every product 0; `outputBias` is what the output layer adds.
+inline std::string ncWeight(NcShape const& shape, float matrixGain, float outputBias) {
+    RandomValues random(shape.seed, matrixGain);
     WeightWriter writer;
     addNcStructure(writer, shape);
     int const h = shape.hidden;
-    int const features = shape.features();
+    int const inputs = shape.stateWidth() + shape.features();
     int const k = shape.compressedBands();
     int const hiddenLayers = shape.layers - 1;
-    auto const scaled = [scale](auto values) {
-        auto const apply = [scale](std::vector<float>& data) {
-            for (auto& value : data) value *= scale;
-        };
-        if constexpr (requires { values.data.begin(); }) {
-            apply(values.data);
-        } else {
-            for (auto& value : values) apply(value.data);
-        }
-        return values;
-    };
     writer.add("MU", random.vector(k, 6.0F, 12.0F)).add("SD", random.vector(k, 1.0F, 4.0F));
-    writer.add("WeightGRU", scaled(random.matrix(h + features, shape.gates)))
-        .add("BaesGRU", random.vector(shape.gates, -1.0F, 1.0F));
-    auto linear = layers(random, hiddenLayers, h, features, h);
-    writer.add("WeightLinear", scaled(linear))
-        .add("BaesLinear", vectors(random, hiddenLayers, h, -0.5F, 0.5F));
-    writer.add("WeightNonLinear", scaled(layers(random, shape.layers, h, features, k)));
+    writer.add("WeightLinear", layers(random, hiddenLayers, inputs, h, h))
+        .add("BaesLinear", vectors(random, hiddenLayers, h, -0.5F, 0.5F))
+        .add("WeightNonLinear", layers(random, shape.layers, inputs, h, k));
     auto biases = vectors(random, hiddenLayers, h, -0.5F, 0.5F);
     biases.emplace_back(static_cast<std::size_t>(k), outputBias);
     writer.add("BaesNonLinear", biases);
-    if (shape.version != "0.0.5") {
-        writer.add("WeightGRU_reset", scaled(random.matrix(h + features, h)))
+    if (shape.generation() >= 3) {
+        writer.add("WeightGRU", random.matrix(inputs, shape.gates))
+            .add("BaesGRU", random.vector(shape.gates, -1.0F, 1.0F));
+    }
+    if (shape.generation() >= 6) {
+        writer.add("WeightGRU_reset", random.matrix(inputs, h))
             .add("BiasGRU_reset", random.vector(h, -1.0F, 1.0F));
-        for (auto const* branch : {"LinearNorm", "NonLinearNorm"}) {
-            writer.add(std::string("Gain") + branch, vectors(random, hiddenLayers, h, 0.5F, 1.5F))
-                .add(std::string("Bias") + branch, vectors(random, hiddenLayers, h, -0.5F, 0.5F));
+        for (std::string const branch : {"LinearNorm", "NonLinearNorm"}) {
+            writer.add("Gain" + branch, vectors(random, hiddenLayers, h, 0.5F, 1.5F))
+                .add("Bias" + branch, vectors(random, hiddenLayers, h, -0.5F, 0.5F));
         }
     }
     return writer.bytes();
@@ -266,7 +183,7 @@ inline std::string randomVadWeight(VadShape const& shape) {
     RandomValues random(shape.seed);
     WeightWriter writer;
     int const h = shape.hidden;
-    int const input = VadShape::contextFrames * shape.features();
+    int const inputs = h + VadShape::contextFrames * shape.features();
     writer.add("Version", "VAD_0.0.1")
         .add("SampleRate", shape.sampleRate)
         .add("FrameLength", shape.frameLength)
@@ -274,14 +191,13 @@ inline std::string randomVadWeight(VadShape const& shape) {
         .add("TimeStamp", shape.timeStamp)
         .add("MU", random.vector(shape.features(), 6.0F, 12.0F))
         .add("SD", random.vector(shape.features(), 1.0F, 16.0F))
-        .add("WeightGRU", random.matrix(h + input, shape.gates))
+        .add("WeightGRU", random.matrix(inputs, shape.gates))
         .add("BaesGRU", random.vector(shape.gates, -1.0F, 1.0F));
-    for (auto const* branch : {"Linear", "NonLinear"}) {
+    for (std::string const branch : {"Linear", "NonLinear"}) {
         auto biases = DETAIL::vectors(random, shape.layers - 1, h, -0.5F, 0.5F);
         biases.push_back(random.vector(1, -0.5F, 0.5F));
-        writer
-            .add(std::string("Weight") + branch, DETAIL::layers(random, shape.layers, h, input, 1))
-            .add(std::string("Baes") + branch, biases);
+        writer.add("Weight" + branch, DETAIL::layers(random, shape.layers, inputs, h, 1))
+            .add("Baes" + branch, biases);
     }
     if (shape.calibration.size() == 3) {
         auto const& points = shape.calibration;

@@ -4,7 +4,7 @@
 
 #include <climits>
 
-#include "support/weight_writer.h"
+#include "support/record_writer.h"
 
 namespace {
 

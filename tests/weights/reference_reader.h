@@ -9,7 +9,7 @@
 #include <string>
 #include <string_view>
 
-#include "support/weight_writer.h"
+#include "support/record_writer.h"
 #include "weights/any_map.h"
 
 namespace test_support {

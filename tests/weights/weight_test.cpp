@@ -10,6 +10,7 @@
 
 #include "reference_reader.h"
 #include "support/temp_dir.h"
+#include "support/weight_writer.h"
 #include "utils/exception.h"
 
 namespace {
