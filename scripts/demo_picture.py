@@ -1,0 +1,62 @@
+#!/usr/bin/python3
+"""Says how much noise a cleaned recording lost and draws it before and after.
+
+    scripts/demo_picture.py NOISY CLEAN CLEANED PICTURE
+
+CLEAN is the speech in NOISY without its noise; the three files are mono, of one rate and length.
+"""
+import sys
+
+import matplotlib
+
+matplotlib.use("Agg")
+import matplotlib.pyplot as plt
+import numpy as np
+import soundfile
+
+
+def db(power: float) -> float:
+    return 10 * np.log10(power + 1e-12)
+
+
+def pauses(clean: np.ndarray, rate: int) -> np.ndarray:
+    """True where nobody has spoken for 100 ms and nobody will within 100 ms."""
+    width = rate // 5
+    around = np.convolve(clean**2, np.ones(width) / width, "same")
+    return around < 1e-5 * np.max(around)
+
+
+def si_sdr(sound: np.ndarray, clean: np.ndarray) -> float:
+    target = clean * (sound @ clean) / (clean @ clean)
+    return db(np.sum(target**2)) - db(np.sum((sound - target) ** 2))
+
+
+def draw(sounds: dict[str, np.ndarray], rate: int, path: str) -> None:
+    figure, axes = plt.subplots(len(sounds), 1, figsize=(10, 6), sharex=True, layout="constrained")
+    floor = 1e-8 * np.random.default_rng(1).standard_normal(max(map(len, sounds.values())))  # no log of 0
+    for axis, (title, sound) in zip(axes, sounds.items()):
+        _, _, _, image = axis.specgram(
+            sound + floor[: len(sound)], NFFT=1024, noverlap=768, Fs=rate, cmap="inferno", vmin=-130, vmax=-45
+        )
+        axis.set(title=title, ylabel="kHz", ylim=(0, 12000))
+        axis.yaxis.set_major_formatter(lambda hz, _: f"{hz / 1000:g}")
+    axes[-1].set_xlabel("seconds")
+    figure.colorbar(image, ax=axes, label="dB per hertz re full scale", shrink=0.8)
+    figure.savefig(path, dpi=100)
+
+
+def main() -> None:
+    noisy_path, clean_path, cleaned_path, picture = sys.argv[1:]
+    noisy, rate = soundfile.read(noisy_path)
+    clean, _ = soundfile.read(clean_path)
+    cleaned, _ = soundfile.read(cleaned_path)
+    quiet = pauses(clean, rate)
+    before, after = db(np.mean(noisy[quiet] ** 2)), db(np.mean(cleaned[quiet] ** 2))
+    print(f"noise in pauses   {before:6.1f} dBFS -> {after:6.1f} dBFS   ({before - after:.1f} dB quieter)")
+    before, after = si_sdr(noisy, clean), si_sdr(cleaned, clean)
+    print(f"SI-SDR            {before:6.1f} dB   -> {after:6.1f} dB     ({after - before:+.1f} dB)")
+    draw({"Before": noisy, "After": cleaned, "The speech without noise, for comparison": clean}, rate, picture)
+
+
+if __name__ == "__main__":
+    main()
