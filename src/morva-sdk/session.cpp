@@ -68,15 +68,18 @@ MorvaSessionT::MorvaSessionT(MorvaSamplingRate inputRate, MorvaSamplingRate outp
     if (!isSessionDuration(duration)) {
         UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
     }
-    auto const modelRate = cleaner_->environment()->first->getWeightInfo().first;
-    auto const modelFrame = getSampleCount(duration, modelRate);
+    auto const [modelRate, modelFrameMs] = cleaner_->environment()->first->getWeightInfo();
+    modelFrameSize_ = getSampleCount(duration, modelRate);
+    pipelineDelay_ = NOISE_CANCELLER::pipelineDelayMs(static_cast<std::size_t>(modelFrameMs),
+                                                      static_cast<std::size_t>(duration)) *
+                     static_cast<std::size_t>(modelRate) / 1000;
     auto const soundRate = type == MorvaSessionType::VoiceActivity ? modelRate : outputRate;
     inputFrameSize_ = getSampleCount(duration, inputRate);
     outputFrameSize_ = outputSamples(duration, outputRate, type);
-    inputResampler_ = std::make_unique<UTILS::Resampler>(inputFrameSize_, modelFrame);
+    inputResampler_ = std::make_unique<UTILS::Resampler>(inputFrameSize_, modelFrameSize_);
     outputResampler_ =
-        std::make_unique<UTILS::Resampler>(modelFrame, getSampleCount(duration, soundRate));
-    auto const longest = std::max({inputFrameSize_, modelFrame, outputFrameSize_});
+        std::make_unique<UTILS::Resampler>(modelFrameSize_, getSampleCount(duration, soundRate));
+    auto const longest = std::max({inputFrameSize_, modelFrameSize_, outputFrameSize_});
     frame_.reserve(longest);
     resampled_.reserve(longest);
 }
@@ -177,17 +180,9 @@ bool MorvaSessionT::resetNoiseDBSession() {
 
 double MorvaSessionT::latencySamples() const {
     if (type_ != MorvaSessionType::NoiseCancellation) return 0.0;
-    auto const [modelRate, modelFrameMs] = cleaner_->environment()->first->getWeightInfo();
-    double const toModel = inputResampler_->ratio();
-    double const toOutput = outputResampler_->ratio();
-    auto const modelFrame = static_cast<double>(inputFrameSize_) * toModel;
-    double const frameMs = modelFrame * 1000.0 / static_cast<double>(modelRate);
-    auto const pipelineMs = NOISE_CANCELLER::pipelineDelayMs(
-        static_cast<std::size_t>(modelFrameMs), static_cast<std::size_t>(frameMs + 0.5));
-    auto const pipeline = pipelineMs * static_cast<std::size_t>(modelRate) / 1000;
-    auto const before = inputResampler_->leadingZeros(inputFrameSize_) + pipeline;
-    auto const after = outputResampler_->leadingZeros(static_cast<std::size_t>(modelFrame + 0.5));
-    return static_cast<double>(before) * toOutput + static_cast<double>(after);
+    auto const before = inputResampler_->leadingZeros(inputFrameSize_) + pipelineDelay_;
+    auto const after = outputResampler_->leadingZeros(modelFrameSize_);
+    return static_cast<double>(before) * outputResampler_->ratio() + static_cast<double>(after);
 }
 
 }  // namespace MORVA::MORVA_SDK

@@ -69,6 +69,8 @@ private:
     // Declared so that the cleaner goes first when the session ends.
     std::size_t inputFrameSize_ = 0;
     std::size_t outputFrameSize_ = 0;
+    std::size_t modelFrameSize_ = 0;
+    std::size_t pipelineDelay_ = 0;  // samples at the model's rate
     MorvaSessionType type_;
     std::unique_ptr<UTILS::Resampler> outputResampler_;
     std::unique_ptr<UTILS::Resampler> inputResampler_;
