@@ -138,7 +138,9 @@ void calcRMForwardProp_GRU_VAD_Modify(std::vector<float>& state, std::vector<flo
     plainHiddenLayers(
         x, weights.weightLinear.size() - 1, weights, scratch,
         [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
-    outputLayer(x, weights.weightLinear.back(), weights.baesLinear.back(), scratch);
+    // By the number of matrices: a weight may hold more biases than it has layers.
+    std::size_t const last = weights.weightLinear.size() - 1;
+    outputLayer(x, weights.weightLinear[last], weights.baesLinear[last], scratch);
 }
 
 }  // namespace NOISE_CLEANER_FUNCTIONS
