@@ -96,6 +96,7 @@ class Run:
     ) -> None:
         """Runs until the schedule's last step. A loss that is not finite is skipped and counted."""
         sums: dict[str, float] = {}
+        counted = 0
         started, before = time.monotonic(), self.seconds
         bar = tqdm(total=self.schedule.steps, initial=self.step, mininterval=10.0, desc=self.folder.name)
         while self.step < self.schedule.steps:
@@ -112,14 +113,14 @@ class Run:
             else:
                 parts = {"not_finite": 1.0}
             self.step += 1
+            counted += 1
             self.seconds = before + time.monotonic() - started
             for name, value in parts.items():
                 sums[name] = sums.get(name, 0.0) + value
             bar.update()
             if self.step % self.schedule.checkpoint_every == 0 or self.step == self.schedule.steps:
-                every = self.schedule.checkpoint_every
-                self.log({name: round(value / every, 4) for name, value in sums.items()})
-                sums = {}
+                self.log({name: round(value / counted, 4) for name, value in sums.items()})
+                sums, counted = {}, 0
                 self.save()
             if validate and (self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps):
                 result = validate(self.averaged)

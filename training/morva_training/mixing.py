@@ -146,8 +146,8 @@ class MixtureMaker:
         self.count = int(self.recipe.seconds * self.rate) // self.block * self.block
         rooms = load_rooms(self.store, "heldout" if self.split == "heldout" else "train")
         self.rooms = [resample_poly(room, 1, BASE_RATE // self.rate).astype(np.float32) for room in rooms]
-        self.speakers = self._group(self.speech, "speech")
-        self.categories = self._group(self.noise, "noise")
+        self.speakers = self._group(self.speech, "speech", self.split)
+        self.categories = self._group(self.noise, "noise", self.split)
         self.bands = {
             band: [s for s, clips in self.speakers.items() if clips[0].band == band] for band in ("full", "8k")
         }
@@ -157,14 +157,15 @@ class MixtureMaker:
         odds *= np.where(np.isin(self.category_names, self.recipe.boosted), 3.0, 1.0)
         self.category_odds = odds / odds.sum()
 
-    def _group(self, store: Store, kind: str) -> dict[str, list[Clip]]:
+    @staticmethod
+    def _group(store: Store, kind: str, split: str) -> dict[str, list[Clip]]:
         groups: dict[str, list[Clip]] = {}
         for clip in store.clips:
-            wanted = clip.split
-            if wanted == "train" and in_dev(clip, kind):
-                wanted = "dev"
-            if wanted == self.split and clip.length > self.rate // 50:
+            wanted = "dev" if clip.split == "train" and in_dev(clip, kind) else clip.split
+            if wanted == split and clip.length > store.rate // 50:
                 groups.setdefault(clip.category, []).append(clip)
+        if not groups and split == "dev":  # too few recordings to keep some back
+            return MixtureMaker._group(store, kind, "train")
         return groups
 
     @staticmethod

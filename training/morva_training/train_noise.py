@@ -17,13 +17,14 @@ from . import mvw
 from .batches import Batch, MixtureBatches
 from .convert import gated_network, noise_weight, plain_network
 from .loop import Run, Schedule
-from .losses import LossWeights, MaskLoss
+from .losses import LevelLoss, LossWeights, MaskLoss
 from .mixing import Recipe
 from .networks import LayerNormGatedNetwork, PlainGatedNetwork
 from .spectra import FULL_32K, SMALL_16K, SMALL_8K, Layout
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
 HIDDEN = {"32k": 224, "16k": 192, "8k": 128}
+LEVEL_RECIPE = Recipe(snr_db=(-8.0, 30.0), noise_only_share=0.2, synthetic_share=0.25)
 SKIPPED_FRAMES = 20  # at the start of a piece, while the memory fills
 
 
@@ -67,6 +68,7 @@ def parse() -> argparse.Namespace:
     parser.add_argument("--name", default="noise", help='"ModelName" of the weight file')
     parser.add_argument("--start", type=Path, help="weight file to start from")
     parser.add_argument("--plain", action="store_true", help="version 0.0.5 network")
+    parser.add_argument("--level", action="store_true", help="train for the level of the removed noise")
     parser.add_argument("--hidden", type=int)
     parser.add_argument("--steps", type=int, default=2000)
     parser.add_argument("--batch", type=int, default=48)
@@ -87,17 +89,17 @@ def main() -> None:
     torch.manual_seed(args.seed)
     if device.type == "cpu":
         torch.set_num_threads(1)
-    recipe = Recipe()
+    recipe = LEVEL_RECIPE if args.level else Recipe()
     # A resumed run must not hear the same mixtures again: the seed moves with the step.
     done = torch.load(args.run / "checkpoint.pt")["step"] if (args.run / "checkpoint.pt").exists() else 0
     source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done)
-    loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers, prefetch_factor=2))
+    loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     network, mean, deviation = start(args, layout, loader)
     schedule = Schedule(args.steps, args.rate)
     run = Run(network.to(device), args.run, schedule, {"mean": mean.tolist(), "deviation": deviation.tolist()})
     mean_, deviation_ = (torch.tensor(run.extra[k], device=device) for k in ("mean", "deviation"))
     weights = LossWeights(ratio=args.ratio, loudness=args.loudness, pause=args.pause, lost_speech=args.lost_speech)
-    loss = MaskLoss(layout, weights, device)
+    loss = LevelLoss(layout, device) if args.level else MaskLoss(layout, weights, device)
 
     def loss_of(model: nn.Module, raw: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
         batch = Batch(**raw).to(device)

@@ -80,7 +80,7 @@ def main() -> None:
         torch.set_num_threads(1)
     done = torch.load(args.run / "checkpoint.pt")["step"] if (args.run / "checkpoint.pt").exists() else 0
     source = VoiceBatches(args.store, args.batch, args.seed + 7919 * done)
-    loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers, prefetch_factor=4))
+    loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     if args.start:
         weight = mvw.read(args.start)
         network, mean, variance = plain_network(weight), weight["MU"], weight["SD"]

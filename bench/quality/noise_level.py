@@ -1,0 +1,88 @@
+"""Error in dB of the noise-level model for steady noises, alone and under speech.
+
+    python bench/quality/noise_level.py --store STORE models/noise_level_16k.mvw
+
+Steady noises are white, pink and brown noise and the held-out recordings whose level varies by
+less than 3 dB; each is scaled to several true levels. The value compared is the median of the
+reported levels after two seconds (16-bit scale, dB).
+"""
+from __future__ import annotations
+
+import argparse
+from pathlib import Path
+
+import numpy as np
+
+import systems  # noqa: F401  (makes the training package importable)
+from morva_training import mvw
+from morva_training.corpus import Store
+from morva_training.engine import NoiseLevelModel
+from morva_training.mixing import active_level
+
+RATE = 16000
+SECONDS = 6
+LEVELS_DB = (20.0, 35.0, 50.0, 62.0)  # mean power on the 16-bit scale
+
+
+def coloured(rng: np.random.Generator, slope: float) -> np.ndarray:
+    spectrum = np.fft.rfft(rng.standard_normal(SECONDS * RATE))
+    frequency = np.maximum(np.fft.rfftfreq(SECONDS * RATE, 1 / RATE), 50.0)
+    return np.fft.irfft(spectrum * (frequency / 1000.0) ** slope)
+
+
+def steady_noises(store: Path, split: str) -> dict[str, np.ndarray]:
+    rng = np.random.default_rng(1)
+    noises = {"white": coloured(rng, 0.0), "pink": coloured(rng, -0.5), "brown": coloured(rng, -1.0)}
+    recorded = Store(store, "noise", RATE)
+    for clip in recorded.of_split(split):
+        samples = recorded.read(clip)
+        if len(samples) < 3 * RATE:
+            continue
+        blocks = samples[: len(samples) // 1600 * 1600].reshape(-1, 1600)
+        levels = 10 * np.log10(np.square(blocks).mean(1) + 1e-3)
+        if levels.min() > 10 and levels.std() < 1.0 and np.ptp(levels) < 6:
+            noises[Path(clip.path).stem] = np.tile(samples, 1 + SECONDS * RATE // len(samples))[: SECONDS * RATE]
+    return noises
+
+
+def reported(weight: mvw.Weight, samples: np.ndarray) -> float:
+    model = NoiseLevelModel(weight)
+    hop = RATE // 100
+    levels = [model.level(samples[at : at + hop]) for at in range(0, len(samples) // hop * hop, hop)]
+    return float(np.median(levels[200:]))
+
+
+def speech_of(store: Path, split: str) -> np.ndarray:
+    """Six seconds of one held-out speaker."""
+    voices = Store(store, "speech", RATE)
+    clips = sorted(voices.of_split(split), key=lambda clip: -clip.length)
+    speech = np.concatenate([voices.read(c) for c in clips if c.category == clips[0].category])
+    return np.tile(speech, 1 + SECONDS * RATE // len(speech))[: SECONDS * RATE]
+
+
+def main() -> None:
+    parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
+    parser.add_argument("weight", type=Path)
+    parser.add_argument("--store", type=Path, required=True)
+    parser.add_argument("--split", default="heldout")
+    args = parser.parse_args()
+    weight = mvw.read(args.weight)
+    speech = speech_of(args.store, args.split)
+    speech *= 10 ** (62.0 / 20) / active_level(speech, RATE // 50)
+    alone: list[float] = []
+    spoken: list[float] = []
+    print("| noise | error alone, dB | error under speech (SNR 0 to 27 dB), dB |\n|---|---|---|")
+    for name, noise in steady_noises(args.store, args.split).items():
+        unit = noise / np.sqrt(np.mean(np.square(noise)))
+        first = [reported(weight, np.clip(unit * 10 ** (db / 20), -32768, 32767)) - db for db in LEVELS_DB]
+        second = [reported(weight, np.clip(unit * 10 ** (db / 20) + speech, -32768, 32767)) - db for db in (35, 50, 62)]
+        alone += first
+        spoken += second
+        print(f"| {name} | {', '.join(f'{e:+.1f}' for e in first)} | {', '.join(f'{e:+.1f}' for e in second)} |")
+    for title, errors in (("alone", alone), ("under speech", spoken)):
+        absolute = np.abs(errors)
+        print(f"\n{title}: mean absolute error {absolute.mean():.2f} dB, within 2 dB {np.mean(absolute <= 2):.0%}")
+
+
+if __name__ == "__main__":
+    main()
