@@ -1,7 +1,5 @@
 #include "utils/resampler.h"
 
-#include <libresample.h>
-
 #include <algorithm>
 
 #include "utils/exception.h"
@@ -9,27 +7,21 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr int highQuality = 1;
-constexpr int streamGoesOn = 0;
 constexpr double largestRatio = 256.0;
 constexpr int usualBlock = 3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
 
 }  // namespace
 
-void Resampler::Close::operator()(void* handle) const {
-    resample_close(handle);
-}
-
 Resampler::Resampler(unsigned long inRate, unsigned long outRate)
-    : factor_(static_cast<double>(outRate) / static_cast<double>(inRate)),
-      inRate_(static_cast<double>(inRate)),
-      outRate_(static_cast<double>(outRate)) {
+    : inRate_(inRate),
+      outRate_(outRate),
+      factor_(static_cast<double>(outRate) / static_cast<double>(inRate)) {
     // Also catches a rate of 0, which makes the factor 0, infinite or NaN.
     if (!(factor_ >= 1.0 / largestRatio && factor_ <= largestRatio)) {
         raise("The resampler cannot convert between these rates", "src/utils/resampler",
               "Resampler");
     }
-    handle_ = open();
+    converter_ = makeStreamConverter(inRate, outRate);
     if (factor_ != 1.0) buffer_.reserve(static_cast<std::size_t>(extraRoom_ + usualBlock));
 }
 
@@ -58,8 +50,7 @@ int Resampler::resample(float* in, int inCount, float* out, int outCapacity) {
 }
 
 bool Resampler::reset() {
-    handle_.reset();
-    handle_ = open();
+    converter_->reset();
     firstBlock_ = true;
     heldOver_ = 0;
     return true;
@@ -67,17 +58,11 @@ bool Resampler::reset() {
 
 std::size_t Resampler::leadingZeros(std::size_t blockLength) const {
     if (factor_ == 1.0) return 0;
-    Resampler fresh(static_cast<unsigned long>(inRate_), static_cast<unsigned long>(outRate_));
+    Resampler fresh(inRate_, outRate_);
     std::vector<float> const silence(blockLength);
     std::vector<float> out;
     unsigned const produced = fresh.resample(silence, out);
     return out.size() + 1 - std::min<std::size_t>(produced, out.size() + 1);
-}
-
-Resampler::Handle Resampler::open() const {
-    Handle handle(resample_open(highQuality, factor_, factor_));
-    if (!handle) raise("Out of memory for the resampler", "src/utils/resampler", "Resampler");
-    return handle;
 }
 
 int Resampler::convert(float const* in, int inCount, float* out, int room) {
@@ -85,10 +70,8 @@ int Resampler::convert(float const* in, int inCount, float* out, int room) {
     int produced = 0;
     while (true) {
         int used = 0;
-        // The library's interface lacks the const; it only reads its input.
-        int const got = resample_process(handle_.get(), factor_, const_cast<float*>(in) + consumed,
-                                         inCount - consumed, streamGoesOn, &used, out + produced,
-                                         room - produced);
+        int const got = converter_->process(in + consumed, inCount - consumed, used, out + produced,
+                                            room - produced);
         consumed += used;
         if (got > 0) produced += got;
         bool const stuck = got == 0 && (consumed == inCount || used == 0);

@@ -10,6 +10,7 @@
 #include <vector>
 
 #include "utils/non_copyable.h"
+#include "utils/stream_converter.h"
 
 namespace MORVA::UTILS {
 
@@ -37,20 +38,14 @@ public:
     std::size_t leadingZeros(std::size_t blockLength) const;
 
 private:
-    struct Close {
-        void operator()(void* handle) const;
-    };
-    using Handle = std::unique_ptr<void, Close>;
-
-    Handle open() const;
     int convert(float const* in, int inCount, float* out, int room);
     void startWithDelay(std::vector<float>& out, int produced);
     void continueStream(std::vector<float>& out, int produced);
 
-    Handle handle_;
+    unsigned long inRate_;
+    unsigned long outRate_;
     double factor_;
-    double inRate_;
-    double outRate_;
+    std::unique_ptr<StreamConverter> converter_;
     int extraRoom_ = 1024;
     int heldOver_ = 0;
     bool firstBlock_ = true;

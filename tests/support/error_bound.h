@@ -7,10 +7,24 @@
 #include <cmath>
 #include <cstddef>
 #include <cstdio>
+#include <span>
 #include <string>
 #include <utility>
 
 namespace test_support {
+
+// The norm of the difference over the norm of what was wanted.
+inline double relativeError(std::span<float const> got, std::span<float const> wanted) {
+    EXPECT_EQ(got.size(), wanted.size());
+    double error = 0.0;
+    double signal = 0.0;
+    for (std::size_t i = 0; i < std::min(got.size(), wanted.size()); ++i) {
+        double const difference = static_cast<double>(got[i]) - wanted[i];
+        error += difference * difference;
+        signal += static_cast<double>(wanted[i]) * wanted[i];
+    }
+    return std::sqrt(error / signal);
+}
 
 class ErrorBound {
 public:

@@ -1,0 +1,108 @@
+#include "utils/band_limited_interpolator.h"
+
+#include <immintrin.h>
+
+#include <algorithm>
+#include <cmath>
+
+namespace MORVA::UTILS {
+namespace {
+
+constexpr std::size_t usualCapacity = 4096;
+constexpr std::size_t vectorLanes = 8;
+constexpr double noDrift = 1e-15;
+
+// `taps` is a multiple of eight. Two sums hide the latency of the fused product.
+float dot(float const* x, float const* row, std::size_t taps) {
+    __m256 even = _mm256_setzero_ps();
+    __m256 odd = _mm256_setzero_ps();
+    std::size_t i = 0;
+    for (; i + 2 * vectorLanes <= taps; i += 2 * vectorLanes) {
+        even = _mm256_fmadd_ps(_mm256_loadu_ps(x + i), _mm256_loadu_ps(row + i), even);
+        odd = _mm256_fmadd_ps(_mm256_loadu_ps(x + i + vectorLanes),
+                              _mm256_loadu_ps(row + i + vectorLanes), odd);
+    }
+    if (i < taps) even = _mm256_fmadd_ps(_mm256_loadu_ps(x + i), _mm256_loadu_ps(row + i), even);
+    __m256 const sum = _mm256_add_ps(even, odd);
+    __m128 const four = _mm_add_ps(_mm256_castps256_ps128(sum), _mm256_extractf128_ps(sum, 1));
+    __m128 const two = _mm_add_ps(four, _mm_movehl_ps(four, four));
+    return _mm_cvtss_f32(_mm_add_ss(two, _mm_movehdup_ps(two)));
+}
+
+}  // namespace
+
+BandLimitedInterpolator::BandLimitedInterpolator(unsigned long inRate, unsigned long outRate)
+    : filter_(InterpolationFilter::forRates(inRate, outRate)),
+      phaseStep_(filter_->inStep() % filter_->outStep()),
+      step_(1.0 / (static_cast<double>(outRate) / static_cast<double>(inRate))),
+      margin_(
+          InterpolationFilter::margin(static_cast<double>(outRate) / static_cast<double>(inRate))),
+      capacity_(std::max(2 * margin_ + 10, usualCapacity)),
+      window_(capacity_ + vectorLanes, 0.0f) {  // rows are padded to whole vectors
+    reset();
+}
+
+void BandLimitedInterpolator::reset() {
+    std::fill(window_.begin(), window_.end(), 0.0f);
+    filled_ = margin_;
+    clock_ = static_cast<double>(margin_);
+    end_ = clock_;
+    phase_ = 0;
+}
+
+int BandLimitedInterpolator::process(float const* in, int inCount, int& used, float* out,
+                                     int room) {
+    std::size_t consumed = 0;
+    int produced = 0;
+    while (true) {
+        double const start = clock_;
+        bool const resumed = clock_ < end_;  // the last call ran out of room
+        if (!resumed) {
+            consumed += take(in + consumed, static_cast<std::size_t>(inCount) - consumed);
+            if (filled_ <= 2 * margin_) break;
+            end_ = start + static_cast<double>(filled_ - 2 * margin_);
+        }
+        while (clock_ < end_ && produced < room) out[produced++] = interpolate();
+        if (clock_ < end_) break;
+        forget(static_cast<double>(filled_ - 2 * margin_));
+    }
+    used = static_cast<int>(consumed);
+    return produced;
+}
+
+std::size_t BandLimitedInterpolator::take(float const* in, std::size_t count) {
+    std::size_t const taken = std::min(count, capacity_ - filled_);
+    std::copy_n(in, taken, window_.begin() + static_cast<std::ptrdiff_t>(filled_));
+    filled_ += taken;
+    return taken;
+}
+
+// Sets the clock back by what has passed and lets the input go that lies before its margin.
+void BandLimitedInterpolator::forget(double passed) {
+    clock_ -= passed;
+    auto const creep = static_cast<std::ptrdiff_t>(clock_) - static_cast<std::ptrdiff_t>(margin_);
+    clock_ -= static_cast<double>(creep);
+    std::ptrdiff_t const gone = static_cast<std::ptrdiff_t>(passed) + creep;
+    std::copy(window_.begin() + gone, window_.begin() + static_cast<std::ptrdiff_t>(filled_),
+              window_.begin());
+    filled_ -= static_cast<std::size_t>(gone);
+    end_ = clock_;
+}
+
+// One output sample; moves the clock on.
+float BandLimitedInterpolator::interpolate() {
+    double const fraction = filter_->fraction(phase_);
+    double const base = std::nearbyint(clock_ - fraction);
+    double const drift = (clock_ - base) - fraction;
+    auto const side = drift > noDrift    ? InterpolationFilter::Drift::ahead
+                      : drift < -noDrift ? InterpolationFilter::Drift::behind
+                                         : InterpolationFilter::Drift::none;
+    float const* const x = window_.data() + static_cast<std::ptrdiff_t>(base) + filter_->firstTap();
+    float const value = dot(x, filter_->row(phase_, side), filter_->taps());
+    clock_ += step_;
+    phase_ += phaseStep_;
+    if (phase_ >= filter_->outStep()) phase_ -= filter_->outStep();
+    return value;
+}
+
+}  // namespace MORVA::UTILS
