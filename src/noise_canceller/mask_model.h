@@ -1,11 +1,16 @@
-// A spectral cleaner with its network: everything of a noise cleaner that runs once per hop. Which
-// network it is follows from the type of its weights. One thread at a time.
+// Everything that the noise cleaners have in common: the hop pipeline around a spectral cleaner
+// with its network, and the meter of what it removes. Which network it is follows from the type of
+// its weights. One thread at a time, but for the mask floor, which any thread may set.
 #pragma once
 
 #include <algorithm>
+#include <atomic>
+#include <cmath>
 #include <vector>
 
+#include "noise_canceller/hop_pipeline.h"
 #include "noise_canceller/networks.h"
+#include "noise_canceller/noise_level_meter.h"
 #include "noise_canceller/spectral_cleaner.h"
 #include "noise_canceller/spectral_params.h"
 
@@ -18,8 +23,7 @@ public:
     struct Params : NetworkWeights, SpectralParams {
         Params(SpectralParams::Environment& environment, std::size_t frameMs,
                Generation const& generation)
-            : NetworkWeights(*environment.first),
-              SpectralParams(environment, frameMs, generation) {
+            : NetworkWeights(*environment.first), SpectralParams(environment, frameMs, generation) {
             NetworkWeights::check(featureWidth(), bands.bands());
         }
         std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }
@@ -28,19 +32,25 @@ public:
     MaskModel(Params const& params, CONTAINERS::AnyMap& environment, Generation const& generation)
         : params_(params),
           spectral_(params, environment, generation),
+          pipeline_(params.pipelineShape()),
           state_(params.stateWidth()) {}
 
+    // Back to the state after construction; the mask floor stays.
     void reset() {
         spectral_.reset();
+        pipeline_.reset();
+        meter_.reset();
         std::ranges::fill(state_, 0.0f);
         silentInput_ = false;
     }
 
-    // Looks at a session frame before its hops run: digital silence can bypass the network.
-    void examineInput(std::vector<float> const& frame) {
-        if (!params_.skipFrame || frame.empty()) return;
-        auto const [low, high] = std::ranges::minmax(frame);
-        silentInput_ = SpectralParams::kSkipThreshold >= std::max(std::abs(high), std::abs(low));
+    // One session frame at the model's rate, in place.
+    template <class Stage>
+    void process(std::vector<float>& frame, Stage&& stage) {
+        examineInput(frame);
+        pipeline_.process(
+            frame, [&](float const* in, std::vector<float>& out) { run(in, out, stage); },
+            [&](HopPipeline::CompletedHop const& hop) { meter_.measure(hop); });
     }
 
     // One model frame: FrameLength samples in, as many windowed, cleaned samples out. `stage` may
@@ -54,7 +64,7 @@ public:
         } else {
             runNetwork(state_, x_, params_, scratch_);
         }
-        spectral_.applyMask(x_);
+        spectral_.applyMask(x_, maskFloor_.load(std::memory_order_relaxed));
         stage(spectral_.frame());
         spectral_.finish(out);
         return true;
@@ -62,9 +72,23 @@ public:
 
     std::vector<float> const& synthesisWindow() const { return spectral_.synthesisWindow(); }
 
+    // Lowest gain of a bin, 0..1.
+    void setMaskFloor(float floor) { maskFloor_.store(floor, std::memory_order_relaxed); }
+    float noiseLevelDb() const { return meter_.levelDb(); }
+
 private:
+    // Digital silence can bypass the network.
+    void examineInput(std::vector<float> const& frame) {
+        if (!params_.skipFrame || frame.empty()) return;
+        auto const [low, high] = std::ranges::minmax(frame);
+        silentInput_ = SpectralParams::kSkipThreshold >= std::max(std::abs(high), std::abs(low));
+    }
+
     Params const& params_;
     SpectralCleaner spectral_;
+    HopPipeline pipeline_;
+    NoiseLevelMeter meter_;
+    std::atomic<float> maskFloor_ = 0.0f;
     std::vector<float> state_;
     std::vector<float> x_;
     NetworkScratch scratch_;

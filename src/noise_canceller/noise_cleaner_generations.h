@@ -12,7 +12,7 @@
 #include <type_traits>
 #include <utility>
 
-#include "noise_canceller/hop_pipeline.h"
+#include "noise_canceller/mask_controls.h"
 #include "noise_canceller/mask_model.h"
 #include "noise_canceller/noise_cleaner.h"
 
@@ -31,7 +31,7 @@ constexpr Generation const& generation(int number) {
 }
 
 template <int number>
-class NoiseCleanerGeneration final : public NoiseCleaner {
+class NoiseCleanerGeneration final : public NoiseCleaner, public MaskControls {
 public:
     using Model = MaskModel<std::conditional_t<number <= 2, FeedForwardWeights, GatedWeights>>;
     using Params = typename Model::Params;
@@ -39,25 +39,26 @@ public:
     NoiseCleanerGeneration(ModelEnvironment model, std::size_t frameMs)
         : NoiseCleaner(std::move(model)),
           params_(*environment(), frameMs, generation(number)),
-          model_(params_, environment()->second, generation(number)),
-          pipeline_(params_.pipelineShape()) {}
+          model_(params_, environment()->second, generation(number)) {}
 
     bool cleanNoise(std::vector<float>& frame) override {
-        model_.examineInput(frame);
-        pipeline_.process(
-            frame, [this](float const* in, std::vector<float>& out) { mainCleaner(in, out); });
+        model_.process(frame, noStage);
         return true;
     }
 
     // One model frame of FrameLength samples.
     bool mainCleaner(float const* in, std::vector<float>& out) {
-        return model_.run(in, out, [](std::vector<float>&) {});
+        return model_.run(in, out, noStage);
     }
 
+    void setMaskFloor(float floor) override { model_.setMaskFloor(floor); }
+    float noiseLevelDb() const override { return model_.noiseLevelDb(); }
+
 private:
+    static void noStage(std::vector<float>&) {}
+
     Params params_;
     Model model_;
-    HopPipeline pipeline_;
 };
 
 using NoiseCleaner_v0_0_1 = NoiseCleanerGeneration<1>;

@@ -41,24 +41,27 @@ NoiseCleaner_v0_0_6::NoiseCleaner_v0_0_6(ModelEnvironment model, std::size_t fra
     : NoiseCleaner(std::move(model)),
       params_(*environment(), frameMs),
       model_(params_, environment()->second, generation(6)),
-      pipeline_(params_.pipelineShape()),
       backgroundSpeakerFix_(std::make_shared<UTILS::BackgroundSpeakerFix>(
           params_.cutStartDb, params_.cutEndDb, params_.runFrameCount, params_.runMinLen,
           params_.utteranceLen, params_.varWindMode, params_.modelFrameMs,
           model_.synthesisWindow())),
       backgroundSpeakerOn_(params_.enableBackgroundSpeakerFix) {}
 
+void NoiseCleaner_v0_0_6::suppressBackgroundSpeaker(std::vector<float>& frame) {
+    if (backgroundSpeakerOn_.load(std::memory_order_relaxed)) {
+        backgroundSpeakerFix_->frame_compute(frame);
+    }
+}
+
 bool NoiseCleaner_v0_0_6::cleanNoise(std::vector<float>& frame) {
-    model_.examineInput(frame);
-    pipeline_.process(frame,
-                      [this](float const* in, std::vector<float>& out) { mainCleaner(in, out); });
+    model_.process(frame,
+                   [this](std::vector<float>& cleaned) { suppressBackgroundSpeaker(cleaned); });
     return true;
 }
 
 bool NoiseCleaner_v0_0_6::mainCleaner(float const* in, std::vector<float>& out) {
-    return model_.run(in, out, [this](std::vector<float>& cleaned) {
-        if (backgroundSpeakerOn_) backgroundSpeakerFix_->frame_compute(cleaned);
-    });
+    return model_.run(in, out,
+                      [this](std::vector<float>& cleaned) { suppressBackgroundSpeaker(cleaned); });
 }
 
 bool NoiseCleaner_v0_0_6::background_speaker_fix_switch(bool on) {

@@ -1,5 +1,6 @@
 #include "noise_canceller/spectral_cleaner.h"
 
+#include <algorithm>
 #include <cmath>
 
 #include "noise_canceller/spectral_kernels.h"
@@ -98,10 +99,10 @@ void SpectralCleaner::analyse(float const* in, std::vector<float>& x) {
     context_.push(features_, params_.mu, params_.sd, x);
 }
 
-void SpectralCleaner::applyMask(std::vector<float> const& mask) {
+void SpectralCleaner::applyMask(std::vector<float> const& mask, float floor) {
     auto& full = shaper_.shape(mask);
     if (gate_) gate_->applyEnThreshold(full);
-    for (std::size_t k = 0; k < spectrum_.size(); ++k) spectrum_[k] *= full[k];
+    for (std::size_t k = 0; k < spectrum_.size(); ++k) spectrum_[k] *= std::max(full[k], floor);
     transform_->computeBackward(spectrum_, frame_);
     if (params_.volumeUp) {
         float const gain = 1.0f + params_.volumeUpPercent / 100.0f;

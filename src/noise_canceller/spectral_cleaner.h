@@ -38,8 +38,9 @@ public:
 
     // `in` holds FrameLength samples; `x` receives the network's input.
     void analyse(float const* in, std::vector<float>& x);
-    // `mask` holds one value per band.
-    void applyMask(std::vector<float> const& mask);
+    // `mask` holds one value per band. No bin is multiplied by less than `floor`, which the mask
+    // that the next frame is smoothed against does not see.
+    void applyMask(std::vector<float> const& mask, float floor);
     // The cleaned frame between applyMask and finish.
     std::vector<float>& frame() { return frame_; }
     void finish(std::vector<float>& out);

@@ -34,8 +34,7 @@ struct SpectralParams {
     using Environment = CONTAINERS::ModelEnvironment::element_type;
 
     // Throws MORVA_Exception for missing values and for a structure that the pipeline cannot run.
-    SpectralParams(Environment& environment, std::size_t frameMs,
-                   Generation const& generation);
+    SpectralParams(Environment& environment, std::size_t frameMs, Generation const& generation);
 
     std::vector<float> const& mu;  // feature means, indexed modulo their length
     std::vector<float> const& sd;  // feature deviations, likewise
