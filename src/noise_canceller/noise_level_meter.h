@@ -1,0 +1,20 @@
+// Smoothed level of what a cleaner removes: the mean square of input minus output over a hop,
+// smoothed by 0.9 per hop, in decibels re one squared unit of the 16-bit sample scale (-60 for
+// nothing). One thread at a time.
+#pragma once
+
+#include "noise_canceller/hop_pipeline.h"
+
+namespace MORVA::NOISE_CANCELLER {
+
+class NoiseLevelMeter {
+public:
+    void measure(HopPipeline::CompletedHop const& hop);
+    float levelDb() const;
+    void reset() { power_ = 0.0f; }
+
+private:
+    float power_ = 0.0f;
+};
+
+}  // namespace MORVA::NOISE_CANCELLER
