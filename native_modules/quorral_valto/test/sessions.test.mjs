@@ -198,18 +198,22 @@ test('a frame call allocates nothing', async () => {
      const frame = new Int16Array(80);
      const output = new Int16Array(80);
      const frames = (n) => { for (let i = 0; i < n; ++i) canceller.process(frame, output); };
-     frames(40000);
-     gc();
-     const before = process.memoryUsage();
-     frames(40000);
-     const after = process.memoryUsage();
-     console.log(after.heapUsed - before.heapUsed, after.external - before.external);`,
+     const growth = (n) => {
+       gc();
+       const before = process.memoryUsage();
+       frames(n);
+       const after = process.memoryUsage();
+       return [after.heapUsed - before.heapUsed, after.external - before.external];
+     };
+     const rounds = Array.from({ length: 8 }, () => growth(10000));
+     console.log(...[0, 1].map((i) => Math.min(...rounds.map((round) => round[i]))));`,
     { execArgv: ['--expose-gc', '--single-threaded-gc'] },
   );
+  // The best of several rounds: the runtime compiles meanwhile. One heap number a call would be
+  // over a hundred kilobytes.
   const [heap, external] = stdout.trim().split('\n').at(-1).split(' ').map(Number);
-  // What the runtime compiles meanwhile; one heap number a call would be over 400 kilobytes.
-  assert.ok(heap < 200_000, `heap grew by ${heap} bytes`);
-  assert.equal(external, 0);
+  assert.ok(heap < 20_000, `heap grew by ${heap} bytes`);
+  assert.ok(external <= 0, `${external} bytes outside of the heap`);
 });
 
 test('sessions that script forgets are closed when collected', async () => {
