@@ -6,4 +6,7 @@ namespace MORVA::MORVA_SDK {
 // The missing feature's name, or null when the engine's code can run here.
 char const* missingProcessorFeature();
 
+// The features that matter here and are present, blank-separated.
+char const* processorFeatures();
+
 }  // namespace MORVA::MORVA_SDK

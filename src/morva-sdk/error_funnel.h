@@ -6,6 +6,7 @@
 #include <iostream>
 #include <string>
 
+#include "morva-sdk/last_error.h"
 #include "utils/exception.h"
 
 namespace MORVA::MORVA_SDK {
@@ -23,6 +24,7 @@ inline constexpr FailureCodes<float> kFloatFailures{-1.0f, -2.0f, -3.0f};
 inline constexpr FailureCodes<void*> kHandleFailures{nullptr, nullptr, nullptr};
 
 inline void printError(char const* text) noexcept {
+    rememberError(text);
     try {
         std::cerr << text << std::endl;
     } catch (...) {  // a stream that throws is set up by the host; there is nobody left to tell

@@ -1,9 +1,16 @@
 #include "morva-sdk/morva-ext.h"
 
+#include <algorithm>
 #include <cmath>
+#include <cstring>
+#include <memory>
+#include <mutex>
 
+#include "morva-sdk/cpu_support.h"
 #include "morva-sdk/error_funnel.h"
 #include "morva-sdk/instance.h"
+#include "morva-sdk/last_error.h"
+#include "morva-sdk/model_facts.h"
 
 namespace {
 
@@ -12,16 +19,47 @@ using namespace MORVA::MORVA_SDK;
 constexpr char const* kWrongSession =
     "The Session pointer is wrong insert existing session pointer";
 
-// The live session behind a handle, of any type, or null.
-MorvaSessionT* sessionOf(void* handle) {
-    auto const* const instance = MorvaInstanceT::Instance(MorvaInstanceT::MODE::get, nullptr);
-    auto* const session = static_cast<MorvaSessionT*>(handle);
-    return instance->isSessionTrue(session) ? session : nullptr;
+MorvaInstanceT& engine() {
+    return *MorvaInstanceT::Instance(MorvaInstanceT::MODE::get, nullptr);
 }
 
-int wrongSession() {
-    printError(kWrongSession);
-    return 2;
+constexpr auto kAnyType = MorvaSessionType::Unknown;
+
+// Runs `body` on the live session of that type behind a handle; 2 with the usual line when there is
+// none.
+template <class Body>
+int withSession(void* handle, MorvaSessionType type, Body&& body) {
+    return funnel(kIntFailures, [&] {
+        auto const& instance = engine();
+        auto* const session = static_cast<MorvaSessionT*>(handle);
+        bool const known = instance.isSessionTrue(session) &&
+                           (type == kAnyType || instance.getSessionType(session) == type);
+        if (!known) {
+            printError(kWrongSession);
+            return 2;
+        }
+        return static_cast<int>(body(*session));
+    });
+}
+
+constexpr int kDone = 0;
+constexpr int kCannot = 1;
+
+void copyText(char* target, std::size_t room, std::string const& text) {
+    std::size_t const length = std::min(text.size(), room - 1);
+    std::copy_n(text.data(), length, target);
+    target[length] = '\0';
+}
+
+MorvaExtModelInfo describe(std::string const& name, MORVA::WEIGHTS::Weight const& weight) {
+    auto const facts = modelFacts(weight);
+    MorvaExtModelInfo info{};
+    copyText(info.name, sizeof info.name, name);
+    copyText(info.version, sizeof info.version, facts.version);
+    info.sampleRate = facts.sampleRate;
+    info.frameMs = facts.frameMs;
+    info.size = facts.bytes;
+    return info;
 }
 
 }  // namespace
@@ -29,39 +67,96 @@ int wrongSession() {
 extern "C" {
 
 int MorvaExt_SessionLatencySamples(void* handle) {
-    return funnel(kIntFailures, [&] {
-        auto const* const session = sessionOf(handle);
-        if (session == nullptr || session->getType() != MorvaSessionType::NoiseCancellation) {
-            MORVA::UTILS::raise("Latency asked of a session that makes no sound",
-                                "src/morva-sdk/morva-ext", "MorvaExt_SessionLatencySamples");
-        }
-        return static_cast<int>(std::lround(session->latencySamples()));
+    int latency = 0;
+    int const code = withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+        latency = static_cast<int>(std::lround(session.latencySamples()));
+        return kDone;
     });
+    return code == kDone ? latency : -std::abs(code);
 }
 
 int MorvaExt_SessionFrameSizes(void* handle, unsigned int* inputSize, unsigned int* outputSize) {
-    return funnel(kIntFailures, [&] {
-        auto const* const session = sessionOf(handle);
-        if (session == nullptr) return wrongSession();
-        if (inputSize != nullptr) *inputSize = static_cast<unsigned>(session->inputFrameSize());
-        if (outputSize != nullptr) *outputSize = static_cast<unsigned>(session->outputFrameSize());
-        return 0;
+    return withSession(handle, kAnyType, [&](auto& session) {
+        if (inputSize != nullptr) *inputSize = static_cast<unsigned>(session.inputFrameSize());
+        if (outputSize != nullptr) *outputSize = static_cast<unsigned>(session.outputFrameSize());
+        return kDone;
+    });
+}
+
+int MorvaExt_NC_SetAttenuationLimit(void* handle, float limitDb) {
+    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+        if (!(limitDb >= 0.0f)) return kCannot;
+        session.maskControls()->setMaskFloor(std::pow(10.0f, -limitDb / 20.0f));
+        return kDone;
+    });
+}
+
+int MorvaExt_NC_SetBypass(void* handle, int on) {
+    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+        session.bypass()->set(on != 0);
+        return kDone;
+    });
+}
+
+int MorvaExt_NC_SetBackgroundSpeaker(void* handle, int on) {
+    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+        return session.maskControls()->switchBackgroundSpeaker(on != 0) ? kDone : kCannot;
+    });
+}
+
+int MorvaExt_NC_EnableVoice(void* handle, MorvaSamplingRate inputRate, MorvaFrameDuration duration,
+                            char const* vadModel) {
+    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+        std::lock_guard const lock(MorvaInstanceT::mutexForInputs_);
+        auto voice = std::make_unique<MorvaSessionT>(inputRate, MORVA_RATE_16000, duration,
+                                                     vadModel, MorvaSessionType::VoiceActivity);
+        if (voice->inputFrameSize() != session.inputFrameSize()) return kCannot;
+        session.judgeVoiceWith(std::move(voice));
+        return kDone;
+    });
+}
+
+int MorvaExt_NC_FrameMeters(void* handle, float* voice, float* noiseDb) {
+    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+        if (voice != nullptr) *voice = session.lastVoice();
+        if (noiseDb != nullptr) *noiseDb = session.maskControls()->noiseLevelDb();
+        return kDone;
     });
 }
 
 int MorvaExt_NoiseDB_FrameFloat(void* handle, float const* input, unsigned int inputSize,
                                 float* levelDb) {
-    return funnel(kIntFailures, [&] {
-        auto* const session = sessionOf(handle);
-        if (session == nullptr || session->getType() != MorvaSessionType::NoiseLevel) {
-            return wrongSession();
-        }
-        if (input == nullptr || levelDb == nullptr || inputSize != session->inputFrameSize()) {
-            return 1;
-        }
-        *levelDb = session->frameNoiseDB(input, inputSize);
-        return 0;
+    return withSession(handle, MorvaSessionType::NoiseLevel, [&](auto& session) {
+        if (input == nullptr || levelDb == nullptr) return 2;
+        if (inputSize != session.inputFrameSize()) return kCannot;
+        *levelDb = session.frameNoiseDB(input, inputSize);
+        return kDone;
     });
+}
+
+int MorvaExt_ListModels(MorvaExtModelInfo* models, int capacity) {
+    return funnel(kIntFailures, [&] {
+        auto const& instance = engine();
+        std::lock_guard const lock(MorvaInstanceT::mutexForInputs_);
+        int written = 0;
+        for (auto const& [name, index] : instance.modelNames()) {
+            if (models == nullptr || written >= capacity) break;
+            models[written++] = describe(name, *instance.modelEnvironments()[index]->first);
+        }
+        return static_cast<int>(instance.modelNames().size());
+    });
+}
+
+char const* MorvaExt_Version(void) {
+    return MORVA_VERSION;
+}
+
+char const* MorvaExt_ProcessorFeatures(void) {
+    return processorFeatures();
+}
+
+char const* MorvaExt_LastError(void) {
+    return lastError();
 }
 
 }  // extern "C"

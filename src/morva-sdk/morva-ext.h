@@ -1,6 +1,8 @@
 /*
  * Additions to the C interface (morva-sdk.h): what integrators ask for beyond the given functions,
- * whose behaviour is untouched. Errors are reported as there.
+ * whose behaviour is untouched. Threads and error codes as there: 0 success, 1 the model or session
+ * cannot do that, 2 a null argument or a wrong handle, -1 to -3 exceptions (-3 also without an
+ * engine).
  */
 #ifndef MORVA_EXT_H
 #define MORVA_EXT_H
@@ -11,22 +13,77 @@
 extern "C" {
 #endif
 
-/* [control thread] From sound in to sound out of a noise-cancellation session, in samples at its
- * output rate, rounded: the model's pipeline delay and the filter delay of each resampler that
- * runs. It is constant for the session's life. -3 for any other handle or without an engine. */
+/* ---- what a session is ---- */
+
+/* [any thread] From sound in to sound out of a noise-cancellation session, in samples at its output
+ * rate, rounded: the model's pipeline delay and the filter delay of each resampler that runs.
+ * Constant for the session's life, bypass included. Negative for any other handle. */
 MORVA_API int MorvaExt_SessionLatencySamples(void* session);
 
-/* [control thread] Samples per frame that a session of any kind takes and gives (0 output samples
- * for voice activity). Either pointer may be null. 0 on success, 2 for a wrong handle, -3 without
- * an engine. */
+/* [any thread] Samples per frame that a session of any kind takes and gives (0 output samples for
+ * voice activity). Either pointer may be null. */
 MORVA_API int MorvaExt_SessionFrameSizes(void* session, unsigned int* inputSize,
                                          unsigned int* outputSize);
 
-/* [audio thread] Noise level after one float frame, in decibels as Morva_NoiseDB_FrameInt16 reports
- * it, into `levelDb`. 0 on success; 1 for a wrong frame size or null pointer; 2 for a wrong handle;
- * -1 to -3 as in morva-sdk.h. */
+/* ---- noise-cancellation sessions while they run ---- */
+
+/* [any thread] Attenuation limit: no part of the sound is lowered by more than `limitDb` decibels.
+ * 0 lets everything through (delayed), INFINITY is no limit and the default. It is a floor under
+ * the mask, so speech and the noise that is left keep one phase; a change fades in over a model
+ * hop. 1 for a negative limit or a NaN. Stages after the mask (background speaker, limiter, output
+ * gain of a model) act on what it leaves. */
+MORVA_API int MorvaExt_NC_SetAttenuationLimit(void* session, float limitDb);
+
+/* [any thread] Bypass: non-zero gives the caller's own sound at the session's latency, across the
+ * whole band; the change cross-fades over one frame. The model goes on listening, so switching back
+ * is seamless. */
+MORVA_API int MorvaExt_NC_SetBypass(void* session, int on);
+
+/* [any thread] Background-speaker stage on or off; 1 when the model has none. */
+MORVA_API int MorvaExt_NC_SetBackgroundSpeaker(void* session, int on);
+
+/* [control thread] Lets the voice-activity model `vadModel` (null: chosen by rate) judge every
+ * frame that this session cleans. `inputRate` and `duration` are those of the session. Not while a
+ * frame call runs on it. 1 when the frame sizes disagree or the model cannot be opened. */
+MORVA_API int MorvaExt_NC_EnableVoice(void* session, MorvaSamplingRate inputRate,
+                                      MorvaFrameDuration duration, char const* vadModel);
+
+/* [audio thread] Meters of the last cleaned frame: the voice score (NaN unless enabled) and the
+ * level of what was removed, in decibels as noise-level sessions report it (with an attenuation
+ * limit, of the part that was removed). Either pointer may be null. */
+MORVA_API int MorvaExt_NC_FrameMeters(void* session, float* voice, float* noiseDb);
+
+/* ---- noise level ---- */
+
+/* [audio thread] Noise level after one float frame, as Morva_NoiseDB_FrameInt16 reports it, into
+ * `levelDb`. 1 for a wrong frame size. */
 MORVA_API int MorvaExt_NoiseDB_FrameFloat(void* session, float const* input, unsigned int inputSize,
                                           float* levelDb);
+
+/* ---- engine ---- */
+
+typedef struct MorvaExtModelInfo {
+    char name[128];          /* as registered, cut to fit */
+    char version[32];        /* of the weight: which model class runs it; empty when it has none */
+    int sampleRate;          /* hertz; 0 when the weight does not say */
+    int frameMs;             /* model frame, milliseconds; 0 likewise */
+    unsigned long long size; /* bytes of numbers in the weight */
+} MorvaExtModelInfo;
+
+/* [control thread] The registered models, by name in byte order. Writes at most `capacity` of them
+ * to `models` (null allowed with 0) and returns how many there are; negative on failure. */
+MORVA_API int MorvaExt_ListModels(MorvaExtModelInfo* models, int capacity);
+
+/* [any thread] "major.minor.patch" of this library. */
+MORVA_API char const* MorvaExt_Version(void);
+
+/* [any thread] The processor's features that matter here, blank-separated: "sse4.1 avx2 fma bmi2
+ * avx512f". */
+MORVA_API char const* MorvaExt_ProcessorFeatures(void);
+
+/* [any thread] Text of the last failure that a call on this thread printed on standard error; empty
+ * when there was none. Valid until the thread's next failure. */
+MORVA_API char const* MorvaExt_LastError(void);
 
 #ifdef __cplusplus
 }

@@ -1,9 +1,11 @@
 #include "morva-sdk/session.h"
 
 #include <algorithm>
-#include <iostream>
+#include <cmath>
 #include <span>
+#include <string>
 
+#include "morva-sdk/error_funnel.h"
 #include "noise_canceller/hop_pipeline.h"
 #include "utils/exception.h"
 #include "utils/flush_to_zero.h"
@@ -51,6 +53,11 @@ std::size_t outputSamples(MorvaFrameDuration duration, MorvaSamplingRate rate,
                                                    : getSampleCount(duration, rate);
 }
 
+void printSizeError(char const* error, std::size_t inputSize, std::string const& outputSize) {
+    auto const text = error + std::to_string(inputSize) + "\n output size must be " + outputSize;
+    printError(text.c_str());
+}
+
 }  // namespace
 
 std::size_t getSampleCount(MorvaFrameDuration duration, MorvaSamplingRate rate) {
@@ -68,11 +75,8 @@ MorvaSessionT::MorvaSessionT(MorvaSamplingRate inputRate, MorvaSamplingRate outp
     if (!isSessionDuration(duration)) {
         UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
     }
-    auto const [modelRate, modelFrameMs] = cleaner_->environment()->first->getWeightInfo();
+    auto const modelRate = cleaner_->environment()->first->getWeightInfo().first;
     modelFrameSize_ = getSampleCount(duration, modelRate);
-    pipelineDelay_ = NOISE_CANCELLER::pipelineDelayMs(static_cast<std::size_t>(modelFrameMs),
-                                                      static_cast<std::size_t>(duration)) *
-                     static_cast<std::size_t>(modelRate) / 1000;
     auto const soundRate = type == MorvaSessionType::VoiceActivity ? modelRate : outputRate;
     inputFrameSize_ = getSampleCount(duration, inputRate);
     outputFrameSize_ = outputSamples(duration, outputRate, type);
@@ -82,6 +86,22 @@ MorvaSessionT::MorvaSessionT(MorvaSamplingRate inputRate, MorvaSamplingRate outp
     auto const longest = std::max({inputFrameSize_, modelFrameSize_, outputFrameSize_});
     frame_.reserve(longest);
     resampled_.reserve(longest);
+    if (type == MorvaSessionType::NoiseCancellation) prepareSoundPath(duration);
+}
+
+void MorvaSessionT::prepareSoundPath(MorvaFrameDuration duration) {
+    auto const [modelRate, modelFrameMs] = cleaner_->environment()->first->getWeightInfo();
+    auto const pipelineDelay =
+        NOISE_CANCELLER::pipelineDelayMs(static_cast<std::size_t>(modelFrameMs),
+                                         static_cast<std::size_t>(duration)) *
+        static_cast<std::size_t>(modelRate) / 1000;
+    auto const atModelRate = inputResampler_->leadingZeros(inputFrameSize_) + pipelineDelay;
+    auto const atOutputRate = outputResampler_->leadingZeros(modelFrameSize_);
+    latency_ = static_cast<double>(atModelRate) * outputResampler_->ratio() +
+               static_cast<double>(atOutputRate);
+    bypass_ = std::make_unique<Bypass>(inputFrameSize_, outputFrameSize_,
+                                       static_cast<std::size_t>(std::lround(latency_)));
+    maskControls_ = dynamic_cast<NOISE_CANCELLER::MaskControls*>(cleaner_.get());
 }
 
 void MorvaSessionT::through(UTILS::Resampler& resampler) {
@@ -90,10 +110,12 @@ void MorvaSessionT::through(UTILS::Resampler& resampler) {
 }
 
 void MorvaSessionT::cleanFrame() {
+    bypass_->remember(frame_);
     through(*inputResampler_);
     UTILS::clipToPcm16(frame_);
     cleaner_->cleanNoise(frame_);
     through(*outputResampler_);
+    bypass_->mix(frame_);
     UTILS::clipToPcm16(frame_);
 }
 
@@ -102,11 +124,11 @@ bool MorvaSessionT::cleanSamples(Sample const* input, std::size_t inputSize, Sam
                                  std::size_t outputSize) {
     if (input == nullptr || output == nullptr || inputSize != inputFrameSize_ ||
         outputSize != outputFrameSize_) {
-        std::cerr << Format::sizeError << inputFrameSize_ << "\n output size must be "
-                  << outputFrameSize_ << std::endl;
+        printSizeError(Format::sizeError, inputFrameSize_, std::to_string(outputFrameSize_));
         return false;
     }
     UTILS::ScopedFlushToZero const fast;
+    if (voice_) lastVoice_ = voice_->frameVad(input, inputSize);
     frame_.resize(inputSize);
     Format::read({input, inputSize}, frame_);
     cleanFrame();
@@ -128,7 +150,7 @@ bool MorvaSessionT::cleanNoise(float const* input, std::size_t inputSize, float*
 template <class Format, class Sample>
 bool MorvaSessionT::takeFrame(Sample const* input, std::size_t inputSize) {
     if (input == nullptr || inputSize != inputFrameSize_) {
-        std::cerr << Format::sizeError << inputFrameSize_ << "\n output size must be " << std::endl;
+        printSizeError(Format::sizeError, inputFrameSize_, "");
         return false;
     }
     frame_.resize(inputSize);
@@ -176,13 +198,6 @@ bool MorvaSessionT::resetNoiseDBSession() {
     inputResampler_->reset();
     outputResampler_->reset();
     return true;
-}
-
-double MorvaSessionT::latencySamples() const {
-    if (type_ != MorvaSessionType::NoiseCancellation) return 0.0;
-    auto const before = inputResampler_->leadingZeros(inputFrameSize_) + pipelineDelay_;
-    auto const after = outputResampler_->leadingZeros(modelFrameSize_);
-    return static_cast<double>(before) * outputResampler_->ratio() + static_cast<double>(after);
 }
 
 }  // namespace MORVA::MORVA_SDK

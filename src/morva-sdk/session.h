@@ -7,11 +7,15 @@
 #pragma once
 
 #include <cstddef>
+#include <limits>
 #include <memory>
+#include <utility>
 #include <vector>
 
+#include "morva-sdk/bypass.h"
 #include "morva-sdk/morva-sdk.h"
 #include "morva-sdk/session_type.h"
+#include "noise_canceller/mask_controls.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "utils/non_copyable.h"
 #include "utils/resampler.h"
@@ -49,7 +53,17 @@ public:
     std::size_t inputFrameSize() const { return inputFrameSize_; }
     std::size_t outputFrameSize() const { return outputFrameSize_; }
     // From sound in to sound out, in samples at the output rate; 0 for sessions without sound.
-    double latencySamples() const;
+    double latencySamples() const { return latency_; }
+
+    // Of noise-cancellation sessions; null otherwise.
+    NOISE_CANCELLER::MaskControls* maskControls() { return maskControls_; }
+    Bypass* bypass() { return bypass_.get(); }
+
+    // Lets a voice-activity session of the same input judge every frame that this one cleans. The
+    // session has the same input rate and duration. [the session's thread, between frames]
+    void judgeVoiceWith(std::unique_ptr<MorvaSessionT> voice) { voice_ = std::move(voice); }
+    // Its score of the last frame; NaN without one.
+    float lastVoice() const { return lastVoice_; }
 
 private:
     template <class Format, class Sample>
@@ -66,17 +80,23 @@ private:
     float frameValue(float const* input, std::size_t inputSize);
     void through(UTILS::Resampler& resampler);
 
+    void prepareSoundPath(MorvaFrameDuration duration);
+
     // Declared so that the cleaner goes first when the session ends.
     std::size_t inputFrameSize_ = 0;
     std::size_t outputFrameSize_ = 0;
     std::size_t modelFrameSize_ = 0;
-    std::size_t pipelineDelay_ = 0;  // samples at the model's rate
+    double latency_ = 0.0;
+    float lastVoice_ = std::numeric_limits<float>::quiet_NaN();
     MorvaSessionType type_;
     std::unique_ptr<UTILS::Resampler> outputResampler_;
     std::unique_ptr<UTILS::Resampler> inputResampler_;
     std::vector<float> frame_;
     std::vector<float> resampled_;
+    std::unique_ptr<Bypass> bypass_;
+    std::unique_ptr<MorvaSessionT> voice_;
     std::unique_ptr<NOISE_CANCELLER::NoiseCleaner> cleaner_;
+    NOISE_CANCELLER::MaskControls* maskControls_ = nullptr;  // of cleaner_
 };
 
 }  // namespace MORVA::MORVA_SDK
