@@ -75,8 +75,9 @@ def score_pairs(folder: Path, weight: mvw.Weight, limit: int) -> str:
             f"| {10 * blocks} ms | {metrics.roc_auc(scores, voice):.4f} "
             f"| {metrics.best_f1(scores, voice)[0]:.4f} | {at_half:.4f} |"
         )
-    within = np.mean(np.array(delays) <= 30) if delays else float("nan")
-    lines.append(f"\nonset: {len(delays)} words, median {np.median(delays):.0f} ms, within 30 ms {within:.0%}")
+    if delays:
+        within = np.mean(np.array(delays) <= 30)
+        lines.append(f"\nonset: {len(delays)} words, median {np.median(delays):.0f} ms, within 30 ms {within:.0%}")
     return "\n".join(lines)
 
 

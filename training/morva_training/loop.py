@@ -25,7 +25,7 @@ class Schedule:
     peak: float = 1e-3
     warm_up: int = 50
     decay_share: float = 0.35
-    average: float = 0.998  # of the moving average of the weights
+    average: float = 0.99  # of the moving average of the weights
     checkpoint_every: int = 50
     validate_every: int = 100
 
