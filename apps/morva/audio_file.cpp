@@ -5,6 +5,7 @@
 #include <algorithm>
 #include <array>
 #include <cctype>
+#include <cmath>
 #include <initializer_list>
 #include <string>
 #include <system_error>
@@ -55,6 +56,31 @@ int wavFor(std::int64_t frames, int channels) {
     return frames > limit / 8 / std::max(channels, 1) ? SF_FORMAT_RF64 : SF_FORMAT_WAV;
 }
 
+// Bits of an integer sample type; 0 for every other.
+int integerBits(int format) {
+    switch (format & SF_FORMAT_SUBMASK) {
+        case SF_FORMAT_PCM_U8:
+        case SF_FORMAT_PCM_S8:
+            return 8;
+        case SF_FORMAT_PCM_16:
+            return 16;
+        case SF_FORMAT_PCM_24:
+            return 24;
+        case SF_FORMAT_PCM_32:
+            return 32;
+        default:
+            return 0;
+    }
+}
+
+// The sample, rounded to `bits`, in the top bits of an integer. The library would cut the rest off.
+int toInteger(float sample, int bits) {
+    double const scale = std::ldexp(1.0, bits - 1);
+    double const value = std::isnan(sample) ? 0.0 : std::rint(static_cast<double>(sample) * scale);
+    auto const whole = static_cast<std::int64_t>(std::clamp(value, -scale, scale - 1.0));
+    return static_cast<int>(whole * (std::int64_t{1} << (32 - bits)));
+}
+
 void copyTags(SNDFILE* from, SNDFILE* to) {
     for (int const tag :
          {SF_STR_TITLE, SF_STR_COPYRIGHT, SF_STR_ARTIST, SF_STR_COMMENT, SF_STR_DATE, SF_STR_ALBUM,
@@ -103,7 +129,7 @@ int outputFormat(fs::path const& path, int sourceFormat, int channels, int rateH
     };
     int const type = sourceFormat & SF_FORMAT_SUBMASK;
     bool const lossy = type == SF_FORMAT_VORBIS || type == SF_FORMAT_OPUS;
-    bool const plain = type <= SF_FORMAT_DOUBLE;
+    bool const plain = type <= SF_FORMAT_ALAW;
     if ((plain || (lossy && major == SF_FORMAT_OGG)) && fits(type)) return info.format;
     for (int const candidate : typesHolding(type)) {
         if (fits(candidate)) return info.format;
@@ -130,7 +156,6 @@ SoundWriter::SoundWriter(fs::path const& path, SoundReader const& source, int fo
     }
     file_.reset(sf_open(part_.c_str(), SFM_WRITE, &info_));
     if (!file_) throw Error(path.string() + ": cannot be written: " + sf_strerror(nullptr));
-    // Clipping also selects the scale on which an untouched integer sample comes back unchanged.
     sf_command(file_.get(), SFC_SET_CLIPPING, nullptr, SF_TRUE);
     double quality = 0.7;
     sf_command(file_.get(), SFC_SET_VBR_ENCODING_QUALITY, &quality, sizeof quality);
@@ -146,7 +171,13 @@ SoundWriter::~SoundWriter() {
 
 void SoundWriter::write(std::span<float const> interleaved) {
     auto const frames = static_cast<sf_count_t>(interleaved.size()) / info_.channels;
-    if (sf_writef_float(file_.get(), interleaved.data(), frames) != frames) {
+    int const bits = integerBits(info_.format);
+    integers_.resize(bits > 0 ? interleaved.size() : 0);
+    std::ranges::transform(interleaved.first(integers_.size()), integers_.begin(),
+                           [bits](float sample) { return toInteger(sample, bits); });
+    auto const written = bits > 0 ? sf_writef_int(file_.get(), integers_.data(), frames)
+                                  : sf_writef_float(file_.get(), interleaved.data(), frames);
+    if (written != frames) {
         throw Error(path_.string() + ": cannot be written: " + sf_strerror(file_.get()));
     }
 }

@@ -10,6 +10,7 @@
 #include <filesystem>
 #include <memory>
 #include <span>
+#include <vector>
 
 namespace morva::cli {
 
@@ -63,6 +64,7 @@ private:
     std::filesystem::path part_;
     SF_INFO info_{};
     SoundHandle file_;
+    std::vector<int> integers_;
 };
 
 }  // namespace morva::cli

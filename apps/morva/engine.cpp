@@ -42,9 +42,14 @@ void toIntegers(std::span<float const> frame, std::vector<std::int16_t>& samples
 
 }  // namespace
 
+std::wstring wide(std::filesystem::path const& path) {
+    auto const points = path.u32string();
+    return {points.begin(), points.end()};
+}
+
 Engine::Engine(Streams& streams, std::filesystem::path const& folder) : streams_(streams) {
     EngineTalk const talk(streams_);
-    if (Morva_SDK_GlobalInit(folder.wstring().c_str(), 1) != 0) {
+    if (Morva_SDK_GlobalInit(wide(folder).c_str(), 1) != 0) {
         throw Error(withReason("the engine cannot start", talk));
     }
 }
@@ -55,7 +60,7 @@ Engine::~Engine() {
 
 void Engine::addModel(std::filesystem::path const& file, std::string const& name) {
     EngineTalk const talk(streams_);
-    if (Morva_SDK_SetModel(file.wstring().c_str(), name.c_str()) != 0) {
+    if (Morva_SDK_SetModel(wide(file).c_str(), name.c_str()) != 0) {
         throw Error(withReason(file.string() + ": not a usable model", talk));
     }
 }

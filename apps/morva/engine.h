@@ -41,6 +41,9 @@ private:
     Streams& streams_;
 };
 
+// The engine's form of a path. File names are UTF-8, whatever the locale; others throw.
+std::wstring wide(std::filesystem::path const& path);
+
 // Closes a session of one kind.
 using SessionHandle = std::unique_ptr<void, int (*)(void*)>;
 

@@ -158,6 +158,7 @@ int run(InspectOptions const& options) {
             ? asJson(options, facts, trial).dump(1, ' ', false, json::error_handler_t::replace) +
                   '\n'
             : asText(options, facts, trial));
+    if (!trial.runs) streams.err("morva: " + trial.reason + '\n');
     return trial.runs ? 0 : 1;
 }
 

@@ -6,6 +6,7 @@
 #include <memory>
 #include <span>
 
+#include "engine.h"
 #include "error.h"
 #include "utils/matrix.h"
 
@@ -137,7 +138,7 @@ ModelKind kindOf(std::string const& version) {
 
 WeightFacts readWeightFacts(std::filesystem::path const& file) {
     MORVA::WEIGHTS::Weight weight;
-    if (!weight.read(MORVA::UTILS::Path(file.wstring().c_str()))) {
+    if (!weight.read(MORVA::UTILS::Path(wide(file).c_str()))) {
         throw Error(file.string() + ": cannot be read: " + weight.message());
     }
     auto const& values = weight.values();

@@ -11,13 +11,13 @@
 
 #include "morva-sdk.h"
 
-enum { frameMs = 10, longestFrame = 960 };
+enum { longestFrame = 960 }; /* 10 ms at 96000 Hz */
 
 static int run(FILE* in, FILE* out, MorvaSamplingRate rate) {
-    void* session = Morva_NC_CreateSession(rate, rate, frameMs, "model");
+    void* session = Morva_NC_CreateSession(rate, rate, MORVA_FRAME_10_MS, "model");
     if (session == NULL) return 1; /* the reason stands on standard error */
 
-    unsigned int const size = (unsigned int)rate * frameMs / 1000;
+    unsigned int const size = (unsigned int)rate * MORVA_FRAME_10_MS / 1000;
     short frame[longestFrame] = {0};
     int failed = 0;
     for (size_t got; !failed && (got = fread(frame, sizeof *frame, size, in)) > 0;) {

@@ -1,0 +1,65 @@
+"""The program under test and files for it. MORVA_BUILD names the build folder."""
+import os
+import pathlib
+import subprocess
+
+import numpy as np
+import pytest
+import soundfile
+
+import weights
+
+SOURCE = pathlib.Path(__file__).parents[2]
+BUILD = pathlib.Path(os.environ.get("MORVA_BUILD", SOURCE / "build/release"))
+
+
+@pytest.fixture(scope="session")
+def morva():
+    def run(*arguments, fails=False, **options):
+        command = [str(BUILD / "morva"), *map(str, arguments)]
+        done = subprocess.run(command, capture_output=True, text=True, timeout=300, **options)
+        if fails:
+            assert done.returncode in (1, 2), f"{command} ended with {done.returncode}:\n{done.stderr}"
+            assert done.stderr.strip(), "a failure says why"
+        else:
+            assert done.returncode == 0, f"{command} ended with {done.returncode}:\n{done.stderr}"
+        return done
+
+    return run
+
+
+@pytest.fixture
+def model(tmp_path):
+    """Writes a weight file and returns its path."""
+
+    def write(values, name="model.mvw"):
+        path = tmp_path / name
+        path.write_bytes(weights.encode(values))
+        return path
+
+    return write
+
+
+def speechlike(rate: int, seconds: float, seed: int, channels: int = 1, top: float = 3000.0) -> np.ndarray:
+    """Noise between 200 Hz and `top` with slow swells: full enough to align, and free of resampling edges."""
+    rng = np.random.default_rng(seed)
+    count = round(rate * seconds)
+    spectrum = np.fft.rfft(rng.standard_normal((count, channels)), axis=0)
+    hz = np.fft.rfftfreq(count, 1 / rate)
+    spectrum[(hz < 200) | (hz > top)] = 0
+    sound = np.fft.irfft(spectrum, count, axis=0)
+    swell = 0.6 + 0.4 * np.sin(2 * np.pi * 1.3 * np.arange(count) / rate)
+    return sound / np.abs(sound).max() * 0.7 * swell[:, None]
+
+
+@pytest.fixture
+def recording(tmp_path):
+    """Writes a sound file and returns its path."""
+
+    def write(sound, rate, name="in.wav", **options):
+        path = tmp_path / name
+        path.parent.mkdir(parents=True, exist_ok=True)
+        soundfile.write(path, sound, rate, **options)
+        return path
+
+    return write
