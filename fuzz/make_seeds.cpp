@@ -2,6 +2,7 @@
 #include <cstdio>
 #include <exception>
 #include <filesystem>
+#include <random>
 #include <string>
 
 #include "support/weight_writer.h"
@@ -75,6 +76,17 @@ void samples(Corpus corpus) {
     corpus.add(WeightWriter().number(0x00020202).number(0x7fc00000).number(0x7f800000).bytes());
     corpus.add(WeightWriter().number(0x01000506).number(0xff800000U).number(1).bytes());
     corpus.add(WeightWriter().number(0x00030008).number(0x7f7fffff).number(0xff7fffffU).bytes());
+    // Half a second of each kind of hostile sample, then of any bits at all.
+    std::mt19937 engine(1);
+    for (auto const bits : {0x7fc00000U, 0x7f800000U, 0xff7fffffU, 0x00000001U, 0x4f000000U}) {
+        WeightWriter writer;
+        writer.number(static_cast<std::uint32_t>(engine()));
+        for (int i = 0; i < 4000; ++i) writer.number(bits);
+        corpus.add(writer.bytes());
+    }
+    WeightWriter writer;
+    for (int i = 0; i < 4000; ++i) writer.number(static_cast<std::uint32_t>(engine()));
+    corpus.add(writer.bytes());
 }
 
 }  // namespace

@@ -4,7 +4,7 @@
 #include <cstring>
 
 #include "harness.h"
-#include "weight_mutator.h"
+#include "support/weight_mutator.h"
 
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
 
@@ -57,7 +57,8 @@ extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size
 extern "C" std::size_t LLVMFuzzerCustomMutator(std::uint8_t* data, std::size_t size,
                                                std::size_t maxSize, unsigned seed) {
     if (seed % 4 == 0) return LLVMFuzzerMutate(data, size, maxSize);
-    auto const mutated = fuzz::mutateWeight({reinterpret_cast<char const*>(data), size}, seed);
+    auto const mutated =
+        test_support::mutateWeight({reinterpret_cast<char const*>(data), size}, seed);
     auto const kept = std::min(mutated.size(), maxSize);
     std::memcpy(data, mutated.data(), kept);
     return kept;

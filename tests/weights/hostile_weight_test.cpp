@@ -4,8 +4,8 @@
 
 #include <random>
 
-#include "reference_reader.h"
 #include "support/allocation_counter.h"
+#include "support/reference_reader.h"
 #include "support/temp_dir.h"
 #include "weights/weight.h"
 

@@ -8,7 +8,7 @@
 #include <random>
 #include <thread>
 
-#include "reference_reader.h"
+#include "support/reference_reader.h"
 #include "support/temp_dir.h"
 #include "support/weight_writer.h"
 #include "utils/exception.h"

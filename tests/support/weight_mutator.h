@@ -6,10 +6,10 @@
 #include <string>
 #include <string_view>
 
-namespace fuzz {
+namespace test_support {
 
 // A changed copy of `bytes`; the change is a function of `seed`. Data without a whole record comes
 // back as it was.
 std::string mutateWeight(std::string_view bytes, unsigned seed);
 
-}  // namespace fuzz
+}  // namespace test_support

@@ -1,4 +1,4 @@
-#include "weight_mutator.h"
+#include "support/weight_mutator.h"
 
 #include <array>
 #include <cmath>
@@ -8,16 +8,14 @@
 #include <random>
 #include <vector>
 
-#include "reference_reader.h"
 #include "support/record_writer.h"
+#include "support/reference_reader.h"
 #include "weights/weight.h"
 
-namespace fuzz {
+namespace test_support {
 
 namespace {
 
-using test_support::Records;
-using test_support::WeightWriter;
 using Vector = WeightWriter::Vector;
 using Matrix = WeightWriter::Matrix;
 
@@ -53,7 +51,7 @@ public:
     explicit Mutator(unsigned seed) : engine_(seed) {}
 
     std::string operator()(std::string_view bytes) {
-        auto records = test_support::ReferenceReader(bytes).read();
+        auto records = ReferenceReader(bytes).read();
         if (records.empty()) return std::string(bytes);
         auto const victim = std::next(records.begin(), below(static_cast<int>(records.size())));
         switch (below(12)) {
@@ -225,4 +223,4 @@ std::string mutateWeight(std::string_view bytes, unsigned seed) {
     return Mutator(seed)(bytes);
 }
 
-}  // namespace fuzz
+}  // namespace test_support
