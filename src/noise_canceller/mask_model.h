@@ -20,10 +20,10 @@ template <class NetworkWeights>
 class MaskModel {
 public:
     // The values that the model reads; its checks make every frame call safe.
-    struct Params : NetworkWeights, SpectralParams {
+    struct Params : SpectralParams, NetworkWeights {
         Params(SpectralParams::Environment& environment, std::size_t frameMs,
                Generation const& generation)
-            : NetworkWeights(*environment.first), SpectralParams(environment, frameMs, generation) {
+            : SpectralParams(environment, frameMs, generation), NetworkWeights(*environment.first) {
             NetworkWeights::check(featureWidth(), bands.bands());
         }
         std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }

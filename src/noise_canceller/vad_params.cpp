@@ -54,10 +54,12 @@ float Calibration::apply(float raw) const {
     return score;
 }
 
+FeatureStatistics::FeatureStatistics(WEIGHTS::Weight const& weight)
+    : mu(weight.getReference<Values>("MU")), sd(weight.getReference<Values>("SD")) {}
+
 VadParams::VadParams(Environment& environment)
-    : GatedWeights(*environment.first),
-      mu(environment.first->getReference<Values>("MU")),
-      sd(environment.first->getReference<Values>("SD")),
+    : FeatureStatistics(*environment.first),
+      GatedWeights(*environment.first),
       sampleRate(static_cast<std::size_t>(environment.first->getReference<int>("SampleRate"))),
       frameLength(readFrameLength(*environment.first)),
       bins(frameLength / 2 + 1),

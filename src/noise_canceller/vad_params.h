@@ -21,7 +21,15 @@ struct Calibration {
     float apply(float raw) const;
 };
 
-struct VadParams : GatedWeights {
+// Read before the network, so that a weight without anything is missed by its first value.
+struct FeatureStatistics {
+    explicit FeatureStatistics(WEIGHTS::Weight const& weight);
+
+    std::vector<float> const& mu;
+    std::vector<float> const& sd;  // a variance
+};
+
+struct VadParams : FeatureStatistics, GatedWeights {
     using Environment = CONTAINERS::ModelEnvironment::element_type;
 
     static constexpr std::size_t kContextFrames = 4;  // before the newest one
@@ -30,8 +38,6 @@ struct VadParams : GatedWeights {
     // Throws MORVA_Exception for missing values and shapes that do not fit.
     explicit VadParams(Environment& environment);
 
-    std::vector<float> const& mu;
-    std::vector<float> const& sd;
     std::size_t sampleRate;
     std::size_t frameLength;  // analysis frame and FFT length, samples
     std::size_t bins;         // frameLength / 2 + 1
