@@ -20,15 +20,17 @@ import soundfile
 sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "training"))
 
 from morva_training.corpus import BASE_RATE, Clip, Store  # noqa: E402
-from morva_training.mixing import active_level  # noqa: E402
+from morva_training.mixing import active_level, in_dev  # noqa: E402
 
 SNRS_DB = (-5, 0, 5, 10, 15)
 SECONDS = 8.0
 
 
-def by_category(store: Store, split: str) -> dict[str, list[Clip]]:
+def by_category(store: Store, kind: str, split: str) -> dict[str, list[Clip]]:
+    """Recordings by speaker or category; "dev" is the share of the training split kept for validation."""
+    clips = [c for c in store.of_split("train") if in_dev(c, kind)] if split == "dev" else store.of_split(split)
     groups: dict[str, list[Clip]] = {}
-    for clip in store.of_split(split):
+    for clip in clips:
         groups.setdefault(clip.category, []).append(clip)
     return groups
 
@@ -68,7 +70,7 @@ def babble_of(rng: np.random.Generator, store: Store, voices: dict[str, list[Cli
 def make(store: Path, out: Path, count: int, clean_count: int, seed: int, split: str) -> None:
     rng = np.random.default_rng(seed)
     speech, noise = Store(store, "speech"), Store(store, "noise")
-    voices, noises = by_category(speech, split), by_category(noise, split)
+    voices, noises = by_category(speech, "speech", split), by_category(noise, "noise", split)
     voices = {k: v for k, v in voices.items() if sum(c.length for c in v) > 2 * BASE_RATE}
     names, kinds = sorted(voices), sorted(noises) + ["babble"]
     listing = []
@@ -107,7 +109,7 @@ def main() -> None:
     parser.add_argument("--count", type=int, default=250)
     parser.add_argument("--clean", type=int, default=30)
     parser.add_argument("--seed", type=int, default=2026)
-    parser.add_argument("--split", default="heldout")
+    parser.add_argument("--split", default="heldout", choices=("heldout", "dev"))
     args = parser.parse_args()
     make(args.store, args.out, args.count, args.clean, args.seed, args.split)
 
