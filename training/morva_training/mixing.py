@@ -46,6 +46,7 @@ class Recipe:
     band_limit_share: float = 0.06
     clip_share: float = 0.03
     pause_share: float = 0.5
+    pause_seconds: float = 0.5  # mean length
     speed_share: float = 0.25
     full_band_share: float = 0.35
     boosted: tuple[str, ...] = IMPULSIVE  # noise categories drawn three times as often
@@ -190,7 +191,8 @@ class MixtureMaker:
         """Sentences of one speaker, one after the other, from a random point on."""
         clips = self.speakers[speaker]
         out = np.zeros(self.count, np.float32)
-        position = int(self.rng.uniform(0, 0.5) * self.rate) if pauses and self.rng.random() < 0.4 else 0
+        lead = int(self.rng.uniform(0, 2 * self.recipe.pause_seconds) * self.rate)
+        position = lead if pauses and self.rng.random() < 0.4 else 0
         while position < self.count:
             clip = clips[self.rng.integers(len(clips))]
             offset = int(self.rng.integers(max(1, clip.length - self.rate))) if self.rng.random() < 0.4 else 0
@@ -201,7 +203,7 @@ class MixtureMaker:
             out[position : position + len(piece)] = piece
             position += len(piece)
             if pauses and self.rng.random() < self.recipe.pause_share:
-                position += int(self.rng.exponential(0.5) * self.rate)
+                position += int(self.rng.exponential(self.recipe.pause_seconds) * self.rate)
         return out
 
     def _speed(self, piece: np.ndarray) -> np.ndarray:

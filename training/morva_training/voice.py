@@ -1,8 +1,8 @@
 """Training material of the voice-activity model: mixtures, labels and features at 8 kHz.
 
-Labels come from the clean speech alone. A 10 ms block is voice when its power is within 35 dB of
+Labels come from the clean speech alone. A 10 ms block is voice when its power is within 30 dB of
 the speaker's loud blocks; gaps below 80 ms are closed, islands below 30 ms dropped, edges stay
-where they are. Blocks between 35 and 45 dB count little, they are neither.
+where they are. Blocks between 30 and 42 dB count little, they are neither.
 """
 from __future__ import annotations
 
@@ -25,14 +25,16 @@ FRAME = 240
 FEATURES = 61
 CONTEXT = 5
 BLOCK = RATE // 100
-VOICE_DB, DOUBT_DB = -35.0, -45.0
+VOICE_DB, DOUBT_DB = -30.0, -42.0
 
 VOICE_RECIPE = Recipe(
     seconds=5.0,
-    snr_db=(-6.0, 30.0),
+    snr_db=(-10.0, 22.0),
     level_db=(-45.0, -12.0),
     clean_share=0.08,
-    noise_only_share=0.18,
+    noise_only_share=0.2,
+    pause_share=0.7,
+    pause_seconds=1.0,
     babble_share=0.10,
     room_share=0.35,
     boosted=("music", "keyboard", "mouse_click", "human_nonspeech", "baby_cry", "animal", "dog_bark", "cat", "birds"),
