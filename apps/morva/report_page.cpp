@@ -133,8 +133,9 @@ std::vector<std::pair<std::string, std::string>> summary(Report const& report) {
     if (!report.scores.empty()) {
         double speechMs = 0.0;
         for (auto const& segment : report.segments) speechMs += segment.endMs - segment.startMs;
-        items.emplace_back("Speech", formatted("%.2f s in %zu segments", speechMs / 1000.0,
-                                               report.segments.size()));
+        items.emplace_back(
+            "Speech", formatted("%.2f s in %zu segment%s", speechMs / 1000.0,
+                                report.segments.size(), report.segments.size() == 1 ? "" : "s"));
     }
     if (!report.levelsDb.empty()) {
         auto levels = report.levelsDb;
@@ -152,6 +153,7 @@ PauseLevels pauseLevels(Report const& report) {
     struct Frame {
         double before;
         double after;
+        bool speech;
     };
     auto const size = static_cast<std::size_t>(std::max(report.rateHz * report.frameMs / 1000, 1));
     std::vector<Frame> frames;
@@ -161,11 +163,13 @@ PauseLevels pauseLevels(Report const& report) {
         bool const speech = std::ranges::any_of(report.segments, [&](Segment const& segment) {
             return segment.startMs <= middleMs && middleMs < segment.endMs;
         });
-        if (speech) continue;
         frames.push_back({power(std::span(report.before).subspan(at, size)),
-                          power(std::span(report.after).subspan(at, size))});
+                          power(std::span(report.after).subspan(at, size)), speech});
     }
-    if (report.scores.empty()) {
+    bool const told = !report.scores.empty() && !std::ranges::all_of(frames, &Frame::speech);
+    if (told) {
+        std::erase_if(frames, [](Frame const& frame) { return frame.speech; });
+    } else {
         std::ranges::sort(frames, {}, &Frame::before);
         frames.resize((frames.size() + 9) / 10);
     }
