@@ -1,0 +1,184 @@
+// What the tests of the C interface share: the engine for the length of a test, calls with their
+// printed text, frames and sounds.
+#pragma once
+
+#include <gmock/gmock.h>
+
+#include <cmath>
+#include <numbers>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "morva-sdk/morva-ext.h"
+#include "morva-sdk/morva-sdk.h"
+#include "support/captured_output.h"
+#include "support/temp_dir.h"
+#include "support/weight_writer.h"
+
+namespace sdk_test {
+
+inline constexpr int kRates[] = {8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
+inline constexpr int kDurations[] = {10, 20, 30, 40};
+
+inline MorvaSamplingRate rate(int hz) {
+    return static_cast<MorvaSamplingRate>(hz);
+}
+inline MorvaFrameDuration duration(int ms) {
+    return static_cast<MorvaFrameDuration>(ms);
+}
+inline unsigned samples(int hz, int ms) {
+    return static_cast<unsigned>(hz * ms / 1000);
+}
+
+// What a call returned and printed.
+template <class Result>
+struct Outcome {
+    Result result;
+    std::string out;
+    std::string err;
+};
+
+template <class Call>
+auto observe(Call call) {
+    test_support::CapturedOutput out(1);
+    test_support::CapturedOutput err(2);
+    auto const result = call();
+    auto error = err.text();
+    return Outcome<decltype(call())>{result, out.text(), std::move(error)};
+}
+
+// Matches an Outcome that printed exactly this, or nothing on the stream that is not named.
+template <class Result>
+auto gives(Result result, std::string const& err = "", std::string const& out = "") {
+    using Seen = Outcome<Result>;
+    return ::testing::AllOf(::testing::Field("result", &Seen::result, result),
+                            ::testing::Field("stderr", &Seen::err, err),
+                            ::testing::Field("stdout", &Seen::out, out));
+}
+
+// Matches an Outcome of an engine exception: its one text on standard error. `place` is what stands
+// between "in file " and " Function " (a regular expression).
+template <class Result>
+auto fails(Result result, std::string const& function, std::string const& message,
+           std::string const& place = "[a-z_/0-9-]* Line [0-9]*") {
+    using Seen = Outcome<Result>;
+    return ::testing::AllOf(
+        ::testing::Field("result", &Seen::result, result),
+        ::testing::Field("stderr", &Seen::err,
+                         ::testing::MatchesRegex("MORVA_Exeption in file " + place + " Function " +
+                                                 function + "\n messege " + message + "\n")));
+}
+
+// The engine for one test, without printing.
+class Engine {
+public:
+    explicit Engine(wchar_t const* path = nullptr) {
+        observe([&] { return Morva_SDK_GlobalInit(path, 1); });
+    }
+    Engine(Engine const&) = delete;
+    Engine& operator=(Engine const&) = delete;
+    ~Engine() { Morva_SDK_GlobalDestroy(); }
+
+    static int add(char const* name, std::string const& weight) {
+        return observe([&] {
+                   return Morva_SDK_SetModel_Blob(weight.data(),
+                                                  static_cast<unsigned>(weight.size()), name);
+               })
+            .result;
+    }
+    static void addIdentity(char const* name, int hz, int modelMs) {
+        test_support::NcShape shape;
+        shape.sampleRate = hz;
+        shape.frameLength = hz * modelMs / 1000;
+        shape.timeStamp = name;
+        EXPECT_EQ(add(name, test_support::identityNcWeight(shape)), 0);
+    }
+    static int addShipped(std::string const& file, char const* name) {
+        std::wstring const path(file.begin(), file.end());
+        return observe([&] { return Morva_SDK_SetModel(path.c_str(), name); }).result;
+    }
+};
+
+inline void* openNc(int in, int out, int ms, char const* model) {
+    return Morva_NC_CreateSession(rate(in), rate(out), duration(ms), model);
+}
+
+// One call per sample type, so that tests can be written once.
+inline int clean(void* session, std::vector<short> const& in, std::vector<short>& out) {
+    return Morva_NC_CleanAmbientNoiseInt16(session, in.data(), static_cast<unsigned>(in.size()),
+                                           out.data(), static_cast<unsigned>(out.size()));
+}
+inline int clean(void* session, std::vector<float> const& in, std::vector<float>& out) {
+    return Morva_NC_CleanAmbientNoiseFloat(session, in.data(), static_cast<unsigned>(in.size()),
+                                           out.data(), static_cast<unsigned>(out.size()));
+}
+inline float vad(void* session, std::vector<short> const& in) {
+    return Morva_VAD_FrameInt16(session, in.data(), static_cast<unsigned>(in.size()));
+}
+inline float vad(void* session, std::vector<float> const& in) {
+    return Morva_VAD_FrameFloat(session, in.data(), static_cast<unsigned>(in.size()));
+}
+inline float level(void* session, std::vector<short> const& in) {
+    return Morva_NoiseDB_FrameInt16(session, in.data(), static_cast<unsigned>(in.size()));
+}
+inline float level(void* session, std::vector<float> const& in) {
+    float db = NAN;
+    EXPECT_EQ(
+        MorvaExt_NoiseDB_FrameFloat(session, in.data(), static_cast<unsigned>(in.size()), &db), 0);
+    return db;
+}
+
+// Voice-like sound: harmonics of a gliding pitch in syllables, over a little noise. -1..1.
+inline std::vector<float> voice(int hz, double seconds, unsigned seed, float noise = 0.01F) {
+    test_support::RandomValues random(seed);
+    auto const n = static_cast<std::size_t>(hz * seconds);
+    auto sound = random.vector(static_cast<int>(n), -noise, noise);
+    double phase = 0.0;
+    for (std::size_t i = 0; i < n; ++i) {
+        double const t = static_cast<double>(i) / hz;
+        phase += 2.0 * std::numbers::pi * (140.0 + 30.0 * std::sin(3.0 * t + seed)) / hz;
+        double const syllable = std::max(0.0, std::sin(2.0 * std::numbers::pi * 3.0 * t));
+        double tone = 0.0;
+        for (int k = 1; k * 180 < std::min(hz / 2, 4000); ++k) tone += std::sin(k * phase) / k;
+        sound[i] += static_cast<float>(0.15 * syllable * tone);
+    }
+    return sound;
+}
+
+inline std::vector<short> toPcm(std::vector<float> const& sound) {
+    std::vector<short> pcm(sound.size());
+    for (std::size_t i = 0; i < pcm.size(); ++i) pcm[i] = static_cast<short>(sound[i] * 32767.0F);
+    return pcm;
+}
+
+// Cleans a sound frame by frame; only whole frames are taken.
+template <class Sample>
+std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound) {
+    unsigned inSize = 0;
+    unsigned outSize = 0;
+    EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &inSize, &outSize), 0);
+    std::vector<Sample> all;
+    std::vector<Sample> out(outSize);
+    for (std::size_t at = 0; at + inSize <= sound.size(); at += inSize) {
+        std::vector<Sample> const frame(sound.begin() + static_cast<long>(at),
+                                        sound.begin() + static_cast<long>(at + inSize));
+        EXPECT_EQ(clean(session, frame, out), 0);
+        all.insert(all.end(), out.begin(), out.end());
+    }
+    return all;
+}
+
+// The values of a model that answers with one per frame.
+template <class Sample, class Frame>
+std::vector<float> valuesOf(std::vector<Sample> const& sound, unsigned frameSize, Frame frame) {
+    std::vector<float> values;
+    for (std::size_t at = 0; at + frameSize <= sound.size(); at += frameSize) {
+        values.push_back(
+            frame(std::vector<Sample>(sound.begin() + static_cast<long>(at),
+                                      sound.begin() + static_cast<long>(at + frameSize))));
+    }
+    return values;
+}
+
+}  // namespace sdk_test

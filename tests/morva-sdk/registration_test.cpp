@@ -1,0 +1,226 @@
+// Registering models through the C interface: files, control files, memory; which weights are
+// shared; which model a session gets.
+#include <gtest/gtest.h>
+
+#include "engine.h"
+
+using namespace sdk_test;
+using test_support::NcShape;
+using test_support::randomNcWeight;
+using test_support::randomVadWeight;
+using test_support::TempDir;
+using test_support::VadShape;
+using test_support::WeightWriter;
+
+namespace {
+
+std::string const kNameTaken = "WARNING model name exists or empty, please insert different name";
+std::string const kNoWeight =
+    "Warning Weight name isn't included or weight has beeen included before \n";
+std::string const kInvalid = "ERROR INVALID WEIGHT\nERROR WEIGHT NAME ISNT LONG ENOUGHT\n";
+
+class Registration : public ::testing::Test {
+protected:
+    auto add(std::string const& file, char const* name) {
+        std::wstring const path(file.begin(), file.end());
+        return observe([&] { return Morva_SDK_SetModel(path.c_str(), name); });
+    }
+    auto addBlob(std::string const& bytes, char const* name) {
+        return observe([&] {
+            return Morva_SDK_SetModel_Blob(bytes.data(), static_cast<unsigned>(bytes.size()), name);
+        });
+    }
+    std::string at(std::string const& name) const { return (dir_.path() / name).string(); }
+
+    TempDir dir_;
+    Engine engine_{dir_.path().wstring().c_str()};
+};
+
+auto openNamed(char const* name, int hz = 16000) {
+    return observe([&] { return openNc(hz, hz, 10, name); });
+}
+
+}  // namespace
+
+TEST_F(Registration, WeightFiles) {
+    dir_.write("a.mvw", randomNcWeight({}));
+    EXPECT_THAT(add("./x/..//a.mvw", "a"), gives(0, "", "WEIGHT " + at("a.mvw") + "\n"));
+    EXPECT_THAT(add("a.mvw", "a"), gives(2, "", kNameTaken));
+    EXPECT_THAT(add("a.mvw", ""), gives(2, "", kNameTaken));
+    EXPECT_THAT(add("a.mvw", nullptr), gives(2, "", kNameTaken));
+    EXPECT_THAT(add(at("a.mvw"), "b"), gives(0, "", "WEIGHT " + at("a.mvw") + "\n"));
+    EXPECT_NE(openNamed("a").result, nullptr);
+    EXPECT_NE(openNamed("b").result, nullptr);
+
+    EXPECT_THAT(add("none.mvw", "c"), gives(2, "",
+                                            "WEIGHT " + at("none.mvw") +
+                                                "\nWARNING weight isn't loaded \n weigth file: " +
+                                                at("none.mvw") + "\n" + kNoWeight));
+    for (std::string const name : {"a.MVW", "a.CFG", "a", "a.mvw.bak", "a."}) {
+        dir_.write(name, randomNcWeight({}));
+        EXPECT_THAT(add(name, "c"), gives(2, "", kNoWeight)) << name;
+    }
+    EXPECT_EQ(openNamed("c").result, nullptr);
+}
+
+TEST_F(Registration, NamesOutsideAscii) {
+    std::wstring const wide = L"/m\u00f6d\u00e9l \u6a21\u578b \U0001F3A4.mvw";
+    std::string const bytes =
+        "/m\xc3\xb6"
+        "d\xc3\xa9l \xe6\xa8\xa1\xe5\x9e\x8b \xf0\x9f\x8e\xa4.mvw";
+    test_support::writeFile(dir_.path().string() + bytes, randomNcWeight({}));
+    auto const path = dir_.path().wstring() + wide;
+    EXPECT_THAT(observe([&] { return Morva_SDK_SetModel(path.c_str(), "wide"); }),
+                gives(0, "", "WEIGHT " + dir_.path().string() + bytes + "\n"));
+    dir_.write("w.cfg", "WEIGHT ." + bytes + "\n");
+    EXPECT_EQ(add("w.cfg", "by control").result, 0);
+    // What has no UTF-8 form, and what is none.
+    EXPECT_EQ(observe([] { return Morva_SDK_SetModel(L"/\x110000.mvw", "s"); }).result, -2);
+    dir_.write("bad.cfg", "WEIGHT \xff\xfe.mvw\n");
+    EXPECT_EQ(add("bad.cfg", "s").result, -2);
+    EXPECT_EQ(openNamed("s").result, nullptr);
+    EXPECT_NE(openNamed("wide").result, nullptr);
+}
+
+TEST_F(Registration, ControlFiles) {
+    dir_.write("a.mvw", randomNcWeight({}));
+    struct Row {
+        std::string text;
+        int code;
+        std::string out;
+    };
+    std::string const weight = "WEIGHT a.mvw\n";
+    Row const rows[] = {
+        {"WEIGHT \t a.mvw \r\n", 0, weight},
+        {"# a comment\n\n \t\r\n  K   two  words \nWEIGHT a.mvw", 0,
+         "ENVIRONMENT KEY-\"K\" VALUE-\"two  words\"\n" + weight},
+        {" # word\nWEIGHT a.mvw\n", 0, "ENVIRONMENT KEY-\"#\" VALUE-\"word\"\n" + weight},
+        {"WEIGHT a.mvw\nWEIGHT b.mvw\n", 0,
+         weight + "WARNING multiple weight including, weight exists.\n"},
+        {"WEIGHT none.mvw\nWEIGHT a.mvw\n", 0,
+         "WEIGHT none.mvw\nWARNING weight isn't loaded \n weigth file: " + at("none.mvw") + "\n" +
+             weight},
+        {"CONTROLFILE b.cfg\nWEIGHT a.mvw\n", 0,
+         "WARNING there are CONTROLFILE parameter inside of controlFile, skipped\n" + weight},
+        {"weight a.mvw\n", 2, "ENVIRONMENT KEY-\"weight\" VALUE-\"a.mvw\"\n" + kNoWeight},
+        {"WEIGHT a.mvw\nA 1\nB 2\nA 1\nC 3\n", 2,
+         weight + "ENVIRONMENT KEY-\"A\" VALUE-\"1\"\nENVIRONMENT KEY-\"B\" VALUE-\"2\"\n"
+                  "ENVIRONMENT KEY-\"A\" VALUE-\"1\"\n"},
+        {"WEIGHT a.mvw\nword\n", 2, kNoWeight},
+        {"", 2, kNoWeight},
+        {"# nothing\n", 2, kNoWeight},
+    };
+    int n = 0;
+    for (auto const& row : rows) {
+        auto const name = "m" + std::to_string(n++);
+        dir_.write(name + ".cfg", row.text);
+        EXPECT_THAT(add(name + ".cfg", name.c_str()), gives(row.code, "", row.out)) << row.text;
+        EXPECT_EQ(openNamed(name.c_str()).result != nullptr, row.code == 0) << row.text;
+    }
+    EXPECT_THAT(add("none.cfg", "x"), gives(2, "", kNoWeight));
+}
+
+TEST_F(Registration, ControlFileParametersReachTheModel) {
+    dir_.write("a.mvw", randomNcWeight({}));
+    std::string const key = "MORVA_SMOOT_COEF_v0_0_";
+    dir_.write("six.cfg", "WEIGHT a.mvw\n" + key + "6 2\nMORVA_SKIP_FRAME_v0_0_6 TRUE\n");
+    dir_.write("five.cfg", "WEIGHT a.mvw\n" + key + "5 2\nCONTROL_" + key + "6 2\n");
+    EXPECT_EQ(add("six.cfg", "six").result, 0);
+    EXPECT_EQ(add("five.cfg", "five").result, 0);
+    EXPECT_EQ(openNamed("six").out,
+              "WARNING OF SMOOTH COEF NUMBER VALUE. IT MUST BE iIN INTERVALK (0,1] \n DEFAULT "
+              "VALUE 1.f\n");
+    EXPECT_EQ(openNamed("five").out, "");
+}
+
+TEST_F(Registration, Blobs) {
+    EXPECT_THAT(addBlob(randomNcWeight({}), "a"), gives(0));
+    EXPECT_THAT(addBlob(randomNcWeight({}), "a"), gives(2, "", kNameTaken));
+    EXPECT_THAT(addBlob("", "empty"),
+                gives(0, "", "Warning Nothing added from weight\n" + kInvalid));
+    EXPECT_THAT(openNamed("empty"),
+                fails<void*>(nullptr, "getWeightVersion", "there are no Weight version in Weight ",
+                             "src/weights/weight Line 348"));
+    // With a weight of that kind in the list, the automatic choice goes no further than a perfect
+    // match.
+    EXPECT_NE(openNamed(nullptr, 16000).result, nullptr);
+    EXPECT_EQ(openNamed(nullptr, 24000).result, nullptr);
+}
+
+TEST_F(Registration, IncompleteIdentifiersAreNoReasonToRefuse) {
+    struct Row {
+        char const* name;
+        WeightWriter writer;
+    };
+    auto const base = [] { return WeightWriter().add("Version", "0.0.6"); };
+    Row const rows[] = {
+        {"no stamp", base().add("SampleRate", 8000).add("FrameLength", 160).add("ModelName", "m")},
+        {"slow", base()
+                     .add("SampleRate", 999)
+                     .add("FrameLength", 160)
+                     .add("ModelName", "m")
+                     .add("TimeStamp", "t")},
+        {"no rate", base().add("FrameLength", 160).add("ModelName", "m").add("TimeStamp", "t")},
+        {"wrong type", base()
+                           .add("SampleRate", 8000.0F)
+                           .add("FrameLength", 160)
+                           .add("ModelName", "m")
+                           .add("TimeStamp", "t")},
+    };
+    for (auto const& row : rows) {
+        EXPECT_THAT(addBlob(row.writer.bytes(), row.name), gives(0, "", kInvalid)) << row.name;
+    }
+}
+
+// The identifier is version, milliseconds, kilohertz, model name and time stamp. The two weights
+// differ in their masks, so that a session tells which one it runs.
+TEST_F(Registration, EqualIdentifiersShareOneWeight) {
+    NcShape shape;
+    shape.filtrEnd = 80;
+    auto const loud = identityNcWeight(shape);
+    EXPECT_EQ(addBlob(loud, "first").result, 0);
+    EXPECT_EQ(addBlob(randomNcWeight(shape), "second").result, 0);
+    shape.timeStamp = "210302";
+    EXPECT_EQ(addBlob(randomNcWeight(shape), "third").result, 0);
+    auto const sound = voice(16000, 0.3, 1);
+    auto const first = cleanAll(openNc(16000, 16000, 10, "first"), sound);
+    EXPECT_EQ(cleanAll(openNc(16000, 16000, 10, "second"), sound), first);
+    EXPECT_NE(cleanAll(openNc(16000, 16000, 10, "third"), sound), first);
+}
+
+TEST_F(Registration, AutomaticChoiceTakesTheHighestRateThatFits) {
+    auto const none = fails<void*>(nullptr, "create", "Weight not found ",
+                                   "src/noise_canceller/noise_cleaner Line 105");
+    EXPECT_THAT(openNamed(nullptr), none);
+    // 20 ms at 16 kHz (two of them), 30 ms at 8 kHz, 32 ms at 32 kHz: told apart by their latency.
+    Engine::addIdentity("16k", 16000, 20);
+    EXPECT_THAT(openNamed(nullptr, 12000), none);
+    Engine::addIdentity("16k later", 16000, 30);
+    Engine::addIdentity("8k", 8000, 30);
+    Engine::addIdentity("32k", 32000, 32);
+    VadShape voiceShape;
+    voiceShape.sampleRate = 16000;
+    voiceShape.frameLength = 480;
+    EXPECT_EQ(addBlob(randomVadWeight(voiceShape), "vad").result, 0);
+    for (auto const& [hz, model] : {std::pair{8000, "8k"},
+                                    {12000, "8k"},
+                                    {16000, "16k"},
+                                    {24000, "16k"},
+                                    {32000, "32k"},
+                                    {44100, "32k"},
+                                    {96000, "32k"}}) {
+        EXPECT_EQ(MorvaExt_SessionLatencySamples(openNc(hz, 48000, 10, nullptr)),
+                  MorvaExt_SessionLatencySamples(openNc(hz, 48000, 10, model)))
+            << hz;
+    }
+    // Voice activity looks at its own kind only; the noise level at the other.
+    auto const voiceAt = [](int hz) {
+        return observe([&] { return Morva_VAD_CreateSession(rate(hz), duration(10), nullptr); });
+    };
+    EXPECT_NE(voiceAt(16000).result, nullptr);
+    EXPECT_THAT(voiceAt(8000), none);
+    EXPECT_THAT(
+        observe([] { return Morva_NoiseDB_CreateSession(rate(16000), duration(10), nullptr); }),
+        fails<void*>(nullptr, "create", "Unsupported weight version",
+                     "src/noise_canceller/noise_cleaner Line 127"));
+}
