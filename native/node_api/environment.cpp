@@ -13,9 +13,13 @@ std::atomic<std::size_t> gLiveEnvironments{0};
 
 }  // namespace
 
-Environment::Environment(napi_env env) : env_(env), owner_(pthread_self()) { ++gLiveEnvironments; }
+Environment::Environment(napi_env env) : env_(env), owner_(pthread_self()) {
+    ++gLiveEnvironments;
+}
 
-Environment::~Environment() { --gLiveEnvironments; }
+Environment::~Environment() {
+    --gLiveEnvironments;
+}
 
 void Environment::Initialize(napi_env env) {
     uv_loop_t* loop = nullptr;
@@ -57,7 +61,9 @@ void Environment::Teardown(void* record) {
     if (tCurrent == self.get()) tCurrent = nullptr;
 }
 
-Environment* Environment::Current() { return tCurrent; }
+Environment* Environment::Current() {
+    return tCurrent;
+}
 
 Environment* Environment::Of(napi_env env) {
     void* record = nullptr;
@@ -65,7 +71,9 @@ Environment* Environment::Of(napi_env env) {
                                                            : nullptr;
 }
 
-std::size_t Environment::LiveCount() { return gLiveEnvironments.load(); }
+std::size_t Environment::LiveCount() {
+    return gLiveEnvironments.load();
+}
 
 bool Environment::Usable() const {
     return pthread_equal(owner_, pthread_self()) != 0 && env() != nullptr;
@@ -145,6 +153,8 @@ Environment::Scope::Scope(Environment* environment) : previous_(tCurrent) {
     tCurrent = environment;
 }
 
-Environment::Scope::~Scope() { tCurrent = previous_; }
+Environment::Scope::~Scope() {
+    tCurrent = previous_;
+}
 
 }  // namespace quorral::node_api

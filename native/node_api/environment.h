@@ -3,8 +3,9 @@
 //
 // Thread rule: an environment belongs to the thread that made it (its owner). Functions tagged
 // [owner thread] do nothing elsewhere; those tagged [any thread] may also be called after the
-// environment was torn down. Long-lived holders keep the record itself alive by shared pointer, so a
-// callback dropped late by a foreign thread finds a record that says "gone" instead of freed memory.
+// environment was torn down. Long-lived holders keep the record itself alive by shared pointer, so
+// a callback dropped late by a foreign thread finds a record that says "gone" instead of freed
+// memory.
 #pragma once
 
 #include <node_api.h>

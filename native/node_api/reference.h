@@ -1,7 +1,7 @@
 // References that keep, or only watch, a script value beyond the call that brought it.
 //
-// Thread rule: made on the owner thread; may be destroyed on any thread, the release then happens on
-// the loop thread. Destroying one after its environment was torn down does nothing.
+// Thread rule: made on the owner thread; may be destroyed on any thread, the release then happens
+// on the loop thread. Destroying one after its environment was torn down does nothing.
 #pragma once
 
 #include <node_api.h>
@@ -43,15 +43,14 @@ public:
     }
 
 protected:
-    // Performs a release step on the owner thread. Without memory for the task the step is left out:
-    // the environment's teardown deletes whatever is still referenced.
+    // Performs a release step on the owner thread. Without memory for the task the step is left
+    // out: the environment's teardown deletes whatever is still referenced.
     template <class Step>
     void Release(Step step) noexcept {
         if (IsEmpty()) return;
         try {
-            environment_->RunOrPost([owner = environment_, reference = reference_, step] {
-                step(*owner, reference);
-            });
+            environment_->RunOrPost(
+                [owner = environment_, reference = reference_, step] { step(*owner, reference); });
         } catch (...) {
         }
     }

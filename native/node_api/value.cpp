@@ -108,7 +108,9 @@ Function Function::Make(napi_callback callback, void* data) {
     return Function(function);
 }
 
-Function Function::MakeUndefined() { return Function(Value::Undefined().get(), Unchecked{}); }
+Function Function::MakeUndefined() {
+    return Function(Value::Undefined().get(), Unchecked{});
+}
 
 Value Function::Call(std::size_t argc, const napi_value* argv) const {
     if (IsEmpty() || !Usable()) return {};

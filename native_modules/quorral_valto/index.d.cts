@@ -104,9 +104,11 @@ declare class Session {
 export declare class NoiseCanceller extends Session {
   /** @throws {ValtoError} */
   constructor(options: SessionOptions);
+  /** How many samples the output runs behind the input; constant for the session's life. */
+  readonly latency: number;
   /**
    * Cleans one frame into `output`, by default into the frame itself, and returns what it wrote to.
-   * Allocates nothing. The output runs a constant few tens of milliseconds behind the input.
+   * Allocates nothing.
    * @throws {ValtoError}
    */
   process(frame: Int16Array): Int16Array;

@@ -83,7 +83,9 @@ void ThrowTwice() {
     Environment::Throw("second ", 2);
 }
 
-void ThrowNative() { throw std::runtime_error("native failure"); }
+void ThrowNative() {
+    throw std::runtime_error("native failure");
+}
 
 // Answers with the number of environment records in the process.
 void CountEnvironments(Callback callback) {

@@ -1,4 +1,5 @@
-// Start-up on processors that the engine cannot run on, and the text conversions of the module path.
+// Start-up on processors that the engine cannot run on, and the text conversions of the module
+// path.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 

@@ -160,8 +160,8 @@ napi_value VadSetup(napi_env env, napi_callback_info info) {
 
 napi_value VadProcess(napi_env env, napi_callback_info info) {
     const Call call(env, info);
-    return call.Number(static_cast<double>(gValto.vadProcess(
-        call.Pointer(0), call.Samples(1), static_cast<unsigned>(call.Int(2)))));
+    return call.Number(static_cast<double>(
+        gValto.vadProcess(call.Pointer(0), call.Samples(1), static_cast<unsigned>(call.Int(2)))));
 }
 
 napi_value VadReset(napi_env env, napi_callback_info info) {
@@ -179,7 +179,8 @@ napi_value Start(napi_env env, napi_callback_info info) {
     const int rateHz = call.Int(0);
     const int frameMs = call.Int(1);
     stream->frameSize = static_cast<std::size_t>(rateHz) * static_cast<std::size_t>(frameMs) / 1000;
-    stream->thread = std::thread([&running = *stream, rateHz, frameMs] { running.Run(rateHz, frameMs); });
+    stream->thread =
+        std::thread([&running = *stream, rateHz, frameMs] { running.Run(rateHz, frameMs); });
     gStream = std::move(stream);
     return nullptr;
 }
@@ -203,7 +204,8 @@ napi_value Result(napi_env env, napi_callback_info info) {
     return call.Number(static_cast<double>(stream->scores.size()));
 }
 
-// runForever(rateHz, frameMs): threads that open, feed and close sessions until the process is gone.
+// runForever(rateHz, frameMs): threads that open, feed and close sessions until the process is
+// gone.
 napi_value RunForever(napi_env env, napi_callback_info info) {
     const Call call(env, info);
     const int rateHz = call.Int(0);

@@ -76,7 +76,6 @@ function createSessionClasses(native) {
       this.sampleRate = checked.sampleRate;
       this.frameMs = checked.frameMs;
       this.frameSize = (checked.sampleRate * checked.frameMs) / 1000;
-      Object.freeze(this);
     }
 
     static {
@@ -109,6 +108,8 @@ function createSessionClasses(native) {
   class NoiseCanceller extends Session {
     constructor(options) {
       super(native.openNc, options);
+      this.latency = native.latency(handleOf(this));
+      Object.freeze(this);
     }
 
     process(frame, output = frame) {
@@ -124,6 +125,7 @@ function createSessionClasses(native) {
   class VoiceActivityDetector extends Session {
     constructor(options) {
       super(native.openVad, options);
+      Object.freeze(this);
     }
 
     process(frame) {

@@ -50,6 +50,7 @@ function install(tarball, folder) {
   const quiet = ['--silent', '--no-audit', '--no-fund', '--offline'];
   run('npm', ['install', '--ignore-scripts', ...quiet, tarball], { cwd: folder });
   cpSync(path.join(root, 'test'), path.join(folder, 'test'), { recursive: true });
+  cpSync(path.join(root, '../../examples/node/denoise.mjs'), path.join(folder, 'denoise.mjs'));
 }
 
 // A tree whose voice-activity model is still to be trained is tested with a random one.

@@ -4,7 +4,7 @@ import { test } from 'node:test';
 import vm from 'node:vm';
 import { levelDb, noise } from './support/audio.mjs';
 import { runClean } from './support/child.mjs';
-import { require } from './support/package.mjs';
+import { require, underSanitizer } from './support/package.mjs';
 
 const valto = require('quorral_valto');
 const { NoiseCanceller, VoiceActivityDetector, SAMPLE_RATES, FRAME_DURATIONS } = valto;
@@ -233,5 +233,6 @@ test('sessions that script forgets are closed when collected', async () => {
     { execArgv: ['--expose-gc'] },
   );
   const grown = Number(stdout.trim().split('\n').at(-1));
-  assert.ok(grown < 30e6, `grew by ${grown} bytes`);
+  // The sanitizer holds freed memory back.
+  if (!underSanitizer) assert.ok(grown < 30e6, `grew by ${grown} bytes`);
 });

@@ -1,9 +1,9 @@
 // Makes the module known to the runtime, in both ways that runtimes look for.
 //
-// The static registration serves the load that maps the file. A later load (the module stays resident
-// after the threads that loaded it have ended) runs no static initialiser any more; the runtime then
-// finds the exported init symbol.
-// Thread rule: the thread of the script environment that loads the module.
+// The static registration serves the load that maps the file. A later load (the module stays
+// resident after the threads that loaded it have ended) runs no static initialiser any more; the
+// runtime then finds the exported init symbol. Thread rule: the thread of the script environment
+// that loads the module.
 #include <node_api.h>
 
 #include <exception>
@@ -61,4 +61,6 @@ const StaticRegistration kRegistration;
 }  // namespace
 }  // namespace quorral
 
-NAPI_MODULE_INIT() { return quorral::InitializeModule(env, exports); }
+NAPI_MODULE_INIT() {
+    return quorral::InitializeModule(env, exports);
+}

@@ -14,8 +14,8 @@ void GetNcModels(node_api::Callback callback);
 void GetVadModels(node_api::Callback callback);
 
 // A registered name chooses that model for sessions opened from now on, an unknown one throws.
-// Anything but a string: noise cancellation goes back to choosing by rate, voice activity keeps what
-// it has.
+// Anything but a string: noise cancellation goes back to choosing by rate, voice activity keeps
+// what it has.
 void SetNcModel(node_api::Value value);
 void SetVadModel(node_api::Value value);
 

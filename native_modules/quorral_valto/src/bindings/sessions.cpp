@@ -7,6 +7,7 @@
 #include <stdexcept>
 #include <string>
 
+#include "morva-sdk/morva-ext.h"
 #include "native/node_api/optional.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
@@ -145,7 +146,14 @@ napi_value ProcessVad(napi_env env, napi_callback_info info) {
     const Session* const session = SessionOf(env, handle);
     if (session == nullptr || !session->Is(ValtoVADReset)) return Number(env, kNoVadSession);
     const Samples from = SamplesOf(env, input);
-    return Number(env, static_cast<double>(ValtoVADProcess(session->handle, from.data, from.count)));
+    return Number(env,
+                  static_cast<double>(ValtoVADProcess(session->handle, from.data, from.count)));
+}
+
+napi_value Latency(napi_env env, napi_callback_info info) {
+    const Session* const session = SessionOf(env, ArgumentsOf<1>(env, info)[0]);
+    if (session == nullptr || !session->Is(ValtoNCReset)) return Code(env, 0);
+    return Code(env, MorvaExt_SessionLatencySamples(session->handle));
 }
 
 napi_value Close(napi_env env, napi_callback_info info) {
@@ -190,9 +198,13 @@ void InstallSessions(napi_env env, napi_value target) {
                                         .data = nullptr};
     };
     const std::array methods{
-        method("initialize", InitializeEngine), method("openNc", OpenNc),
-        method("openVad", OpenVad),             method("processNc", ProcessNc),
-        method("processVad", ProcessVad),       method("close", Close),
+        method("initialize", InitializeEngine),
+        method("openNc", OpenNc),
+        method("openVad", OpenVad),
+        method("processNc", ProcessNc),
+        method("processVad", ProcessVad),
+        method("latency", Latency),
+        method("close", Close),
     };
     if (napi_define_properties(env, target, methods.size(), methods.data()) != napi_ok) {
         throw std::runtime_error("The runtime refuses the session functions");

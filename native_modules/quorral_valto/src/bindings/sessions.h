@@ -1,14 +1,15 @@
 // The module's second export object: sessions for script code that has audio in script.
 //
-// A plain require() fills the exports with the five script functions and nothing else. A loader that
-// wants sessions loads the same file with process.dlopen and an exports object that has a property
-// `sessions` holding an object; the module then fills that object instead:
+// A plain require() fills the exports with the five script functions and nothing else. A loader
+// that wants sessions loads the same file with process.dlopen and an exports object that has a
+// property `sessions` holding an object; the module then fills that object instead:
 //   initialize(): number                        start-up code; an engine that is already up answers
 //                                               with the code of its own start-up
-//   openNc(rateHz, frameMs, model | null)       a session, or a number (1 not initialised, 2 unknown
-//   openVad(rateHz, frameMs, model | null)      model, 3 refused by the engine)
+//   openNc(rateHz, frameMs, model | null)       a session, or a number (1 not initialised, 2
+//   unknown openVad(rateHz, frameMs, model | null)      model, 3 refused by the engine)
 //   processNc(session, input, output): number   the engine's code; Int16Array in and out
 //   processVad(session, input): number          the voice score, negative on failure
+//   latency(session): number                    delay of a noise-cancellation session, in samples
 //   close(session): undefined                   repeated calls do nothing
 // These are for the package's own loader, which checks arguments and words the errors.
 // Thread rule: the thread of the script environment; a session belongs to the environment that

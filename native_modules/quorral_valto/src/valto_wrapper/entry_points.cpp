@@ -9,9 +9,9 @@
 #include <mutex>
 #include <string>
 
+#include "morva-sdk/morva-sdk.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/process_gate.h"
-#include "morva-sdk/morva-sdk.h"
 
 namespace quorral {
 namespace {
@@ -22,7 +22,8 @@ constexpr int kDefaultRateHz = 16000;
 constexpr std::array kDurationsMs{10, 15, 20, 30, 32, 40};
 constexpr int kDefaultDurationMs = 10;
 
-// What a call returns when the process is ending: the engine's codes for a session it does not know.
+// What a call returns when the process is ending: the engine's codes for a session it does not
+// know.
 constexpr int kNoSession = 2;
 constexpr int kNothingToClose = -3;
 constexpr float kNoVoiceSession = -4.0F;

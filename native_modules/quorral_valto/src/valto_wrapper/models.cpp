@@ -22,7 +22,9 @@ bool IsNcModel(const std::string& name) {
     return std::ranges::any_of(gNcModels, [&](const NcModel& model) { return model.name == name; });
 }
 
-bool IsVadModel(const std::string& name) { return std::ranges::count(gVadModels, name) != 0; }
+bool IsVadModel(const std::string& name) {
+    return std::ranges::count(gVadModels, name) != 0;
+}
 
 // Puts a value in place for the length of a scope.
 class Substitute {

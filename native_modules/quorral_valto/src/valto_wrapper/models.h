@@ -1,7 +1,7 @@
 // The host's lists of registered models and the choice that script made among them.
 //
-// Thread rule: every function takes the one models lock, so any thread may call them; none belongs on
-// the audio path. The globals themselves are read and written only under that lock.
+// Thread rule: every function takes the one models lock, so any thread may call them; none belongs
+// on the audio path. The globals themselves are read and written only under that lock.
 #pragma once
 
 #include <cstdint>
@@ -19,10 +19,10 @@ struct NcModel {
     std::int32_t maxSampleRate = 0;
 };
 
-extern std::vector<NcModel> gNcModels;        // in registration order
-extern std::string gNcModel;                  // empty: choose by sampling rate
-extern std::vector<std::string> gVadModels;   // in registration order
-extern std::string gVadModel;                 // used by new voice-activity sessions
+extern std::vector<NcModel> gNcModels;       // in registration order
+extern std::string gNcModel;                 // empty: choose by sampling rate
+extern std::vector<std::string> gVadModels;  // in registration order
+extern std::string gVadModel;                // used by new voice-activity sessions
 
 // Serialises start-up, model choice and session set-up. Recursive: a set-up with a model of its own
 // sets the choice, opens through the ordinary entry point and restores, all under one lock.

@@ -1,9 +1,8 @@
-// Counts the engine calls in flight; the exit handler closes the gate and waits for zero.
+// Counts the engine calls in flight; closing waits for zero.
 #include "native_modules/quorral_valto/src/valto_wrapper/process_gate.h"
 
 #include <atomic>
 #include <chrono>
-#include <cstdlib>
 #include <thread>
 
 namespace quorral {
@@ -16,14 +15,6 @@ std::atomic<bool> gClosed{false};
 // then so would the exit.
 constexpr auto kLongestWait = std::chrono::seconds(2);
 constexpr auto kPoll = std::chrono::microseconds(100);
-
-void CloseGate() {
-    gClosed.store(true);
-    const auto deadline = std::chrono::steady_clock::now() + kLongestWait;
-    while (gInFlight.load() != 0 && std::chrono::steady_clock::now() < deadline) {
-        std::this_thread::sleep_for(kPoll);
-    }
-}
 
 }  // namespace
 
@@ -41,9 +32,12 @@ ProcessGate::Pass::~Pass() {
     if (entered_) gInFlight.fetch_sub(1);
 }
 
-void ProcessGate::Arm() {
-    static std::atomic<bool> armed{false};
-    if (!armed.exchange(true)) std::atexit(CloseGate);
+void ProcessGate::Close() {
+    gClosed.store(true);
+    const auto deadline = std::chrono::steady_clock::now() + kLongestWait;
+    while (gInFlight.load() != 0 && std::chrono::steady_clock::now() < deadline) {
+        std::this_thread::sleep_for(kPoll);
+    }
 }
 
 }  // namespace quorral

@@ -1,8 +1,9 @@
 // Lets engine calls in until the process ends, then turns them away.
 //
-// A host's audio thread may still push frames while the process's exit handlers destroy the engine.
-// The gate's own exit handler runs first: it closes the gate and waits for the calls inside.
-// Thread rule: Pass on any thread, two atomic operations, no lock; Arm on the control thread.
+// A host's audio thread may still push frames while the process's exit handlers destroy the engine
+// and the caches under it. No object of this module is destroyed before the gate is closed and the
+// calls inside have come back (exit_order.cpp).
+// Thread rule: any thread. Pass: two atomic operations, no lock. Close: waits.
 #pragma once
 
 namespace quorral {
@@ -23,9 +24,8 @@ public:
         bool entered_;
     };
 
-    // Registers the exit handler. Called once the engine exists, since handlers run in the reverse
-    // order of registration; repeated calls do nothing.
-    static void Arm();
+    // Closes the gate for good and waits for the calls inside.
+    static void Close();
 };
 
 }  // namespace quorral

@@ -9,8 +9,8 @@
 
 namespace quorral::util {
 
-// The converters are deprecated for want of a better error report than an exception; an exception is
-// what is needed here. They keep state, so the shared ones are locked.
+// The converters are deprecated for want of a better error report than an exception; an exception
+// is what is needed here. They keep state, so the shared ones are locked.
 #pragma GCC diagnostic push
 #pragma GCC diagnostic ignored "-Wdeprecated-declarations"
 

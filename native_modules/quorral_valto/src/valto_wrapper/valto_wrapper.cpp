@@ -9,10 +9,9 @@
 #include <new>
 #include <string>
 
-#include "native_modules/quorral_valto/src/valto_wrapper/models.h"
-#include "native_modules/quorral_valto/src/valto_wrapper/process_gate.h"
-#include "native_modules/quorral_valto/src/valto_wrapper/util.h"
 #include "morva-sdk/morva-sdk.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/models.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/util.h"
 
 namespace quorral {
 namespace {
@@ -83,7 +82,9 @@ bool CreateEngine(const std::string& directory) {
 
 }  // namespace
 
-int ValtoInitialize() { return ValtoInitialize(QueryCpuFeatures); }
+int ValtoInitialize() {
+    return ValtoInitialize(QueryCpuFeatures);
+}
 
 int ValtoInitialize(CpuFeatureQuery query) {
     const std::lock_guard guard(ModelsLock());
@@ -101,7 +102,6 @@ int ValtoInitialize(CpuFeatureQuery query) {
         PrintLine("Faild to initialize Morva SDK");
         return kNoEngine;
     }
-    ProcessGate::Arm();
     gInitializeResult = RegisterShippedModels(directory);
     return *gInitializeResult;
 }

@@ -1,5 +1,5 @@
-// Start-up: checks the processor, creates the engine, registers the models that lie beside the module.
-// Thread rule: control threads; serialised by the models lock.
+// Start-up: checks the processor, creates the engine, registers the models that lie beside the
+// module. Thread rule: control threads; serialised by the models lock.
 #pragma once
 
 #include "native/node_api/optional.h"
@@ -16,7 +16,8 @@ int ValtoInitialize(CpuFeatureQuery query);
 // The code that the start-up which created the engine returned; nothing while there is no engine.
 Optional<int> InitializeResult();
 
-// Like ValtoInitialize, but an engine that exists already answers with the code of its own start-up.
+// Like ValtoInitialize, but an engine that exists already answers with the code of its own
+// start-up.
 int EnsureInitialized();
 
 }  // namespace quorral
