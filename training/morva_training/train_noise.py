@@ -6,6 +6,7 @@ again with the same folder.
 from __future__ import annotations
 
 import argparse
+from dataclasses import replace
 from pathlib import Path
 
 import numpy as np
@@ -72,6 +73,8 @@ def parse() -> argparse.Namespace:
     parser.add_argument("--hidden", type=int)
     parser.add_argument("--steps", type=int, default=2000)
     parser.add_argument("--batch", type=int, default=48)
+    parser.add_argument("--seconds", type=float, default=Recipe.seconds, help="length of a piece")
+    parser.add_argument("--reuse", type=int, default=2, help="mixtures made of one draw of speech and noise")
     parser.add_argument("--rate", type=float, default=1e-3)
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--ratio", type=float, default=LossWeights.ratio)
@@ -89,10 +92,10 @@ def main() -> None:
     torch.manual_seed(args.seed)
     if device.type == "cpu":
         torch.set_num_threads(1)
-    recipe = LEVEL_RECIPE if args.level else Recipe()
+    recipe = replace(LEVEL_RECIPE if args.level else Recipe(), seconds=args.seconds)
     # A resumed run must not hear the same mixtures again: the seed moves with the step.
     done = torch.load(args.run / "checkpoint.pt")["step"] if (args.run / "checkpoint.pt").exists() else 0
-    source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done)
+    source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done, args.reuse)
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     network, mean, deviation = start(args, layout, loader)
     schedule = Schedule(args.steps, args.rate)
