@@ -33,7 +33,7 @@ void DestroyBehindGate(void* data) {
 int __wrap___cxa_atexit(void (*destroy)(void*), void* object, void* library) {
     constexpr int kNotRegistered = -1;
     try {
-        auto destruction = std::make_unique<Destruction>(destroy, object);
+        auto destruction = std::make_unique<Destruction>(Destruction{destroy, object});
         const int result = __real___cxa_atexit(DestroyBehindGate, destruction.get(), library);
         if (result == 0) static_cast<void>(destruction.release());
         return result;
