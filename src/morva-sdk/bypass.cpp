@@ -24,6 +24,10 @@ void Bypass::mix(std::vector<float>& cleaned) {
     float const to = target_.load(std::memory_order_relaxed) ? 1.0f : 0.0f;
     share_ = to;
     if (from == 0.0f && to == 0.0f) return;
+    if (from == 1.0f && to == 1.0f) {  // to the bit
+        std::copy_n(original, cleaned.size(), cleaned.begin());
+        return;
+    }
     // One frame is the length of the cross-fade.
     float const step = (to - from) / static_cast<float>(cleaned.size());
     for (std::size_t i = 0; i < cleaned.size(); ++i) {

@@ -44,7 +44,8 @@ MORVA_API int MorvaExt_NC_SetBackgroundSpeaker(void* session, int on);
 
 /* [control thread] Lets the voice-activity model `vadModel` (null: chosen by rate) judge every
  * frame that this session cleans. `inputRate` and `duration` are those of the session. Not while a
- * frame call runs on it. 1 when the frame sizes disagree or the model cannot be opened. */
+ * frame call runs on it. 1 when the frame sizes disagree, -3 when the model cannot be opened; the
+ * session then goes on as it was. */
 MORVA_API int MorvaExt_NC_EnableVoice(void* session, MorvaSamplingRate inputRate,
                                       MorvaFrameDuration duration, char const* vadModel);
 

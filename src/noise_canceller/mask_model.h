@@ -25,6 +25,8 @@ public:
                Generation const& generation)
             : SpectralParams(environment, frameMs, generation), NetworkWeights(*environment.first) {
             NetworkWeights::check(featureWidth(), bands.bands());
+            NetworkWeights::packed =
+                sharedPackedNetwork(environment.second, static_cast<NetworkWeights const&>(*this));
         }
         std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }
     };

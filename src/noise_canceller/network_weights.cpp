@@ -40,6 +40,15 @@ void requireCount(char const* name, std::size_t count, std::size_t atLeast) {
     }
 }
 
+PackedNetwork packNetwork(FeedForwardWeights const& weights,
+                          std::vector<Matrix const*> const& gates) {
+    PackedNetwork packed;
+    for (auto const& matrix : weights.weightNonLinear) packed.nonLinear.emplace_back(matrix);
+    for (auto const& matrix : weights.weightLinear) packed.linear.emplace_back(matrix);
+    for (auto const* gate : gates) packed.gates.emplace_back(*gate);
+    return packed;
+}
+
 FeedForwardWeights::FeedForwardWeights(WEIGHTS::Weight const& weight)
     : weightLinear(weight.getReference<Matrices>("WeightLinear")),
       weightNonLinear(weight.getReference<Matrices>("WeightNonLinear")),

@@ -8,12 +8,21 @@
 #pragma once
 
 #include <cstddef>
+#include <memory>
 #include <vector>
 
 #include "utils/matrix.h"
+#include "utils/packed_matrix.h"
 #include "weights/weight.h"
 
 namespace MORVA::NOISE_CANCELLER {
+
+// The same matrices laid out for fast products, shared by all sessions of a model.
+struct PackedNetwork {
+    std::vector<CONTAINERS::PackedMatrix> nonLinear;
+    std::vector<CONTAINERS::PackedMatrix> linear;
+    std::vector<CONTAINERS::PackedMatrix> gates;  // update gate, reset gate
+};
 
 using Vectors = std::vector<std::vector<float>>;
 using Matrices = std::vector<CONTAINERS::Matrix>;
@@ -25,7 +34,10 @@ struct FeedForwardWeights {
     Matrices const& weightNonLinear;
     Vectors const& baesLinear;
     Vectors const& baesNonLinear;
+    // Optional: without it the products run on the matrices above.
+    std::shared_ptr<PackedNetwork const> packed;
 
+    std::vector<CONTAINERS::Matrix const*> gates() const { return {}; }
     // The network has no recurrent state.
     std::size_t stateWidth(std::size_t) const { return 0; }
     // Throws MORVA_Exception naming the value and both shapes unless the network takes F features
@@ -47,6 +59,7 @@ struct GatedWeights : FeedForwardWeights {
     CONTAINERS::Matrix const& weightGRU;  // (H + F) x G, G = H or 1
     std::vector<float> const& baesGRU;    // G
 
+    std::vector<CONTAINERS::Matrix const*> gates() const { return {&weightGRU}; }
     std::size_t stateWidth(std::size_t features) const;
     void check(std::size_t features, std::size_t outputs) const;
 
@@ -64,9 +77,14 @@ struct LayernormWeights : GatedWeights {
     Vectors const& gainNonLinearNorm;
     Vectors const& biasNonLinearNorm;
 
+    std::vector<CONTAINERS::Matrix const*> gates() const { return {&weightGRU, &weightGRUReset}; }
     std::size_t stateWidth(std::size_t features) const;
     void check(std::size_t features, std::size_t outputs) const;
 };
+
+// Packs the matrices of checked weights.
+PackedNetwork packNetwork(FeedForwardWeights const& weights,
+                          std::vector<CONTAINERS::Matrix const*> const& gates);
 
 // Shape checks for other models: throw MORVA_Exception naming the value, its shape and the one
 // needed.

@@ -1,6 +1,9 @@
 #include "noise_canceller/networks.h"
 
-#include <cmath>
+#include <mkl_vml.h>
+
+#include <algorithm>
+#include <array>
 #include <numeric>
 
 #include "utils/mat_mul.h"
@@ -9,7 +12,44 @@
 namespace MORVA::NOISE_CANCELLER {
 namespace {
 
-using UTIL_FUNCTIONS::matMulPlusB;
+using CONTAINERS::Matrix;
+using CONTAINERS::PackedMatrix;
+
+// One affine layer, x W + b, on the packed matrix where there is one.
+void affine(std::vector<float> const& x, Matrix const& matrix, PackedMatrix const* packed,
+            std::vector<float> const& bias, std::vector<float>& out) {
+    if (packed == nullptr) {
+        UTIL_FUNCTIONS::matMulPlusB(x, matrix, bias, out);
+        return;
+    }
+    out.resize(packed->cols());
+    packed->affine(x.data(), bias.data(), out.data());
+}
+
+// The packed form of matrix `index` in a list of the network, if the network is packed.
+PackedMatrix const* packedIn(FeedForwardWeights const& weights,
+                             std::vector<PackedMatrix> PackedNetwork::*list, std::size_t index) {
+    return weights.packed ? &((*weights.packed).*list)[index] : nullptr;
+}
+
+void nonLinearLayer(std::vector<float> const& x, FeedForwardWeights const& weights,
+                    std::size_t layer, std::vector<float>& out) {
+    affine(x, weights.weightNonLinear[layer], packedIn(weights, &PackedNetwork::nonLinear, layer),
+           weights.baesNonLinear[layer], out);
+}
+
+void linearLayer(std::vector<float> const& x, FeedForwardWeights const& weights, std::size_t layer,
+                 std::vector<float>& out) {
+    affine(x, weights.weightLinear[layer], packedIn(weights, &PackedNetwork::linear, layer),
+           weights.baesLinear[layer], out);
+}
+
+// `index` 0 is the update gate, 1 the reset gate.
+void gateLayer(std::vector<float> const& x, FeedForwardWeights const& weights, std::size_t index,
+               Matrix const& matrix, std::vector<float> const& bias, std::vector<float>& out) {
+    affine(x, matrix, packedIn(weights, &PackedNetwork::gates, index), bias, out);
+    NOISE_CLEANER_FUNCTIONS::sigmoid(out);
+}
 
 // x <- [state, x]
 void joinState(std::vector<float> const& state, std::vector<float>& x, NetworkScratch& scratch) {
@@ -51,13 +91,12 @@ void blend(std::vector<float>& state, std::vector<float> const& x, std::vector<f
 
 void branches(std::vector<float> const& x, std::size_t layer, FeedForwardWeights const& weights,
               NetworkScratch& scratch) {
-    matMulPlusB(x, weights.weightNonLinear[layer], weights.baesNonLinear[layer], scratch.rectified);
-    matMulPlusB(x, weights.weightLinear[layer], weights.baesLinear[layer], scratch.linear);
+    nonLinearLayer(x, weights, layer, scratch.rectified);
+    linearLayer(x, weights, layer, scratch.linear);
 }
 
-void gateOf(std::vector<float> const& x, GatedWeights const& weights, NetworkScratch& scratch) {
-    matMulPlusB(x, weights.weightGRU, weights.baesGRU, scratch.gate);
-    NOISE_CLEANER_FUNCTIONS::sigmoid(scratch.gate);
+void updateGate(std::vector<float> const& x, GatedWeights const& weights, NetworkScratch& scratch) {
+    gateLayer(x, weights, 0, weights.weightGRU, weights.baesGRU, scratch.gate);
 }
 
 // Hidden layers without normalisation; `afterFirst` sees the first layer's output.
@@ -71,14 +110,9 @@ void plainHiddenLayers(std::vector<float>& x, std::size_t hidden, FeedForwardWei
     }
 }
 
-void outputLayer(std::vector<float>& x, CONTAINERS::Matrix const& matrix,
-                 std::vector<float> const& bias, NetworkScratch& scratch) {
-    matMulPlusB(x, matrix, bias, scratch.joined);
-    x.swap(scratch.joined);
-}
-
 void maskLayer(std::vector<float>& x, FeedForwardWeights const& weights, NetworkScratch& scratch) {
-    outputLayer(x, weights.weightNonLinear.back(), weights.baesNonLinear.back(), scratch);
+    nonLinearLayer(x, weights, weights.weightNonLinear.size() - 1, scratch.joined);
+    x.swap(scratch.joined);
     NOISE_CLEANER_FUNCTIONS::sigmoid(x);
 }
 
@@ -87,17 +121,23 @@ void maskLayer(std::vector<float>& x, FeedForwardWeights const& weights, Network
 namespace NOISE_CLEANER_FUNCTIONS {
 
 void sigmoid(std::vector<float>& values) {
-    for (float& value : values) {
-        value = static_cast<float>(1.0 / (1.0 + std::exp(-static_cast<double>(value))));
+    std::array<double, 64> exponential;
+    for (std::size_t first = 0; first < values.size(); first += exponential.size()) {
+        std::size_t const count = std::min(exponential.size(), values.size() - first);
+        float* const block = values.data() + first;
+        for (std::size_t i = 0; i < count; ++i) exponential[i] = -static_cast<double>(block[i]);
+        vdExp(static_cast<MKL_INT>(count), exponential.data(), exponential.data());
+        for (std::size_t i = 0; i < count; ++i) {
+            block[i] = static_cast<float>(1.0 / (1.0 + exponential[i]));
+        }
     }
 }
 
 void calcRMForwardProp_GRU_Layernorm(std::vector<float>& state, std::vector<float>& x,
                                      LayernormWeights const& weights, NetworkScratch& scratch) {
     joinState(state, x, scratch);
-    gateOf(x, weights, scratch);
-    matMulPlusB(x, weights.weightGRUReset, weights.biasGRUReset, scratch.reset);
-    sigmoid(scratch.reset);
+    updateGate(x, weights, scratch);
+    gateLayer(x, weights, 1, weights.weightGRUReset, weights.biasGRUReset, scratch.reset);
     for (std::size_t i = 0; i < state.size(); ++i) x[i] *= scratch.reset[i];
 
     std::size_t const hidden = weights.weightNonLinear.size() - 1;
@@ -117,7 +157,7 @@ void calcRMForwardProp_GRU_Layernorm(std::vector<float>& state, std::vector<floa
 void calcRMForwardProp_GRU_Modify(std::vector<float>& state, std::vector<float>& x,
                                   GatedWeights const& weights, NetworkScratch& scratch) {
     joinState(state, x, scratch);
-    gateOf(x, weights, scratch);
+    updateGate(x, weights, scratch);
     plainHiddenLayers(
         x, weights.weightNonLinear.size() - 1, weights, scratch,
         [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
@@ -134,13 +174,14 @@ void calcRMForwardProp_FeedForward(std::vector<float>&, std::vector<float>& x,
 void calcRMForwardProp_GRU_VAD_Modify(std::vector<float>& state, std::vector<float>& x,
                                       GatedWeights const& weights, NetworkScratch& scratch) {
     joinState(state, x, scratch);
-    gateOf(x, weights, scratch);
+    updateGate(x, weights, scratch);
     plainHiddenLayers(
         x, weights.weightLinear.size() - 1, weights, scratch,
         [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
     // By the number of matrices: a weight may hold more biases than it has layers.
     std::size_t const last = weights.weightLinear.size() - 1;
-    outputLayer(x, weights.weightLinear[last], weights.baesLinear[last], scratch);
+    linearLayer(x, weights, last, scratch.joined);
+    x.swap(scratch.joined);
 }
 
 }  // namespace NOISE_CLEANER_FUNCTIONS

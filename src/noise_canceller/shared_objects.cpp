@@ -5,14 +5,7 @@
 namespace MORVA::NOISE_CANCELLER {
 namespace {
 
-// An environment value of another type under the same name (a control file may hold any key) gives
-// way.
-template <class T, class Make>
-std::shared_ptr<T> findOrMake(CONTAINERS::AnyMap& environment, char const* name, Make&& make) {
-    if (auto found = environment.find<T>(name)) return found;
-    environment.insert<T>(name, make(), CONTAINERS::InsertMode{1});
-    return environment.find<T>(name);
-}
+using detail::findOrMake;
 
 template <class Generator>
 SharedWindow window(CONTAINERS::AnyMap& environment, char const* name, std::size_t length,

@@ -68,6 +68,7 @@ VadParams::VadParams(Environment& environment)
       calibration(readCalibration(*environment.first)),
       enableStateReset(readStateReset(environment)) {
     checkShapes();
+    packed = sharedPackedNetwork(environment.second, static_cast<GatedWeights const&>(*this));
     hammingWindow = sharedHammingWindow(environment.second, frameLength);
     transform = sharedTransform(environment.second, frameLength);
 }
