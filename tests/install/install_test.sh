@@ -1,0 +1,67 @@
+#!/usr/bin/env bash
+# usage: install_test.sh BUILD_DIR SOURCE_DIR - installs into an empty folder and uses what lies there as
+# people outside the project do: CMake package, pkg-config, command line, man page, completion.
+set -euo pipefail
+build=$1 source=$2
+work=$(mktemp -d)
+trap 'rm -rf "$work"' EXIT
+fail() { printf 'FAILED: %s\n' "$*" >&2 && exit 1; }
+
+cmake --install "$build" --prefix "$work/first" >/dev/null
+mv "$work/first" "$work/moved" # nothing may depend on the place
+prefix=$work/moved
+[ -L "$(echo "$prefix"/lib*/libmorva.so)" ] || fail "no development link"
+readelf -d "$prefix"/lib*/libmorva.so | grep -q 'SONAME.*libmorva\.so\.1\]' || fail "SONAME"
+for file in include/morva/morva-sdk.h include/morva/morva-ext.h share/morva/models/NC_small_16k.mvw; do
+    [ -f "$prefix/$file" ] || fail "$file is missing"
+done
+
+echo "-- find_package"
+cmake -S "$source/examples/cmake" -B "$work/user" -G Ninja -DCMAKE_PREFIX_PATH="$prefix" >"$work/log" ||
+    fail "$(cat "$work/log")"
+cmake --build "$work/user" >"$work/log" || fail "$(cat "$work/log")"
+"$work/user/hush" | tee "$work/said" | grep 'hiss lowered' || fail "$(cat "$work/said")"
+lowered=$(sed -n 's/.*lowered by \([0-9.]*\) dB.*/\1/p' "$work/said")
+awk "BEGIN { exit !($lowered > 6 && $lowered < 20.5) }" || fail "lowered by $lowered dB with a limit of 20"
+
+echo "-- pkg-config"
+PKG_CONFIG_PATH=$(echo "$prefix"/lib*/pkgconfig)
+export PKG_CONFIG_PATH
+# shellcheck disable=SC2046
+cc -std=c11 -D_POSIX_C_SOURCE=200809L "$source/examples/c/denoise.c" -o "$work/denoise" \
+    $(pkg-config --cflags --libs morva)
+models=$(pkg-config --variable=modelsdir morva)
+head -c 96000 /dev/urandom >"$work/noise.raw"
+LD_LIBRARY_PATH=$(echo "$prefix"/lib*) "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" 48000 \
+    <"$work/noise.raw" >"$work/quiet.raw" 2>"$work/log"
+[ "$(stat -c %s "$work/quiet.raw")" = 96000 ] || fail "C example: $(cat "$work/log")"
+
+echo "-- command line"
+"$prefix/bin/morva" --version | grep -qx "$(pkg-config --modversion morva)" || fail "versions differ"
+"$prefix/bin/morva" denoise -q "$source/examples/audio/noisy.flac" "$work/clean.wav" # finds its models
+[ -s "$work/clean.wav" ] || fail "no cleaned file"
+
+# Every option that the program has stands in the man page and is completed, and no other.
+# shellcheck source=/dev/null
+source "$prefix/share/bash-completion/completions/morva"
+completed() { # words of the command line; the last one is being completed
+    COMP_WORDS=("$@") COMP_CWORD=$(($# - 1)) COMPREPLY=()
+    _morva
+    printf '%s\n' "${COMPREPLY[@]}" | sort
+}
+page=$(sed 's/\\-/-/g' "$prefix/share/man/man1/morva.1")
+commands=$("$prefix/bin/morva" --help | sed -n '/^Subcommands/,$s/^  \([a-z]*\) .*/\1/p')
+[ "$(completed morva '' | grep -v '^-')" = "$(sort <<<"$commands")" ] || fail "completion of commands"
+for command in $commands; do
+    options=$("$prefix/bin/morva" "$command" --help | grep -oE '^ .*--[a-z-]+' | grep -oE -- '--[a-z-]+' | sort)
+    [ "$(completed morva "$command" --)" = "$options" ] || fail "completion of $command: $options"
+    for option in $options; do
+        grep -qF -- "$option" <<<"$page" || fail "the man page lacks $option"
+    done
+    grep -qx ".B $command" <<<"$page" || fail "the man page lacks $command"
+done
+if command -v man >/dev/null; then
+    warnings=$(MANWIDTH=80 man --warnings -E UTF-8 -l -Tutf8 -Z "$prefix/share/man/man1/morva.1" 2>&1 >/dev/null)
+    [ -z "$warnings" ] || fail "man page: $warnings"
+fi
+echo "installed, moved and used"
