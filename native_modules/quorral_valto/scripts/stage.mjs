@@ -1,5 +1,5 @@
 // Copies the built module with everything that lies beside it into prebuilds/, where the package
-// carries it. Runs before `npm pack`. Usage: node scripts/stage.mjs [folder of the built module]
+// carries it, and the project's licence into the package. Runs before `npm pack`. Usage: node scripts/stage.mjs [folder of the built module]
 import { cpSync, existsSync, mkdirSync, readdirSync, rmSync } from 'node:fs';
 import path from 'node:path';
 import { fileURLToPath } from 'node:url';
@@ -19,3 +19,4 @@ if (!existsSync(path.join(source, 'quorral_valto.node'))) {
 rmSync(target, { recursive: true, force: true });
 mkdirSync(target, { recursive: true });
 for (const name of readdirSync(source)) cpSync(path.join(source, name), path.join(target, name));
+cpSync(path.join(root, '../../LICENSE'), path.join(root, 'LICENSE'));

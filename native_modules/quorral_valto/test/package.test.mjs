@@ -84,6 +84,21 @@ test('a failed start names its cause', async (t) => {
     assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_INVALID', -7]);
     assert.ok(message.includes(WEIGHTS[2]));
   });
+  await t.test('weight with damaged content: its sessions do not open', async () => {
+    const folder = copyPackage(t);
+    writeFileSync(path.join(folder, 'prebuilds/linux-x64', WEIGHTS[2]), 'nonsense');
+    const { stdout } = await runClean(
+      `const { initialize, NoiseCanceller } = require(process.env.MODULE);
+       initialize();
+       for (const sampleRate of [16000, 48000]) {
+         try { new NoiseCanceller({ sampleRate, frameMs: 10 }); console.log('open'); } catch (error) {
+           console.log(error.code);
+         }
+       }`,
+      { env: { MODULE: folder } },
+    );
+    assert.deepEqual(stdout.match(/^(open|ERR_.*)$/gm), ['open', 'ERR_VALTO_SESSION']);
+  });
   await t.test('a path that the engine cannot express', async () => {
     const [code, nativeCode, message] = await startFailure(copyPackage(t, '\u{1f680}'));
     assert.deepEqual([code, nativeCode], ['ERR_VALTO_PATH', -5]);
