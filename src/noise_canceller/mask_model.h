@@ -25,8 +25,10 @@ public:
                Generation const& generation)
             : SpectralParams(environment, frameMs, generation), NetworkWeights(*environment.first) {
             NetworkWeights::check(featureWidth(), bands.bands());
+            std::size_t const layers = NetworkWeights::weightNonLinear.size();
             NetworkWeights::packed =
-                sharedPackedNetwork(environment.second, static_cast<NetworkWeights const&>(*this));
+                sharedPackedNetwork(environment.second, static_cast<NetworkWeights const&>(*this),
+                                    {layers, layers - 1});
         }
         std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }
     };
@@ -35,7 +37,11 @@ public:
         : params_(params),
           spectral_(params, environment, generation),
           pipeline_(params.pipelineShape()),
-          state_(params.stateWidth()) {}
+          state_(params.stateWidth()) {
+        std::size_t const widest = params.widest(params.stateWidth() + params.featureWidth());
+        x_.reserve(widest);
+        scratch_.reserve(widest);
+    }
 
     // Back to the state after construction; the mask floor stays.
     void reset() {

@@ -1,5 +1,6 @@
 #include "noise_canceller/network_weights.h"
 
+#include <algorithm>
 #include <string>
 
 #include "utils/exception.h"
@@ -41,10 +42,14 @@ void requireCount(char const* name, std::size_t count, std::size_t atLeast) {
 }
 
 PackedNetwork packNetwork(FeedForwardWeights const& weights,
-                          std::vector<Matrix const*> const& gates) {
+                          std::vector<Matrix const*> const& gates, LayerCounts const& used) {
     PackedNetwork packed;
-    for (auto const& matrix : weights.weightNonLinear) packed.nonLinear.emplace_back(matrix);
-    for (auto const& matrix : weights.weightLinear) packed.linear.emplace_back(matrix);
+    for (std::size_t i = 0; i < used.nonLinear; ++i) {
+        packed.nonLinear.emplace_back(weights.weightNonLinear[i]);
+    }
+    for (std::size_t i = 0; i < used.linear; ++i) {
+        packed.linear.emplace_back(weights.weightLinear[i]);
+    }
     for (auto const* gate : gates) packed.gates.emplace_back(*gate);
     return packed;
 }
@@ -54,6 +59,11 @@ FeedForwardWeights::FeedForwardWeights(WEIGHTS::Weight const& weight)
       weightNonLinear(weight.getReference<Matrices>("WeightNonLinear")),
       baesLinear(weight.getReference<Vectors>("BaesLinear")),
       baesNonLinear(weight.getReference<Vectors>("BaesNonLinear")) {}
+
+std::size_t FeedForwardWeights::widest(std::size_t inputs) const {
+    for (auto const& matrix : weightNonLinear) inputs = std::max(inputs, matrix.cols);
+    return inputs;
+}
 
 void FeedForwardWeights::check(std::size_t features, std::size_t outputs) const {
     checkLayers(features, 0, outputs);

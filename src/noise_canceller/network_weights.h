@@ -40,6 +40,8 @@ struct FeedForwardWeights {
     std::vector<CONTAINERS::Matrix const*> gates() const { return {}; }
     // The network has no recurrent state.
     std::size_t stateWidth(std::size_t) const { return 0; }
+    // The widest vector between layers, for `inputs` values into the first. Of checked weights.
+    std::size_t widest(std::size_t inputs) const;
     // Throws MORVA_Exception naming the value and both shapes unless the network takes F features
     // to `outputs` values.
     void check(std::size_t features, std::size_t outputs) const;
@@ -82,9 +84,16 @@ struct LayernormWeights : GatedWeights {
     void check(std::size_t features, std::size_t outputs) const;
 };
 
+// How many matrices of each kind the layers use; a weight may hold more, which nobody has checked.
+struct LayerCounts {
+    std::size_t nonLinear;
+    std::size_t linear;
+};
+
 // Packs the matrices of checked weights.
 PackedNetwork packNetwork(FeedForwardWeights const& weights,
-                          std::vector<CONTAINERS::Matrix const*> const& gates);
+                          std::vector<CONTAINERS::Matrix const*> const& gates,
+                          LayerCounts const& used);
 
 // Shape checks for other models: throw MORVA_Exception naming the value, its shape and the one
 // needed.

@@ -118,10 +118,16 @@ void maskLayer(std::vector<float>& x, FeedForwardWeights const& weights, Network
 
 }  // namespace
 
+void NetworkScratch::reserve(std::size_t widest) {
+    for (auto* const vector : {&joined, &gate, &reset, &rectified, &linear}) {
+        vector->reserve(widest);
+    }
+}
+
 namespace NOISE_CLEANER_FUNCTIONS {
 
 void sigmoid(std::vector<float>& values) {
-    std::array<double, 64> exponential;
+    alignas(64) std::array<double, 64> exponential;  // aligned: the same bits on every stack
     for (std::size_t first = 0; first < values.size(); first += exponential.size()) {
         std::size_t const count = std::min(exponential.size(), values.size() - first);
         float* const block = values.data() + first;

@@ -11,6 +11,9 @@
 namespace MORVA::NOISE_CANCELLER {
 
 struct NetworkScratch {
+    // Room for layers of that width, so that the first frame allocates nothing either.
+    void reserve(std::size_t widest);
+
     std::vector<float> joined;  // state and features
     std::vector<float> gate;
     std::vector<float> reset;

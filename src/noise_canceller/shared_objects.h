@@ -37,9 +37,11 @@ SharedTransform sharedTransform(CONTAINERS::AnyMap& environment, std::size_t len
 // The network's matrices packed for fast products; `weights` have been checked.
 template <class NetworkWeights>
 std::shared_ptr<PackedNetwork const> sharedPackedNetwork(CONTAINERS::AnyMap& environment,
-                                                         NetworkWeights const& weights) {
-    return detail::findOrMake<PackedNetwork>(environment, "GEN_PackedNetwork",
-                                             [&] { return packNetwork(weights, weights.gates()); });
+                                                         NetworkWeights const& weights,
+                                                         LayerCounts const& used) {
+    return detail::findOrMake<PackedNetwork>(environment, "GEN_PackedNetwork", [&] {
+        return packNetwork(weights, weights.gates(), used);
+    });
 }
 
 }  // namespace MORVA::NOISE_CANCELLER

@@ -68,7 +68,9 @@ VadParams::VadParams(Environment& environment)
       calibration(readCalibration(*environment.first)),
       enableStateReset(readStateReset(environment)) {
     checkShapes();
-    packed = sharedPackedNetwork(environment.second, static_cast<GatedWeights const&>(*this));
+    std::size_t const layers = weightLinear.size();
+    packed = sharedPackedNetwork(environment.second, static_cast<GatedWeights const&>(*this),
+                                 {layers - 1, layers});
     hammingWindow = sharedHammingWindow(environment.second, frameLength);
     transform = sharedTransform(environment.second, frameLength);
 }
