@@ -1,5 +1,5 @@
-// Counts calls of the global operator new on this thread. Include in exactly one source file of a
-// test program: it replaces the operators of the whole program.
+// Counts calls of the global operator new on this thread, and can make one of them fail. Include in
+// exactly one source file of a test program: it replaces the operators of the whole program.
 #pragma once
 
 #include <cstddef>
@@ -11,6 +11,8 @@ namespace test_support {
 inline thread_local std::size_t allocations = 0;
 inline thread_local std::size_t allocatedBytes = 0;     // released ones included
 inline thread_local std::size_t largestAllocation = 0;  // bytes
+inline thread_local std::size_t releases = 0;           // calls of the global operator delete
+inline thread_local std::size_t failingAllocation = 0;  // which one from now on throws; 0: none
 
 // The number of allocations that `work` makes.
 template <class Work>
@@ -36,17 +38,43 @@ AllocationSizes measureAllocations(Work work) {
 
 }  // namespace test_support
 
+namespace test_support::DETAIL {
+
+inline void* allocate(std::size_t size, std::size_t alignment) {
+    if (failingAllocation != 0 && --failingAllocation == 0) throw std::bad_alloc();
+    ++allocations;
+    allocatedBytes += size;
+    if (size > largestAllocation) largestAllocation = size;
+    std::size_t const rounded = (size + alignment - 1) / alignment * alignment;
+    void* const memory =
+        alignment == 1 ? std::malloc(size == 0 ? 1 : size) : std::aligned_alloc(alignment, rounded);
+    if (memory == nullptr) throw std::bad_alloc();
+    return memory;
+}
+
+inline void release(void* memory) noexcept {
+    if (memory != nullptr) ++releases;
+    std::free(memory);
+}
+
+}  // namespace test_support::DETAIL
+
 // Not inlined: the compiler would see free() meet a "new" and warn.
 [[gnu::noinline]] void* operator new(std::size_t size) {
-    ++test_support::allocations;
-    test_support::allocatedBytes += size;
-    if (size > test_support::largestAllocation) test_support::largestAllocation = size;
-    if (void* const memory = std::malloc(size == 0 ? 1 : size)) return memory;
-    throw std::bad_alloc();
+    return test_support::DETAIL::allocate(size, 1);
+}
+[[gnu::noinline]] void* operator new(std::size_t size, std::align_val_t alignment) {
+    return test_support::DETAIL::allocate(size, static_cast<std::size_t>(alignment));
 }
 [[gnu::noinline]] void operator delete(void* memory) noexcept {
-    std::free(memory);
+    test_support::DETAIL::release(memory);
 }
 [[gnu::noinline]] void operator delete(void* memory, std::size_t) noexcept {
-    std::free(memory);
+    test_support::DETAIL::release(memory);
+}
+[[gnu::noinline]] void operator delete(void* memory, std::align_val_t) noexcept {
+    test_support::DETAIL::release(memory);
+}
+[[gnu::noinline]] void operator delete(void* memory, std::size_t, std::align_val_t) noexcept {
+    test_support::DETAIL::release(memory);
 }
