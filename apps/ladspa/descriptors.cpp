@@ -81,7 +81,7 @@ public:
         for (auto const& port : kControls) put(at++, port);
         descriptor_.UniqueID = id;
         descriptor_.Label = label;
-        descriptor_.Properties = LADSPA_PROPERTY_REALTIME | LADSPA_PROPERTY_HARD_RT_CAPABLE;
+        descriptor_.Properties = LADSPA_PROPERTY_HARD_RT_CAPABLE;
         descriptor_.Name = name;
         descriptor_.Maker = "the Morva project";
         descriptor_.Copyright = "Apache-2.0";

@@ -27,7 +27,8 @@ MORVA_API int MorvaExt_SessionFrameSizes(void* session, unsigned int* inputSize,
 
 /* ---- noise-cancellation sessions while they run ---- */
 
-/* [any thread] Attenuation limit: no part of the sound is lowered by more than `limitDb` decibels.
+/* [any thread] Attenuation limit: within the model's band no part of the sound is lowered by more
+ * than `limitDb` decibels (what lies above the band is lost at any limit; see bypass).
  * 0 lets everything through (delayed), INFINITY is no limit and the default. It is a floor under
  * the mask, so speech and the noise that is left keep one phase; a change fades in over a model
  * hop. 1 for a negative limit or a NaN. Stages after the mask (background speaker, limiter, output
