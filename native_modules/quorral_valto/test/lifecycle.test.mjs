@@ -240,14 +240,21 @@ test('100,000 callbacks leak nothing', { timeout: 120_000 }, async () => {
        gc(); await sleep(0); gc();
        return process.memoryUsage();
      };
-     round(20000).then(async (before) => {
-       const after = await round(100000);
-       console.log(after.heapUsed - before.heapUsed, after.rss - before.rss);
-     });`,
+     (async () => {
+       let last = await round(20000);
+       const growth = [];
+       for (let i = 0; i < 3; ++i) {
+         const now = await round(100000);
+         growth.push([now.heapUsed - last.heapUsed, now.rss - last.rss]);
+         last = now;
+       }
+       console.log(...[0, 1].map((i) => Math.min(...growth.map((round) => round[i]))));
+     })();`,
     { execArgv: ['--expose-gc'] },
   );
+  // The best of several rounds: the runtime's own memory grows in steps now and then. One leaked
+  // reference a call would be about ten megabytes in every round.
   const [heap, rss] = stdout.trim().split('\n').at(-1).split(' ').map(Number);
   assert.ok(heap < 1e6, `heap grew by ${heap} bytes`);
-  // One leaked reference a call would be about ten megabytes.
-  if (!underSanitizer) assert.ok(rss < 6e6, `memory grew by ${rss} bytes`);
+  if (!underSanitizer) assert.ok(rss < 4e6, `memory grew by ${rss} bytes`);
 });
