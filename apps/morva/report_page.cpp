@@ -8,8 +8,8 @@
 #include <span>
 #include <string_view>
 
+#include "formatted.h"
 #include "report_template.h"
-#include "text_output.h"
 
 namespace morva::cli {
 namespace {

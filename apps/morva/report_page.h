@@ -23,7 +23,7 @@ struct Report {
 };
 
 // Mean power in decibels re full scale of the pauses, before and after. Pauses are the frames
-// outside the speech segments or, without voice scores, the quietest tenth of the frames.
+// outside the speech segments or, where these tell of none, the quietest tenth of the frames.
 struct PauseLevels {
     double beforeDb = 0.0;
     double afterDb = 0.0;

@@ -1,8 +1,6 @@
 #include "text_output.h"
 
 #include <cerrno>
-#include <cstdarg>
-#include <cstdio>
 #include <cstring>
 #include <fstream>
 
@@ -29,20 +27,6 @@ void addTextOutput(CLI::App& command, TextOutput& output) {
         .add_option("--format", output.format,
                     "text, csv or json (default: by the output's ending)")
         ->check(CLI::IsMember({"text", "csv", "json"}));
-}
-
-std::string formatted(char const* format, ...) {
-    char text[512];
-    va_list arguments;
-    va_start(arguments, format);
-    int const length = std::vsnprintf(text, sizeof text, format, arguments);
-    va_end(arguments);
-    return std::string(text,
-                       std::min(static_cast<std::size_t>(std::max(length, 0)), sizeof text - 1));
-}
-
-std::string seconds(double milliseconds) {
-    return formatted("%.3f", milliseconds / 1000.0);
 }
 
 }  // namespace morva::cli

@@ -5,6 +5,7 @@
 #include <filesystem>
 #include <string>
 
+#include "formatted.h"
 #include "streams.h"
 
 namespace morva::cli {
@@ -20,11 +21,5 @@ struct TextOutput {
 
 // -o/--output and --format.
 void addTextOutput(CLI::App& command, TextOutput& output);
-
-// printf into a string.
-[[gnu::format(printf, 1, 2)]] std::string formatted(char const* format, ...);
-
-// Seconds with three decimals.
-std::string seconds(double milliseconds);
 
 }  // namespace morva::cli
