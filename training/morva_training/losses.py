@@ -22,6 +22,7 @@ from .spectra import Layout
 
 SPEECH_SPL = 79.0  # dB, level at which P.862 listens
 TRUSTED_EDGE_HZ = 7000.0  # of recordings without content above 8 kHz
+HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.1  # what such recordings may say about the noise above
 SYLLABLE_HOPS = 32
 # Fitted to P.862.2 scores of noisy and cleaned recordings (correlation 0.96): the frames and bands
 # here are not quite the standard's.
@@ -140,7 +141,11 @@ class MaskLoss:
         edges = (layout.band_starts() + widths) * (layout.rate / layout.frame)
         share = widths**-0.5
         self.band_weight = torch.tensor(share / (share * widths).sum(), dtype=torch.float32, device=device)
-        self.trusted = torch.tensor((edges <= TRUSTED_EDGE_HZ).astype(np.float32), device=device)
+        lower = layout.band_starts() * (layout.rate / layout.frame)
+        # Without any say above 8 kHz the mask opens there whenever a narrow-band talker speaks, and
+        # the noise comes and goes with the words; with a full say it would mute everybody's treble.
+        trusted = np.where(edges <= TRUSTED_EDGE_HZ, 1.0, np.where(lower >= HIGH_EDGE_HZ, HIGH_SHARE, 0.0))
+        self.trusted = torch.tensor(trusted.astype(np.float32), device=device)
 
     def __call__(self, logits: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
         """The loss and its terms; the first `skip` frames, where the memory is empty, do not count."""
@@ -161,7 +166,7 @@ class MaskLoss:
 
         speech = batch.has_speech.float()
         count = speech.sum().clamp_min(1.0)
-        heard = (bands > 0).float()
+        heard = bands / self.band_weight
         px, ps, pxs = batch.noisy_power[:, cut], batch.speech_power[:, cut], batch.product[:, cut]
         error = (heard * (gain.square() * px - 2.0 * gain * pxs + ps)).sum((1, 2))
         signal = (heard * ps).sum((1, 2))

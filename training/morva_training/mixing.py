@@ -13,6 +13,7 @@ from pathlib import Path
 
 import numpy as np
 from scipy import fft as sfft
+from scipy.ndimage import gaussian_filter1d
 from scipy.signal import lfilter, resample_poly
 
 from .corpus import BASE_RATE, Clip, Store, load_rooms
@@ -48,6 +49,7 @@ class Recipe:
     pause_share: float = 0.5
     pause_seconds: float = 0.5  # mean length
     speed_share: float = 0.25
+    whisper_share: float = 0.04
     full_band_share: float = 0.35
     boosted: tuple[str, ...] = IMPULSIVE  # noise categories drawn three times as often
 
@@ -109,6 +111,23 @@ def simulated_room(rng: np.random.Generator, rate: int) -> np.ndarray:
     tail *= 10 ** (-direct_to_reverberant / 20) / (np.sqrt(np.sum(tail**2)) + 1e-9)
     tail[0] = 1.0
     return tail.astype(np.float32)
+
+
+def whispered(rng: np.random.Generator, samples: np.ndarray, rate: int) -> np.ndarray:
+    """The same words without a voice: the smoothed spectrum, excited by noise, thin below 500 Hz."""
+    size = rate // 50
+    frames = np.lib.stride_tricks.sliding_window_view(np.pad(samples, (size, size)), size)[:: size // 2]
+    window = np.sin(np.pi * (np.arange(size) + 0.5) / size).astype(np.float32)
+    spectra = sfft.rfft(frames * window, axis=-1)
+    envelope = gaussian_filter1d(np.abs(spectra), 4.0, axis=-1)
+    frequency = np.arange(envelope.shape[-1]) * 50.0
+    noise = rng.standard_normal((*envelope.shape, 2)).astype(np.float32)
+    spectra = envelope * (noise[..., 0] + 1j * noise[..., 1]) * (frequency / (frequency + 500.0))
+    pieces = sfft.irfft(spectra.astype(np.complex64), n=size, axis=-1) * window
+    out = np.zeros((len(pieces) + 1, size // 2), np.float32)
+    out[:-1] += pieces[:, : size // 2]
+    out[1:] += pieces[:, size // 2 :]
+    return out.reshape(-1)[size : size + len(samples)]
 
 
 def coloured_noise(rng: np.random.Generator, count: int, rate: int) -> np.ndarray:
@@ -264,6 +283,8 @@ class MixtureMaker:
         speaker = self._speaker()
         has_speech = kind >= r.noise_only_share
         speech = self.talk(speaker) if has_speech else np.zeros(self.count, np.float32)
+        if has_speech and self.rng.random() < r.whisper_share:
+            speech = whispered(self.rng, speech, self.rate)
         if has_speech and self.rng.random() < r.room_share:
             speech = self.in_room(speech)
         level = FULL_SCALE * 10 ** (self.rng.uniform(*r.level_db) / 20)

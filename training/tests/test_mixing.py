@@ -10,7 +10,7 @@ import pytest
 
 from morva_training import corpus
 from morva_training.batches import MixtureBatches, make_item
-from morva_training.mixing import MixtureMaker, Recipe, active_level, in_dev, simulated_room, smooth_gain
+from morva_training.mixing import MixtureMaker, Recipe, active_level, in_dev, simulated_room, smooth_gain, whispered
 from morva_training.spectra import FULL_32K, SMALL_8K, SMALL_16K
 
 PLAIN = Recipe(
@@ -89,6 +89,25 @@ def test_lower_rates_come_from_the_same_store(store: Path) -> None:
         assert len(x) == len(y) // 4
         level = [np.sqrt(np.mean(np.square(v))) for v in (x, y)]
         assert abs(20 * np.log10(level[0] / level[1])) < 3.0
+
+
+def test_a_whisper_keeps_the_words_and_loses_the_voice() -> None:
+    """Loudness over time stays, the harmonics go."""
+    rng = np.random.default_rng(6)
+    rate = 32000
+    time = np.arange(2 * rate) / rate
+    voice = sum(np.sin(2 * np.pi * 150 * k * time) for k in range(1, 40)) * (np.sin(2 * np.pi * 2 * time) > 0)
+    whisper = whispered(rng, voice.astype(np.float32), rate)
+    assert len(whisper) == len(voice)
+    blocks = [np.square(x.reshape(-1, 640)).mean(1) for x in (voice, whisper)]
+    assert np.corrcoef(*blocks)[0, 1] > 0.7
+    lag = rate // 150
+
+    def periodicity(x: np.ndarray) -> float:
+        x = x[2000:14000]
+        return float(np.corrcoef(x[:-lag], x[lag:])[0, 1])
+
+    assert periodicity(voice) > 0.9 and abs(periodicity(whisper)) < 0.3
 
 
 def test_rooms_and_equalisers_keep_their_scale() -> None:
