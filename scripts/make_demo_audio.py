@@ -48,14 +48,14 @@ def band(rng: np.random.Generator, low: float, high: float) -> np.ndarray:
 def fan(rng: np.random.Generator) -> np.ndarray:
     time = np.arange(RATE * SECONDS) / RATE
     hum = sum(np.sin(2 * np.pi * 118 * k * time + rng.uniform(0, 6.28)) / k for k in range(1, 9))
-    air = band(rng, 60, 900) + 0.5 * band(rng, 900, 5000) + 0.15 * band(rng, 5000, 20000)
-    return 0.35 * hum + air * (1 + 0.1 * np.sin(2 * np.pi * 0.7 * time))
+    air = band(rng, 100, 1500) + 0.6 * band(rng, 900, 6000) + 0.15 * band(rng, 5000, 20000)
+    return 0.2 * hum + air * (1 + 0.1 * np.sin(2 * np.pi * 0.7 * time))
 
 
 def car(rng: np.random.Generator) -> np.ndarray:
     time = np.arange(RATE * SECONDS) / RATE
     near = np.exp(-(((time - 4.8) / 1.1) ** 2))
-    return near * (1.6 * band(rng, 40, 300) + 0.8 * band(rng, 300, 3000))
+    return near * (1.0 * band(rng, 60, 400) + 0.8 * band(rng, 300, 3000))
 
 
 def typing(rng: np.random.Generator) -> np.ndarray:
