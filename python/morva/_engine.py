@@ -1,0 +1,108 @@
+"""The process's one engine and its models. Everything here may be called on any thread."""
+
+from __future__ import annotations
+
+import atexit
+import functools
+import os
+import threading
+from dataclasses import dataclass
+from pathlib import Path
+
+from . import _library
+
+RATES = (8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000)
+
+VOICE_MODEL = "VAD_weight.mvw"
+LEVEL_MODEL = "noise_level_16k.mvw"
+_CLEANING_MODELS = (
+    (8000, "NC_small_8k.mvw"),
+    (16000, "NC_small_16k.mvw"),
+    (96000, "c6.xs.f.ca03f4.mvw"),
+)
+
+
+class EngineError(RuntimeError):
+    """The engine could not do what was asked; the text is its own reason."""
+
+
+@dataclass(frozen=True)
+class Model:
+    """A registered model: rate in hertz, frame in milliseconds, size in bytes."""
+
+    name: str
+    version: str
+    rate: int
+    frame_ms: int
+    size: int
+
+
+_lock = threading.Lock()
+_registered: set[str] = set()
+
+
+def failure(what: str) -> EngineError:
+    reason = _library.library().MorvaExt_LastError().decode(errors="replace")
+    return EngineError(f"{what}: {reason}" if reason else what)
+
+
+def check_rate(rate: int) -> int:
+    if rate not in RATES:
+        raise ValueError(
+            f"a rate of {rate} Hz is not supported; the engine takes {RATES}: resample first"
+        )
+    return int(rate)
+
+
+def cleaning_model(rate: int) -> str:
+    """The shipped noise-suppression model for sound of this rate."""
+    return next(name for highest, name in _CLEANING_MODELS if rate <= highest)
+
+
+def _model_file(name: str) -> Path:
+    if os.sep in name:
+        return Path(name)
+    chosen = os.environ.get("MORVA_MODELS")
+    system = (Path(place) / "share/morva/models" for place in ("/usr", "/usr/local"))
+    folders = [Path(chosen)] if chosen else [_library.BUNDLED / "models", *system]
+    for folder in folders:
+        if (folder / name).exists():
+            return folder / name
+    raise FileNotFoundError(f"the model {name} is in none of {[str(f) for f in folders]}")
+
+
+@functools.cache
+def _start() -> None:
+    if _library.library().Morva_SDK_GlobalInit(None, 1) != 0:
+        raise failure("the engine cannot start")
+    atexit.register(_library.library().Morva_SDK_GlobalDestroy)
+
+
+def register(model: str) -> bytes:
+    """Makes a shipped model (by file name) or any weight file (by path) known; returns its name."""
+    with _lock:
+        _start()
+        if model not in _registered:
+            weight = _model_file(model).read_bytes()
+            name = model.encode()
+            if _library.library().Morva_SDK_SetModel_Blob(weight, len(weight), name) != 0:
+                raise failure(f"{model} is not a usable model")
+            _registered.add(model)
+    return model.encode()
+
+
+def models() -> list[Model]:
+    """The models that have been used so far in this process."""
+    with _lock:
+        _start()
+        count = _library.library().MorvaExt_ListModels(None, 0)
+        found = (_library.ModelInfo * count)()
+        _library.library().MorvaExt_ListModels(found, count)
+    return [
+        Model(m.name.decode(), m.version.decode(), m.sampleRate, m.frameMs, m.size) for m in found
+    ]
+
+
+def version() -> str:
+    """Version of the engine library."""
+    return _library.library().MorvaExt_Version().decode()

@@ -1,0 +1,84 @@
+"""Sound files of any length, in blocks."""
+
+from __future__ import annotations
+
+import math
+import os
+import tempfile
+from collections.abc import Iterator
+from contextlib import ExitStack, contextmanager
+from pathlib import Path
+
+import numpy as np
+import soundfile
+from tqdm import tqdm
+
+from ._streams import Denoiser
+
+_BLOCK_SECONDS = 1.0
+
+
+@contextmanager
+def _complete_or_absent(target: Path) -> Iterator[Path]:
+    """A temporary file that takes the target's name only when its block ends well."""
+    handle, name = tempfile.mkstemp(
+        prefix=f".{target.stem}-", suffix=target.suffix, dir=target.parent
+    )
+    os.close(handle)
+    try:
+        yield Path(name)
+        os.chmod(name, 0o644)
+        os.replace(name, target)
+    except BaseException:
+        Path(name).unlink(missing_ok=True)
+        raise
+
+
+def denoise_file(
+    source: str | os.PathLike[str],
+    target: str | os.PathLike[str],
+    *,
+    frame_ms: int = 10,
+    model: str | None = None,
+    attenuation_limit_db: float = math.inf,
+    progress: bool = False,
+) -> None:
+    """Cleans a sound file (WAV, FLAC, Ogg) into another of the same length, channels and sample type.
+
+    The target appears only when it is complete. `progress` draws a bar on standard error.
+    """
+    target = Path(target)
+    with ExitStack() as stack:
+        reader = stack.enter_context(soundfile.SoundFile(source))
+        options = {
+            "frame_ms": frame_ms,
+            "model": model,
+            "attenuation_limit_db": attenuation_limit_db,
+        }
+        streams = [
+            stack.enter_context(Denoiser(reader.samplerate, **options))
+            for _ in range(reader.channels)
+        ]
+        unfinished = stack.enter_context(_complete_or_absent(target))
+        kind = target.suffix[1:].upper()
+        subtype = reader.subtype if soundfile.check_format(kind, reader.subtype) else None
+        writer = stack.enter_context(
+            soundfile.SoundFile(
+                unfinished, "w", reader.samplerate, reader.channels, subtype, format=kind
+            )
+        )
+        bar = stack.enter_context(
+            tqdm(
+                total=reader.frames,
+                unit="sample",
+                unit_scale=True,
+                disable=not progress,
+                desc=Path(source).name,
+            )
+        )
+        for block in reader.blocks(
+            int(reader.samplerate * _BLOCK_SECONDS), dtype="float32", always_2d=True
+        ):
+            writer.write(np.stack([s.push(block[:, c]) for c, s in enumerate(streams)], axis=1))
+            bar.update(len(block))
+        writer.write(np.stack([s.flush() for s in streams], axis=1))

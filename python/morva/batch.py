@@ -1,0 +1,181 @@
+"""Cleans folders of recordings: python -m morva.batch recordings -o cleaned
+
+Work runs on Dask: by default on the cores of this machine, with --scheduler on a cluster whose workers
+see the same folders and have this package installed. An output appears only when it is complete. The
+journal beside the outputs holds one line per finished file, so that a run that was stopped goes on where
+it was; changed sources and failed files are done again. Files that fail are listed at the end and in
+the journal, and the status is 1.
+"""
+
+from __future__ import annotations
+
+import argparse
+import json
+import math
+import os
+import sys
+from collections.abc import Iterable, Iterator
+from dataclasses import dataclass
+from pathlib import Path
+from typing import Any
+
+JOURNAL = "morva-batch.jsonl"
+ENDINGS = (".wav", ".flac", ".ogg")
+RETRIES = 2  # of a file whose worker died
+
+
+@dataclass(frozen=True)
+class Job:
+    """One file; `settings` are the keyword arguments of denoise_file."""
+
+    source: Path
+    target: Path
+    settings: dict[str, Any]
+
+    def fingerprint(self) -> str:
+        """Changes with the source's content and the settings."""
+        state = self.source.stat()
+        return f"{state.st_size} {state.st_mtime_ns} {json.dumps(self.settings, sort_keys=True)}"
+
+
+def plan(inputs: Iterable[Path], output: Path, settings: dict[str, Any]) -> list[Job]:
+    """Every sound file below the inputs, with its place below the output."""
+    jobs: dict[Path, Job] = {}
+    for given in inputs:
+        if not given.exists():
+            raise FileNotFoundError(f"{given}: no such file or folder")
+        base = given if given.is_dir() else given.parent
+        files = sorted(given.rglob("*")) if given.is_dir() else [given]
+        for source in files:
+            if source.suffix.lower() not in ENDINGS or not source.is_file():
+                continue
+            target = output / source.relative_to(base)
+            if target in jobs:
+                raise ValueError(f"{source} and {jobs[target].source} would both become {target}")
+            if target.resolve() == source.resolve():
+                raise ValueError(f"{source} would be overwritten")
+            if output.resolve() in source.resolve().parents and given.is_dir():
+                continue  # an earlier result inside the input folder
+            jobs[target] = Job(source, target, settings)
+    return list(jobs.values())
+
+
+class Journal:
+    """What is done, one JSON object per line; a line cut by a crash is ignored."""
+
+    def __init__(self, folder: Path) -> None:
+        folder.mkdir(parents=True, exist_ok=True)
+        self._path = folder / JOURNAL
+        self._done: dict[str, str] = {}
+        for entry in self._read():
+            if entry.get("error") is None:
+                self._done[entry["target"]] = entry["fingerprint"]
+            else:
+                self._done.pop(entry["target"], None)
+
+    def _read(self) -> Iterator[dict[str, Any]]:
+        if not self._path.exists():
+            return
+        for line in self._path.read_text().splitlines():
+            try:
+                yield json.loads(line)
+            except json.JSONDecodeError:
+                continue
+
+    def is_done(self, job: Job) -> bool:
+        return job.target.exists() and self._done.get(str(job.target)) == job.fingerprint()
+
+    def add(self, job: Job, error: str | None) -> None:
+        entry = {
+            "source": str(job.source),
+            "target": str(job.target),
+            "fingerprint": job.fingerprint() if job.source.exists() else "",
+            "error": error,
+        }
+        # The leading newline ends a line that a crash may have cut.
+        with self._path.open("a") as file:
+            file.write("\n" + json.dumps(entry))
+
+
+def clean(job: Job) -> str | None:
+    """Runs on a worker: the error's text, or nothing when the file is done."""
+    from morva import denoise_file
+
+    try:
+        job.target.parent.mkdir(parents=True, exist_ok=True)
+        denoise_file(job.source, job.target, **job.settings)
+    except Exception as error:
+        return f"{type(error).__name__}: {error}"
+    return None
+
+
+def run(jobs: list[Job], journal: Journal, client: Any, *, progress: bool = True) -> dict[str, str]:
+    """Cleans what is not done yet; returns the failures by source."""
+    from distributed import as_completed
+    from tqdm import tqdm
+
+    todo = [job for job in jobs if not journal.is_done(job)]
+    if len(todo) < len(jobs):
+        print(f"{len(jobs) - len(todo)} of {len(jobs)} files are done already", file=sys.stderr)
+    futures = {client.submit(clean, job, pure=False, retries=RETRIES): job for job in todo}
+    failures: dict[str, str] = {}
+    with tqdm(total=len(todo), unit="file", disable=not progress) as bar:
+        for future in as_completed(futures):
+            job = futures.pop(future)
+            # A worker that dies too often shows as the future's own error.
+            lost = future.exception() if future.status != "finished" else None
+            error = f"{type(lost).__name__}: {lost}" if lost else future.result()
+            journal.add(job, error)
+            if error is not None:
+                failures[str(job.source)] = error
+            bar.update()
+    return failures
+
+
+def connect(scheduler: str | None, workers: int) -> Any:
+    """A client of the cluster at `scheduler`, or of one on this machine."""
+    from distributed import Client, LocalCluster
+
+    if scheduler:
+        return Client(scheduler)
+    cluster = LocalCluster(n_workers=workers, threads_per_worker=1, dashboard_address=":0")
+    return Client(cluster)
+
+
+def main(arguments: list[str] | None = None) -> int:
+    parser = argparse.ArgumentParser(
+        prog="python -m morva.batch", description="Clean folders of recordings, resumably."
+    )
+    parser.add_argument("inputs", nargs="+", type=Path, help="sound files and folders")
+    parser.add_argument("-o", "--output", required=True, type=Path, help="folder of the results")
+    parser.add_argument("--scheduler", help="address of a Dask scheduler; without it, this machine")
+    parser.add_argument(
+        "--workers", type=int, default=os.cpu_count(), help="processes on this machine"
+    )
+    parser.add_argument("--model", help="shipped model's file name or path of a weight file")
+    parser.add_argument(
+        "--frame", type=int, default=10, choices=(10, 20, 30, 40), help="milliseconds"
+    )
+    parser.add_argument("--attenuation-limit", type=float, default=math.inf, help="decibels")
+    parser.add_argument("--quiet", action="store_true", help="no progress bar")
+    options = parser.parse_args(arguments)
+    settings = {
+        "frame_ms": options.frame,
+        "model": options.model,
+        "attenuation_limit_db": options.attenuation_limit,
+    }
+    try:
+        jobs = plan([i.absolute() for i in options.inputs], options.output.absolute(), settings)
+    except (OSError, ValueError) as error:
+        print(f"morva.batch: {error}", file=sys.stderr)
+        return 2
+    with connect(options.scheduler, options.workers) as client:
+        failures = run(jobs, Journal(options.output), client, progress=not options.quiet)
+    for source, error in failures.items():
+        print(f"{source}: {error}", file=sys.stderr)
+    print(f"{len(jobs) - len(failures)} of {len(jobs)} files cleaned", file=sys.stderr)
+    return 1 if failures else 0
+
+
+if __name__ == "__main__":
+    sys.exit(main())
