@@ -21,10 +21,16 @@ inline constexpr ShippedModel kNoiseModels[] = {{"small_8k", "NC_small_8k.mvw"},
                                                 {"full", "c6.xs.f.ca03f4.mvw"}};
 inline constexpr int kRates[] = {8000, 16000, 32000, 44100, 48000, 96000};
 
+// Where the shipped models are, unless MORVA_BENCH_MODELS names another folder.
+inline std::filesystem::path modelFolder() {
+    char const* const other = std::getenv("MORVA_BENCH_MODELS");
+    return other != nullptr ? other : MORVA_MODELS;
+}
+
 // Starts the engine once and registers every shipped model; ends the process when it cannot.
 inline void startEngine() {
     static bool const started = [] {
-        std::wstring const folder = std::filesystem::path(MORVA_MODELS).wstring();
+        std::wstring const folder = modelFolder().wstring();
         if (Morva_SDK_GlobalInit(folder.c_str(), 1) != 0) std::exit(1);
         for (auto const& [name, file] : kNoiseModels) {
             if (Morva_SDK_SetModel(std::filesystem::path(file).wstring().c_str(), name) != 0) {

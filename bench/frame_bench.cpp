@@ -33,7 +33,7 @@ void openSession(benchmark::State& state) {
 
 void loadModel(benchmark::State& state) {
     startEngine();
-    std::ifstream file(std::string(MORVA_MODELS) + "/c6.xs.f.ca03f4.mvw", std::ios::binary);
+    std::ifstream file(modelFolder() / "c6.xs.f.ca03f4.mvw", std::ios::binary);
     std::string const bytes{std::istreambuf_iterator<char>(file), {}};
     for (auto _ : state) {
         MORVA::WEIGHTS::Weight weight;

@@ -24,8 +24,7 @@ using NOISE_CANCELLER::NoiseCleaner_v0_0_6;
 struct Full {
     Full() : environment(CONTAINERS::makeModelEnvironment()) {
         environment->first = std::make_shared<WEIGHTS::Weight>();
-        std::wstring const path =
-            std::filesystem::path(std::string(MORVA_MODELS) + "/c6.xs.f.ca03f4.mvw").wstring();
+        std::wstring const path = (morva_bench::modelFolder() / "c6.xs.f.ca03f4.mvw").wstring();
         environment->first->read(UTILS::Path(path.c_str()));
         params = std::make_unique<NoiseCleaner_v0_0_6::Params>(*environment, 10);
         for (int i = 0; i < 320 * 2; ++i) sound.push_back(1000.0f * noise(random));

@@ -8,7 +8,9 @@
 #include <cstdlib>
 #include <filesystem>
 #include <numeric>
+#include <span>
 
+#include "bench_engine.h"
 #include "cpu_clock.h"
 #include "utils/interpolation_filter.h"
 #include "utils/packed_matrix.h"
@@ -21,7 +23,6 @@ using MORVA::CONTAINERS::Matrix;
 using MORVA::CONTAINERS::PackedMatrix;
 
 constexpr std::size_t kLargeBytes = std::size_t{256} << 20;
-constexpr std::size_t kSmallBytes = std::size_t{320} << 10;
 constexpr std::size_t kPanel = 32;  // columns are padded to whole panels
 
 double packedBytes(Matrix const& matrix) {
@@ -44,7 +45,7 @@ double transformOperations(double n) {
 }
 
 // Reads `values` once and returns bytes per second.
-double readingRate(std::vector<float> const& values, int times) {
+double readingRate(std::span<float const> values, int times) {
     double const start = cpuSeconds();
     for (int t = 0; t < times; ++t) {
         __m256 sums[8] = {};
@@ -77,7 +78,7 @@ double productRate() {
 
 FrameWork frameWork(std::string const& model, std::string const& file, int rate) {
     MORVA::WEIGHTS::Weight weight;
-    std::wstring const path = std::filesystem::path(MORVA_MODELS "/" + file).wstring();
+    std::wstring const path = (modelFolder() / file).wstring();
     if (!weight.read(MORVA::UTILS::Path(path.c_str()))) std::exit(1);
     FrameWork work{model, rate, 0, 0.0, 0.0};
     auto const add = [&](Matrix const& matrix) {
@@ -101,13 +102,20 @@ FrameWork frameWork(std::string const& model, std::string const& file, int rate)
     return work;
 }
 
-Machine::Machine()
-    : large_(kLargeBytes / sizeof(float), 1.0f), small_(kSmallBytes / sizeof(float), 1.0f) {}
+Machine::Machine() : values_(kLargeBytes / sizeof(float), 1.0f) {}
 
 void Machine::measure() {
-    memory_ = std::max(memory_, readingRate(large_, 1));
-    cache_ = std::max(cache_, readingRate(small_, 400));
+    memory_ = std::max(memory_, readingRate(values_, 1));
     peak_ = std::max(peak_, productRate());
+}
+
+double Machine::bytesPerSecond(FrameWork const& work) const {
+    auto const count = static_cast<std::size_t>(work.weightBytes) / sizeof(float);
+    double best = 0.0;
+    for (int i = 0; i < 10; ++i) {
+        best = std::max(best, readingRate(std::span(values_).first(count), 100));
+    }
+    return best;
 }
 
 }  // namespace morva_bench

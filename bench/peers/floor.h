@@ -24,22 +24,21 @@ FrameWork frameWork(std::string const& model, std::string const& file, int rate)
 class Machine {
 public:
     Machine();
-    // Measures again and keeps the best of all measurements, for a working set of each size.
+    // Measures again and keeps the best of all measurements.
     void measure();
 
     double memoryBytesPerSecond() const { return memory_; }
-    double cacheBytesPerSecond() const { return cache_; }
     double operationsPerSecond() const { return peak_; }
-    // Seconds per frame, with the weights in the cache or in memory.
-    double floor(FrameWork const& work, double bytesPerSecond) const {
-        return work.weightBytes / bytesPerSecond + work.operations / peak_;
+    // Of a block as large as these weights, read again and again: from the cache they live in.
+    double bytesPerSecond(FrameWork const& work) const;
+    // Seconds per frame.
+    double floor(FrameWork const& work, double weightBytesPerSecond) const {
+        return work.weightBytes / weightBytesPerSecond + work.operations / peak_;
     }
 
 private:
-    std::vector<float> large_;  // far beyond the caches
-    std::vector<float> small_;  // about a model
+    std::vector<float> values_;  // far beyond the caches
     double memory_ = 0.0;
-    double cache_ = 0.0;
     double peak_ = 0.0;
 };
 

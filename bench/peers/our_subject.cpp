@@ -28,11 +28,11 @@ void addOurs(Contestants& all) {
         char const* model;
         int rate;
     };
-    for (auto const [model, rate] : {Place{"full", 48000}, Place{"full", 32000},
-                                     Place{"small_16k", 48000}, Place{"small_16k", 16000},
-                                     Place{"small_8k", 8000}}) {
-        all.push_back({std::string("this engine, ") + model, rate,
-                       std::make_unique<Ours>(model, rate)});
+    for (auto const [model, rate] :
+         {Place{"full", 48000}, Place{"full", 32000}, Place{"small_16k", 48000},
+          Place{"small_16k", 16000}, Place{"small_8k", 8000}}) {
+        all.push_back(
+            {std::string("this engine, ") + model, rate, std::make_unique<Ours>(model, rate)});
     }
 }
 

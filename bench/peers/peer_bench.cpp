@@ -75,22 +75,24 @@ void print(std::vector<Line> const& lines, std::string const& reference) {
 }
 
 void printFloor(std::vector<Line> const& lines, Machine const& machine) {
-    std::printf("\nmeasured: %.1f GB/s from memory, %.1f GB/s from the cache, %.1f GFLOP/s\n",
-                machine.memoryBytesPerSecond() / 1e9, machine.cacheBytesPerSecond() / 1e9,
-                machine.operationsPerSecond() / 1e9);
+    std::printf("\nmeasured: %.1f GB/s from memory, %.1f GFLOP/s\n",
+                machine.memoryBytesPerSecond() / 1e9, machine.operationsPerSecond() / 1e9);
     for (auto const& work : {frameWork("full", "c6.xs.f.ca03f4.mvw", 48000),
                              frameWork("small_16k", "NC_small_16k.mvw", 16000)}) {
         auto const line = std::ranges::find_if(lines, [&](Line const& candidate) {
             return candidate.name == "this engine, " + work.model && candidate.rate == work.rate;
         });
-        double const cached = 100.0 * machine.floor(work, machine.cacheBytesPerSecond());
+        double const cacheRate = machine.bytesPerSecond(work);
+        double const cached = 100.0 * machine.floor(work, cacheRate);
         double const memory = 100.0 * machine.floor(work, machine.memoryBytesPerSecond());
         std::printf("%s at %d Hz: %zu parameters, %.0f KiB and %.2f MFLOP a frame\n",
                     work.model.c_str(), work.rate, work.parameters, work.weightBytes / 1024.0,
                     work.operations / 1e6);
-        std::printf("  floor %.5f with weights in the cache, %.5f from memory; measured %.1f x and "
-                    "%.1f x of them\n",
-                    cached, memory, median(line->costs) / cached, median(line->costs) / memory);
+        std::printf(
+            "  floor %.5f with weights in the cache (%.1f GB/s), %.5f from memory; measured "
+            "%.2f x and %.2f x of them\n",
+            cached, cacheRate / 1e9, memory, median(line->costs) / cached,
+            median(line->costs) / memory);
     }
 }
 
