@@ -8,6 +8,7 @@ import tempfile
 from collections.abc import Iterator
 from contextlib import ExitStack, contextmanager
 from pathlib import Path
+from typing import Any
 
 import numpy as np
 import soundfile
@@ -50,7 +51,7 @@ def denoise_file(
     target = Path(target)
     with ExitStack() as stack:
         reader = stack.enter_context(soundfile.SoundFile(source))
-        options = {
+        options: dict[str, Any] = {
             "frame_ms": frame_ms,
             "model": model,
             "attenuation_limit_db": attenuation_limit_db,

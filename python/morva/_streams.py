@@ -103,17 +103,16 @@ class Denoiser(_Session):
         """Cleans one frame of `frame_size` samples, int16 or float."""
         if frame.shape != (self.frame_size,):
             raise ValueError(f"a frame has {self.frame_size} samples, not shape {frame.shape}")
+        kind: Any = ctypes.c_float
+        clean = library().Morva_NC_CleanAmbientNoiseFloat
         if frame.dtype == np.int16:
-            clean, kind, given = library().Morva_NC_CleanAmbientNoiseInt16, ctypes.c_short, frame
-        else:
-            clean, kind = library().Morva_NC_CleanAmbientNoiseFloat, ctypes.c_float
-            given = frame.astype(np.float32)
-        given = np.ascontiguousarray(given)
+            kind, clean = ctypes.c_short, library().Morva_NC_CleanAmbientNoiseInt16
+        given = np.ascontiguousarray(frame, np.int16 if frame.dtype == np.int16 else np.float32)
         out = np.empty_like(given)
         size = self.frame_size
         if clean(self._live(), _pointer(given, kind), size, _pointer(out, kind), size) != 0:
             raise _engine.failure("the engine refused a frame")
-        return out if frame.dtype == np.int16 else out.astype(frame.dtype, copy=False)
+        return out.astype(frame.dtype, copy=False)
 
     def push(self, block: Sound) -> Sound:
         """Takes a block of any length and returns the cleaned samples that are ready."""

@@ -171,8 +171,8 @@ def main(arguments: list[str] | None = None) -> int:
         return 2
     with connect(options.scheduler, options.workers) as client:
         failures = run(jobs, Journal(options.output), client, progress=not options.quiet)
-    for source, error in failures.items():
-        print(f"{source}: {error}", file=sys.stderr)
+    for source, reason in failures.items():
+        print(f"{source}: {reason}", file=sys.stderr)
     print(f"{len(jobs) - len(failures)} of {len(jobs)} files cleaned", file=sys.stderr)
     return 1 if failures else 0
 
