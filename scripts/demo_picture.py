@@ -35,7 +35,7 @@ def si_sdr(sound: np.ndarray, clean: np.ndarray) -> float:
 def draw(sounds: dict[str, np.ndarray], rate: int, path: str) -> None:
     figure, axes = plt.subplots(len(sounds), 1, figsize=(10, 6), sharex=True, layout="constrained")
     floor = 1e-8 * np.random.default_rng(1).standard_normal(max(map(len, sounds.values())))  # no log of 0
-    for axis, (title, sound) in zip(axes, sounds.items()):
+    for axis, (title, sound) in zip(axes, sounds.items(), strict=True):
         _, _, _, image = axis.specgram(
             sound + floor[: len(sound)], NFFT=1024, noverlap=768, Fs=rate, cmap="inferno", vmin=-130, vmax=-45
         )

@@ -10,6 +10,7 @@ std::string formatted(char const* format, ...) {
     char text[512];
     va_list arguments;
     va_start(arguments, format);
+    // NOLINTNEXTLINE(clang-analyzer-valist.Uninitialized): started in the line above
     int const length = std::vsnprintf(text, sizeof text, format, arguments);
     va_end(arguments);
     return std::string(text,

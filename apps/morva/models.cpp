@@ -5,7 +5,6 @@
 #include <array>
 #include <cerrno>
 #include <cstdlib>
-#include <cstring>
 #include <fstream>
 #include <iterator>
 #include <sstream>
@@ -33,7 +32,7 @@ public:
         auto name = (fs::temp_directory_path() / ("morva-XXXXXX" + ending)).string();
         int const number = ::mkstemps(name.data(), static_cast<int>(ending.size()));
         if (number < 0)
-            throw Error("cannot write a temporary file: " + std::string(std::strerror(errno)));
+            throw Error("cannot write a temporary file: " + std::generic_category().message(errno));
         Descriptor const descriptor(number);
         path_ = name;
         std::ofstream stream(path_, std::ios::binary);
@@ -75,7 +74,8 @@ void mustBeFile(fs::path const& file) {
     auto const status = fs::status(file, error);
     if (!fs::exists(status)) throw Error(file.string() + ": no such file");
     if (fs::is_directory(status)) throw Error(file.string() + ": is a folder, not a model");
-    if (::access(file.c_str(), R_OK) != 0) throw Error(file.string() + ": " + std::strerror(errno));
+    if (::access(file.c_str(), R_OK) != 0)
+        throw Error(file.string() + ": " + std::generic_category().message(errno));
 }
 
 bool isControl(fs::path const& file) {
@@ -159,7 +159,7 @@ std::string Models::registered(fs::path const& file) {
 
 fs::path Models::shipped(std::string const& file) const {
     if (!choice_.folder.empty()) {
-        auto const path = choice_.folder / file;
+        auto path = choice_.folder / file;
         mustBeFile(path);
         return path;
     }

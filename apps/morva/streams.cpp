@@ -6,8 +6,8 @@
 
 #include <cerrno>
 #include <cstdio>
-#include <cstring>
 #include <iostream>
+#include <system_error>
 #include <utility>
 
 #include "error.h"
@@ -71,7 +71,8 @@ Streams::~Streams() {
 
 void Streams::out(std::string_view text) {
     if (!writeAll(out_.get(), text)) {
-        throw Error(std::string("cannot write to standard output: ") + std::strerror(errno));
+        throw Error(std::string("cannot write to standard output: ") +
+                    std::generic_category().message(errno));
     }
 }
 

@@ -1,8 +1,8 @@
 #include "text_output.h"
 
 #include <cerrno>
-#include <cstring>
 #include <fstream>
+#include <system_error>
 
 #include "error.h"
 
@@ -18,7 +18,9 @@ void TextOutput::write(Streams& streams, std::string const& text) const {
     if (file.empty()) return streams.out(text);
     std::ofstream stream(file, std::ios::binary);
     stream << text << std::flush;
-    if (!stream) throw Error(file.string() + ": cannot be written: " + std::strerror(errno));
+    if (!stream)
+        throw Error(file.string() +
+                    ": cannot be written: " + std::generic_category().message(errno));
 }
 
 void addTextOutput(CLI::App& command, TextOutput& output) {

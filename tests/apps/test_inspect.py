@@ -4,7 +4,6 @@ import math
 
 import numpy as np
 import pytest
-import soundfile
 
 from conftest import SOURCE
 from weights import constant_mask, encode, loudness_voice

@@ -6,7 +6,7 @@ import numpy as np
 import pytest
 import soundfile
 
-from conftest import SOURCE, speechlike
+from conftest import speechlike
 from weights import constant_mask, loudness_voice
 
 BROWSER, DRIVER = shutil.which("chromium"), shutil.which("chromedriver")

@@ -35,14 +35,17 @@ def test_segments_lie_where_the_sound_is(morva, model, recording, rate, frame):
     reach = (30 + 30 + frame) / 1000  # padding, analysis window, one frame
     expected = [(0.5, 1.4), (2.0, 2.6)]
     assert len(page["segments"]) == len(expected)
-    for segment, (start, end) in zip(page["segments"], expected):
+    for segment, (start, end) in zip(page["segments"], expected, strict=True):
         assert start - reach <= segment["start_s"] <= start
         assert end <= segment["end_s"] <= end + reach
 
 
 def test_rules_are_taken_from_the_command_line(morva, model, recording):
     arguments = ("vad", recording(bursts(16000), 16000), "--model", model(loudness_voice()), "--format", "json")
-    count = lambda *more: len(json.loads(morva(*arguments, *more).stdout)["segments"])
+
+    def count(*more):
+        return len(json.loads(morva(*arguments, *more).stdout)["segments"])
+
     assert count("--min-silence", 10, "--padding", 0) == 3
     assert count("--min-silence", 1000) == 1
     assert count("--threshold", 1.0) == 0
