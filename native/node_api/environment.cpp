@@ -75,10 +75,6 @@ std::size_t Environment::LiveCount() {
     return gLiveEnvironments.load();
 }
 
-bool Environment::Usable() const {
-    return pthread_equal(owner_, pthread_self()) != 0 && env() != nullptr;
-}
-
 void Environment::ThrowText(const std::string& text) const {
     if (!Usable()) return;
     bool pending = false;
@@ -100,14 +96,6 @@ bool Environment::Post(std::unique_ptr<uv::ITask> task) {
     if (!executor_) return false;
     executor_->ExecuteInternal(std::move(task));
     return true;
-}
-
-void Environment::RunOrPost(std::function<void()> work) {
-    if (pthread_equal(owner_, pthread_self()) == 0) {
-        Post(std::make_unique<uv::Task<std::function<void()>>>(std::move(work)));
-    } else if (env() != nullptr) {
-        work();
-    }
 }
 
 napi_ref Environment::CreateReference(napi_value value) {

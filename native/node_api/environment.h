@@ -17,6 +17,7 @@
 #include <memory>
 #include <mutex>
 #include <unordered_set>
+#include <utility>
 #include <vector>
 
 #include "native/node_api/format_string.h"
@@ -49,14 +50,21 @@ public:
     static void ThrowLastError();
 
     // Whether interface calls are allowed here and now.
-    bool Usable() const;
+    bool Usable() const { return IsOwnerThread() && env() != nullptr; }
     napi_env env() const { return env_.load(std::memory_order_acquire); }
 
     // [any thread] Hands a task to the event loop; false (and the task dropped) after teardown.
     bool Post(std::unique_ptr<uv::ITask> task);
-    // [any thread] Runs the work here when this is the owner thread, otherwise posts it. After
-    // teardown nothing runs.
-    void RunOrPost(std::function<void()> work);
+    // [any thread] Runs the work here when this is the owner thread, which takes no memory,
+    // otherwise posts it. After teardown nothing runs.
+    template <class Work>
+    void RunOrPost(Work work) {
+        if (!IsOwnerThread()) {
+            Post(std::make_unique<uv::Task<std::function<void()>>>(std::move(work)));
+        } else if (env() != nullptr) {
+            work();
+        }
+    }
 
     // [owner thread] References are listed so that none outlives the environment.
     napi_ref CreateReference(napi_value value);
@@ -88,6 +96,7 @@ public:
     Environment& operator=(const Environment&) = delete;
 
 private:
+    bool IsOwnerThread() const { return pthread_equal(owner_, pthread_self()) != 0; }
     void ThrowText(const std::string& text) const;
 
     std::atomic<napi_env> env_;

@@ -1,9 +1,14 @@
-// Test module: the script binding layer driven from native threads and between environments.
+// Test module: the script binding layer driven from native threads and between environments, and
+// with allocations that fail.
 #include <node_api.h>
 
 #include <chrono>
+#include <cstddef>
+#include <cstdlib>
 #include <exception>
 #include <mutex>
+#include <new>
+#include <stdexcept>
 #include <string>
 #include <thread>
 #include <utility>
@@ -98,7 +103,41 @@ void Echo(Value value) {
     Environment::Throw("[", text.value_or("not a string"), "]");
 }
 
+// Counts down to the allocation of this thread that fails; 0 when none is to fail.
+thread_local unsigned tFailingAllocation = 0;
+
+// Arms the n-th allocation from now on, n given as text.
+void FailAllocation(Value value) {
+    const auto count = NativeValue<std::string>::Get(value);
+    tFailingAllocation = count ? static_cast<unsigned>(std::stoul(*count)) : 0;
+}
+
+// Throws when the armed allocation has not come yet, and disarms it.
+void Disarm() {
+    const bool waiting = tFailingAllocation != 0;
+    tFailingAllocation = 0;
+    if (waiting) Environment::Throw("not reached");
+}
+
+// The whole way of a result: wrapped callback, queued task, delivery.
+void Deliver(Callback callback) {
+    WrapCallback<Names>(std::move(callback))({"one", "two"});
+}
+
 }  // namespace
+
+// Allocations of this module's own code, which the linker keeps inside of it.
+void* operator new(std::size_t size) {
+    if (tFailingAllocation != 0 && --tFailingAllocation == 0) throw std::bad_alloc();
+    if (void* const memory = std::malloc(size)) return memory;
+    throw std::bad_alloc();
+}
+void operator delete(void* memory) noexcept {
+    std::free(memory);
+}
+void operator delete(void* memory, std::size_t) noexcept {
+    std::free(memory);
+}
 
 NAPI_MODULE_INIT() {
     try {
@@ -113,6 +152,9 @@ NAPI_MODULE_INIT() {
         BindFunction(target, "throwNative", ThrowNative);
         BindFunction(target, "countEnvironments", CountEnvironments);
         BindFunction(target, "echo", Echo);
+        BindFunction(target, "failAllocation", FailAllocation);
+        BindFunction(target, "disarm", Disarm);
+        BindFunction(target, "deliver", Deliver);
     } catch (const std::exception& failure) {
         napi_throw_error(env, nullptr, failure.what());
     }

@@ -82,3 +82,53 @@ test('callbacks kept beyond their environment are dead but harmless', async () =
     })();`);
   assert.equal(stdout, 'alive\n1\n');
 });
+
+// Fails the first, second, ... allocation until the work gets by without reaching it; how often it
+// failed. What the work does may throw, but only for want of memory.
+async function failEach(work) {
+  const again = () => {
+    const module = { exports: {} };
+    process.dlopen(module, bindingPath);
+    return module.exports;
+  };
+  for (let n = 1; n < 200; ++n) {
+    binding.failAllocation(String(n));
+    try {
+      await work(again);
+    } catch (error) {
+      assert.equal(error.message, 'std::bad_alloc');
+    }
+    try {
+      binding.disarm();
+    } catch {
+      return n - 1;
+    }
+  }
+  return assert.fail('there is no end to the allocations');
+}
+
+test('a failed allocation while a callback is queued is an error, then all is well', async () => {
+  let delivered = 0;
+  const failures = await failEach(async () => {
+    binding.deliver(() => ++delivered);
+    await new Promise(setImmediate);
+    await new Promise(setImmediate);
+  });
+  assert.ok(failures >= 5, `${failures}`);
+  assert.ok(delivered >= 1);
+  await new Promise((resolve) => binding.deliver(resolve));
+});
+
+test('a failed allocation while the module loads is an error and leaves nothing behind', async () => {
+  const count = () =>
+    new Promise((resolve) => binding.countEnvironments(([number]) => resolve(Number(number))));
+  const before = await count();
+  let loaded = 0;
+  const failures = await failEach((again) => {
+    if (typeof again().disarm === 'function') ++loaded;
+  });
+  assert.ok(failures >= 10, `${failures}`);
+  assert.ok(loaded <= 1);
+  // Environments live until the runtime tears them down; a load that failed early has none.
+  assert.ok((await count()) - before < failures);
+});
