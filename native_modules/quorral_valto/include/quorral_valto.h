@@ -5,8 +5,8 @@
  * rate * durationMs / 1000 samples.
  *
  * Threads: Setup and Reset take locks and may print, keep them off the audio path. Process takes no
- * lock. One session belongs to one thread at a time; different sessions may run on different threads.
- * Calls that come while the process ends return at once: null, 2, -3 or -4.0.
+ * lock. One session belongs to one thread at a time; different sessions may run on different
+ * threads. Calls that come while the process ends return at once: null, 2, -3 or -4.0.
  */
 #ifndef QUORRAL_VALTO_H
 #define QUORRAL_VALTO_H
@@ -15,10 +15,10 @@
 extern "C" {
 #endif
 
-/* [control thread] Opens a noise-cancellation session; null on failure. Rates in hertz: 8000, 12000,
- * 16000, 24000, 32000, 44100, 48000, 88200, 96000 (another one is replaced by 16000, with a printed
- * line). Durations in milliseconds: 10, 20, 30, 40 (15 and 32 fail, others become 10, with a printed
- * line). Model: the one that script chose, otherwise the first that covers the rate. */
+/* [control thread] Opens a noise-cancellation session; null on failure. Rates in hertz: 8000,
+ * 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000 (another one is replaced by 16000, with a
+ * printed line). Durations in milliseconds: 10, 20, 30, 40 (15 and 32 fail, others become 10, with
+ * a printed line). Model: the one that script chose, otherwise the first that covers the rate. */
 typedef void* (*ValtoNCSetupFn)(int samplingRate, int frameDurationMs);
 
 /* [audio thread] Cleans one frame; input and output may be the same buffer. Sizes in samples, both
@@ -30,7 +30,8 @@ typedef int (*ValtoNCProcessFn)(void* session, const short* input, unsigned int 
 /* [control thread] Closes the session: 0, or -3 for a handle that is not open. */
 typedef int (*ValtoNCResetFn)(void* session);
 
-/* [control thread] Opens a voice-activity session with the voice-activity model chosen by script. */
+/* [control thread] Opens a voice-activity session with the voice-activity model chosen by script.
+ */
 typedef void* (*ValtoVADSetupFn)(int samplingRate, int frameDurationMs);
 
 /* [audio thread] Probability 0..1 that the frame holds voice; -3 a wrong size or null buffer (other
