@@ -33,9 +33,10 @@ public:
         std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }
     };
 
-    MaskModel(Params const& params, CONTAINERS::AnyMap& environment, Generation const& generation)
+    MaskModel(Params const& params, CONTAINERS::AnyMap& environment, Generation const& generation,
+              Synthesis synthesis = Synthesis::FromKept)
         : params_(params),
-          spectral_(params, environment, generation),
+          spectral_(params, environment, generation, synthesis),
           pipeline_(params.pipelineShape()),
           state_(params.stateWidth()) {
         std::size_t const widest = params.widest(params.stateWidth() + params.featureWidth());

@@ -37,9 +37,10 @@ std::size_t contextCapacity(SpectralParams const& params) {
 }  // namespace
 
 SpectralCleaner::SpectralCleaner(SpectralParams const& params, CONTAINERS::AnyMap& environment,
-                                 Generation const& generation)
+                                 Generation const& generation, Synthesis synthesis)
     : params_(params),
       level_(generation.level),
+      direction_(synthesis),
       transform_(sharedTransform(environment, params.frameLength)),
       context_(params.previewFrames, params.bands.bands(), contextCapacity(params)),
       shaper_(params),
@@ -99,11 +100,21 @@ void SpectralCleaner::analyse(float const* in, std::vector<float>& x) {
     context_.push(features_, params_.mu, params_.sd, x);
 }
 
+void SpectralCleaner::synthesise(std::vector<float> const& mask, float floor) {
+    bool const kept = direction_ == Synthesis::FromKept;
+    for (std::size_t k = 0; k < spectrum_.size(); ++k) {
+        float const gain = std::max(mask[k], floor);
+        spectrum_[k] *= kept ? gain : 1.0f - gain;
+    }
+    transform_->computeBackward(spectrum_, frame_);
+    if (kept) return;
+    for (std::size_t i = 0; i < frame_.size(); ++i) frame_[i] = windowed_[i] - frame_[i];
+}
+
 void SpectralCleaner::applyMask(std::vector<float> const& mask, float floor) {
     auto& full = shaper_.shape(mask);
     if (gate_) gate_->applyEnThreshold(full);
-    for (std::size_t k = 0; k < spectrum_.size(); ++k) spectrum_[k] *= std::max(full[k], floor);
-    transform_->computeBackward(spectrum_, frame_);
+    synthesise(full, floor);
     if (params_.volumeUp) {
         float const gain = 1.0f + params_.volumeUpPercent / 100.0f;
         for (float& sample : frame_) sample *= gain;

@@ -27,11 +27,16 @@
 
 namespace MORVA::NOISE_CANCELLER {
 
+// How the masked spectrum becomes a frame: transformed back as it is, which makes silence of a mask
+// of 0 exact; or as the windowed input less the transform of what the mask takes away, which makes
+// a mask of 1 exact (what is measured as removed is then not the transforms' rounding).
+enum class Synthesis { FromKept, FromRemoved };
+
 class SpectralCleaner {
 public:
     // `params` must outlive this object.
     SpectralCleaner(SpectralParams const& params, CONTAINERS::AnyMap& environment,
-                    Generation const& generation);
+                    Generation const& generation, Synthesis synthesis);
 
     // Back to the state after construction.
     void reset();
@@ -50,10 +55,12 @@ public:
 
 private:
     void buildLevelReference();
+    void synthesise(std::vector<float> const& mask, float floor);
     float levelGain(float const* in);
 
     SpectralParams const& params_;
     LevelReference level_;
+    Synthesis direction_;
     SharedWindow analysis_;
     SharedWindow synthesis_;
     SharedTransform transform_;
