@@ -23,27 +23,34 @@ void addEngineOptions(CLI::App& command, EngineOptions& options) {
     command.add_flag("--verbose", options.verbose, "Show what the engine prints");
 }
 
-}  // namespace morva::cli
+namespace {
 
-int main(int argc, char** argv) {
+int run(int argc, char** argv) {
     CLI::App app{
         "Real-time voice processing on sound files: noise suppression, voice activity, noise level",
         "morva"};
     app.require_subcommand(1);
     app.set_version_flag("--version", MORVA_VERSION);
-    morva::cli::Action action;
-    morva::cli::addDenoise(app, action);
-    morva::cli::addInspect(app, action);
-    morva::cli::addVad(app, action);
-    morva::cli::addLevel(app, action);
-    morva::cli::addReport(app, action);
+    Action action;
+    addDenoise(app, action);
+    addInspect(app, action);
+    addVad(app, action);
+    addLevel(app, action);
+    addReport(app, action);
     try {
         app.parse(argc, argv);
     } catch (CLI::ParseError const& error) {
         return app.exit(error) == 0 ? 0 : 2;
     }
+    return action();
+}
+
+}  // namespace
+}  // namespace morva::cli
+
+int main(int argc, char** argv) {
     try {
-        return action();
+        return morva::cli::run(argc, argv);
     } catch (std::exception const& error) {
         std::fprintf(stderr, "morva: %s\n", error.what());
         return 1;

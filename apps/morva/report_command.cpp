@@ -48,7 +48,8 @@ std::vector<float> orNote(Report& report, bool named, char const* what, Measure 
 }
 
 Report measured(Streams& streams, ReportOptions const& options) {
-    auto const& [models, frameMs, verbose] = options.engine;
+    auto const& models = options.engine.models;
+    int const frameMs = options.engine.frameMs;
     auto const name = options.file.string();
     auto sound = readMono(options.file, options.maxSeconds);
     Engine engine(streams, controlFolder(models));
