@@ -4,7 +4,6 @@
 
 #include <chrono>
 #include <cstddef>
-#include <cstdlib>
 #include <exception>
 #include <mutex>
 #include <new>
@@ -126,17 +125,15 @@ void Deliver(Callback callback) {
 
 }  // namespace
 
-// Allocations of this module's own code, which the linker keeps inside of it.
-void* operator new(std::size_t size) {
+// Every allocation of this module's own code comes through here: linked with --wrap=_Znwm, the name
+// of operator new for the linker.
+extern "C" {
+void* __real__Znwm(std::size_t size);
+void* __wrap__Znwm(std::size_t size);
+}
+void* __wrap__Znwm(std::size_t size) {
     if (tFailingAllocation != 0 && --tFailingAllocation == 0) throw std::bad_alloc();
-    if (void* const memory = std::malloc(size)) return memory;
-    throw std::bad_alloc();
-}
-void operator delete(void* memory) noexcept {
-    std::free(memory);
-}
-void operator delete(void* memory, std::size_t) noexcept {
-    std::free(memory);
+    return __real__Znwm(size);
 }
 
 NAPI_MODULE_INIT() {
