@@ -82,16 +82,17 @@ void Plugin::run(std::size_t samples) {
     followControls();
     if (auto* const latency = control(Control::latency)) *latency = latency_;
     for (std::size_t c = 0; c < channels_.size(); ++c) {
-        auto& [session, fifo] = channels_[c];
+        auto& channel = channels_[c];
         auto const* const in = ports_[c];
         auto* const out = ports_[channels_.size() + c];
         if (in == nullptr || out == nullptr) continue;
-        fifo.run({in, samples}, {out, samples},
-                 [&](std::span<float const> dirty, std::span<float> clean) {
-                     Morva_NC_CleanAmbientNoiseFloat(
-                         session.get(), dirty.data(), static_cast<unsigned>(dirty.size()),
-                         clean.data(), static_cast<unsigned>(clean.size()));
-                 });
+        channel.fifo.run({in, samples}, {out, samples},
+                         [&](std::span<float const> dirty, std::span<float> clean) {
+                             Morva_NC_CleanAmbientNoiseFloat(channel.session.get(), dirty.data(),
+                                                             static_cast<unsigned>(dirty.size()),
+                                                             clean.data(),
+                                                             static_cast<unsigned>(clean.size()));
+                         });
     }
 }
 

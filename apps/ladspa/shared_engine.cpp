@@ -34,7 +34,9 @@ fs::path pluginFolder() {
 }
 
 std::vector<fs::path> modelFolders() {
-    if (char const* const chosen = std::getenv("MORVA_MODELS")) return {chosen};
+    // A host that changes its environment while it loads plugins has raced with more than this.
+    char const* const chosen = std::getenv("MORVA_MODELS");  // NOLINT(concurrency-mt-unsafe)
+    if (chosen != nullptr) return {chosen};
     auto const plugin = pluginFolder();
     return {plugin, plugin / "../share/morva/models", plugin / "../../share/morva/models"};
 }
