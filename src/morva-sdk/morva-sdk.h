@@ -10,10 +10,11 @@
  *
  * Threads
  *   [control thread]  takes the engine's lock, allocates, prints; never call it from an audio
- * callback. [audio thread]    takes no lock and, after the first frames, allocates nothing. One
- * thread at a time per session; different sessions may run on different threads at the same time.
+ *   callback.
+ *   [audio thread]    takes no lock and, after the first frames, allocates nothing. One thread at
+ *   a time per session; different sessions may run on different threads at the same time.
  *   Do not close a session while a frame call on it runs, nor destroy the engine while any call
- * runs.
+ *   runs.
  *
  * Processor
  *   The engine needs an x86-64 processor with AVX2, FMA and BMI2; on any other Morva_SDK_GlobalInit
@@ -30,10 +31,9 @@
  * Frames
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
  *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and
- * are limited to that range (float output lies in -1..0.999969482421875). A NaN counts as 0, an
- * infinite or absurdly large sample as a very loud one: the frame comes out limited, and nothing of
- * it stays in the session beyond the network's normal memory. Input and output may be the same
- * buffer.
+ *   are limited to that range (float output lies in -1..0.999969482421875). A sample that is no
+ *   sound (a NaN, an infinity, a magnitude above 1e6) counts as 0, so that a bad frame is like a
+ *   frame of silence: nothing of it stays in the session. Input and output may be the same buffer.
  */
 #ifndef MORVA_SDK_H
 #define MORVA_SDK_H

@@ -27,7 +27,8 @@ void pcm16ToFloat(std::span<short const> in, std::span<float> out) {
 
 void unitToPcm16Scale(std::span<float const> in, std::span<float> out) {
     for (std::size_t i = 0; i < in.size(); ++i) {
-        out[i] = limited(in[i] * fullScale, -inputLimit, inputLimit);
+        float const sample = in[i] * fullScale;
+        out[i] = sample >= -inputLimit && sample <= inputLimit ? sample : 0.0f;
     }
 }
 

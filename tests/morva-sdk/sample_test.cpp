@@ -68,7 +68,8 @@ double snrDb(std::vector<float> const& wanted, std::vector<float> const& got, st
 }  // namespace
 
 // With a mask of 1 nothing at all is left a second after eleven bad frames; a trained model, whose
-// level reference remembers loud frames for three seconds, is close to undisturbed after one.
+// level reference remembers loud frames for three seconds, is close to undisturbed. Samples that
+// are no sound are like silence to it.
 TEST_F(Samples, HostileSoundStaysInRangeAndIsForgotten) {
     auto const afterwards = [](int hz, std::string const& model, int first, int count) {
         auto const sound = voice(hz, 2.2, 5);
@@ -89,10 +90,23 @@ TEST_F(Samples, HostileSoundStaysInRangeAndIsForgotten) {
         for (int kind = 0; kind < kHostileKinds; ++kind) {
             worst = std::min(worst, afterwards(48000, model, kind, 1));
         }
-        EXPECT_GT(afterwards(48000, model, 0, kHostileKinds), 10.0);
+        worst = std::min(worst, afterwards(48000, model, 0, kHostileKinds));
     }
-    std::printf("[   after  ] one hostile frame, trained models: at least %.1f dB\n", worst);
-    EXPECT_GT(worst, 20.0);
+    std::printf("[   after  ] hostile frames, trained models: at least %.1f dB\n", worst);
+    EXPECT_GT(worst, 18.0);
+}
+
+TEST_F(Samples, WhatIsNoSoundIsSilence) {
+    auto const sound = voice(48000, 0.5, 5);
+    for (int kind = 0; kind < 7; ++kind) {  // those without a sound in them
+        if (kind == 4) continue;
+        auto silent = sound;
+        std::fill_n(silent.begin() + 4800, 480, 0.0F);
+        EXPECT_EQ(cleanAll(openNc(48000, 44100, 10, "c6.xs.f.ca03f4"),
+                           disturbed(sound, 4800, 480, kind, 1)),
+                  cleanAll(openNc(48000, 44100, 10, "c6.xs.f.ca03f4"), silent))
+            << kind;
+    }
 }
 
 TEST_F(Samples, HostileSoundLeavesFiniteValues) {
