@@ -1,13 +1,22 @@
 """Scores of one processed recording. Samples are floats, -1..1, mono; levels in dB."""
 from __future__ import annotations
 
+import sys
+from pathlib import Path
+
 import numpy as np
 from scipy.signal import correlate, resample_poly
+
+sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "training"))
+
+from morva_training.scoring import best_f1, roc_auc  # noqa: E402, F401
 
 PESQ_RATE = 16000
 
 
-def aligned(reference: np.ndarray, result: np.ndarray, rate: int, longest: float = 0.15) -> tuple[np.ndarray, np.ndarray]:
+def aligned(
+    reference: np.ndarray, result: np.ndarray, rate: int, longest: float = 0.15
+) -> tuple[np.ndarray, np.ndarray]:
     """Both signals with the result's delay taken out (whole samples, at most `longest` seconds)."""
     count = min(len(reference), len(result))
     reference, result = reference[:count], result[:count]
@@ -77,20 +86,3 @@ def pause_attenuation(speech: np.ndarray, noisy: np.ndarray, result: np.ndarray,
     if quiet.sum() < 0.3 * rate or level_db(noisy[:count][quiet]) < -75:
         return float("nan")
     return level_db(noisy[:count][quiet]) - max(level_db(result[:count][quiet]), -100.0)
-
-
-def roc_auc(scores: np.ndarray, labels: np.ndarray) -> float:
-    """Area under the receiver operating curve; ties count half."""
-    positive, negative = scores[labels], scores[~labels]
-    order = np.sort(negative)
-    below = np.searchsorted(order, positive, "left") + np.searchsorted(order, positive, "right")
-    return float(below.mean() / (2 * len(negative)))
-
-
-def best_f1(scores: np.ndarray, labels: np.ndarray) -> tuple[float, float]:
-    """The best F1 over all thresholds and the threshold that gives it."""
-    order = np.argsort(-scores)
-    hits = np.cumsum(labels[order])
-    f1 = 2 * hits / (np.arange(1, len(scores) + 1) + labels.sum())
-    best = int(np.argmax(f1))
-    return float(f1[best]), float(scores[order][best])

@@ -19,7 +19,7 @@ SPEECH_CREDITS = """
 ### Authors, speech
 
 - LibriSpeech (CC BY 4.0): V. Panayotov, G. Chen, D. Povey, S. Khudanpur; read by LibriVox volunteers.
-- VCTK corpus (CC BY 4.0): C. Veaux, J. Yamagishi, K. MacDonald, University of Edinburgh; without speakers p232 and p257.
+- VCTK corpus (CC BY 4.0): C. Veaux, J. Yamagishi, K. MacDonald, University of Edinburgh; without p232 and p257.
 - speechocean762: J. Zhang and others, SpeechOcean and Xiaomi.
 - GCompris voices (CC BY-SA): the GCompris project and its speakers.
 - Kathleen, Kerstin, Nathalie, OHF voice samples, EmoDB (CC0), LJSpeech (K. Ito, public domain) and the modified rhyme

@@ -18,25 +18,10 @@ from .convert import plain_network, plain_values, timestamp
 from .loop import Run, Schedule
 from .mvw import Weight
 from .networks import PlainGatedNetwork
+from .scoring import best_f1, roc_auc
 from .voice import CONTEXT, FEATURES, FRAME, RATE, VoiceBatches, network_input
 
 SKIPPED_FRAMES = 5
-
-
-def area_under_curve(scores: np.ndarray, labels: np.ndarray) -> float:
-    order = np.sort(scores[~labels])
-    hits = scores[labels]
-    below = np.searchsorted(order, hits, "left") + np.searchsorted(order, hits, "right")
-    return float(below.mean() / (2 * max(1, len(order))))
-
-
-def best_threshold(scores: np.ndarray, labels: np.ndarray) -> tuple[float, float]:
-    """Threshold with the best F1, and that F1."""
-    order = np.argsort(-scores)
-    hits = np.cumsum(labels[order])
-    f1 = 2 * hits / (np.arange(1, len(scores) + 1) + labels.sum())
-    best = int(np.argmax(f1))
-    return float(scores[order][best]), float(f1[best])
 
 
 def voice_weight(network: PlainGatedNetwork, mean: np.ndarray, variance: np.ndarray, points: list[float]) -> Weight:
@@ -114,13 +99,14 @@ def main() -> None:
 
     def validate(model: nn.Module) -> dict[str, float]:
         scores, voice = dev_scores(model)
-        return {"auc": area_under_curve(scores, voice), "f1": best_threshold(scores, voice)[1]}
+        return {"auc": roc_auc(scores, voice), "f1": best_f1(scores, voice)[0]}
 
     run.train(loader, loss_of, validate)
     scores, voice = dev_scores(run.averaged)
     low, high = np.percentile(scores, [1, 99])
-    points = [float(low), best_threshold(scores, voice)[0], float(high)]
-    mvw.write(args.out, voice_weight(run.averaged.cpu(), np.array(run.extra["mean"]), np.array(run.extra["variance"]), points))
+    points = [float(low), best_f1(scores, voice)[1], float(high)]
+    mean, variance = np.array(run.extra["mean"]), np.array(run.extra["variance"])
+    mvw.write(args.out, voice_weight(run.averaged, mean, variance, points))
     print("calibration", points, validate(run.averaged))
 
 

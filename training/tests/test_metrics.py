@@ -46,6 +46,14 @@ def test_area_under_the_curve_with_ties() -> None:
     assert metrics.best_f1(np.array([0.9, 0.8, 0.4, 0.1]), labels) == (1.0, 0.8)
 
 
+def test_separable_labels() -> None:
+    labels = np.array([False] * 50 + [True] * 50)
+    assert metrics.roc_auc(np.arange(100.0), labels) == 1.0
+    assert metrics.roc_auc(-np.arange(100.0), labels) == 0.0
+    assert metrics.roc_auc(np.zeros(100), labels) == 0.5
+    assert metrics.best_f1(np.arange(100.0), labels) == (1.0, 50.0)
+
+
 def test_identical_speech_is_perfect() -> None:
     stoi = pytest.importorskip("pystoi")
     assert stoi

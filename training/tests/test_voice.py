@@ -10,7 +10,7 @@ import torch
 from morva_training.convert import plain_values
 from morva_training.engine import VoiceModel, calibrated
 from morva_training.networks import PlainGatedNetwork
-from morva_training.train_voice import area_under_curve, best_threshold, voice_weight
+from morva_training.train_voice import voice_weight
 from morva_training.voice import (
     VOICE_RECIPE,
     VoiceBatches,
@@ -80,15 +80,6 @@ def test_calibration_points() -> None:
     assert calibrated(3.0, points) == pytest.approx(0.99999)
     assert calibrated(-5.0, points) == pytest.approx(1e-5)
     assert calibrated(-0.75, points) == pytest.approx(0.25)
-
-
-def test_area_and_threshold() -> None:
-    labels = np.array([False] * 50 + [True] * 50)
-    assert area_under_curve(np.arange(100.0), labels) == 1.0
-    assert area_under_curve(-np.arange(100.0), labels) == 0.0
-    assert area_under_curve(np.zeros(100), labels) == 0.5
-    threshold, f1 = best_threshold(np.arange(100.0), labels)
-    assert threshold == 50 and f1 == 1.0
 
 
 def test_batches(store: Path) -> None:
