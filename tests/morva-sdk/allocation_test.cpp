@@ -162,6 +162,24 @@ TEST(FrameMemory, FramesTakeNoneAfterWarmUp) {
     EXPECT_EQ(observe([&] { return allocationsOfAllSessions<short>(models, count); }).result, 0U);
 }
 
+// What a session holds beside the weights and tables that it shares with the first one.
+TEST(SessionMemory, IsSmallBesideTheModel) {
+    Engine engine;
+    ASSERT_EQ(Engine::addShipped(MORVA_TEST_MODELS "c6.xs.f.ca03f4.mvw", "c6"), 0);
+    std::vector<void*> sessions = {openNc(48000, 48000, 10, "c6")};
+    std::size_t const before = test_support::heldBytes;
+    sessions.push_back(openNc(48000, 48000, 10, "c6"));
+    std::size_t const held = test_support::heldBytes - before;
+    std::printf("[   memory ] one session of the full model at 48 kHz: %zu bytes\n", held);
+    EXPECT_LE(held, std::size_t{256} << 10);
+    EXPECT_GT(held, std::size_t{16} << 10);
+    for (int i = 0; i < 1000; ++i) sessions.push_back(openNc(48000, 48000, 10, "c6"));
+    auto const sound = voice(48000, 0.05, 1);
+    auto const wanted = cleanAll(sessions.front(), sound);
+    EXPECT_EQ(cleanAll(sessions.back(), sound), wanted);
+    for (void* session : sessions) EXPECT_EQ(Morva_NC_CloseSession(session), 0);
+}
+
 namespace {
 
 using test_support::failingAllocation;

@@ -2,6 +2,8 @@
 // exactly one source file of a test program: it replaces the operators of the whole program.
 #pragma once
 
+#include <malloc.h>
+
 #include <cstddef>
 #include <cstdlib>
 #include <new>
@@ -12,6 +14,7 @@ inline thread_local std::size_t allocations = 0;
 inline thread_local std::size_t allocatedBytes = 0;     // released ones included
 inline thread_local std::size_t largestAllocation = 0;  // bytes
 inline thread_local std::size_t releases = 0;           // calls of the global operator delete
+inline thread_local std::size_t heldBytes = 0;  // allocated and not released, as malloc rounds
 inline thread_local std::size_t failingAllocation = 0;  // which one from now on throws; 0: none
 
 // The number of allocations that `work` makes.
@@ -49,11 +52,15 @@ inline void* allocate(std::size_t size, std::size_t alignment) {
     void* const memory =
         alignment == 1 ? std::malloc(size == 0 ? 1 : size) : std::aligned_alloc(alignment, rounded);
     if (memory == nullptr) throw std::bad_alloc();
+    heldBytes += malloc_usable_size(memory);
     return memory;
 }
 
 inline void release(void* memory) noexcept {
-    if (memory != nullptr) ++releases;
+    if (memory != nullptr) {
+        ++releases;
+        heldBytes -= malloc_usable_size(memory);
+    }
     std::free(memory);
 }
 
