@@ -60,4 +60,5 @@ def parse(text: str) -> tuple[str, Process]:
     name, _, rest = text.partition("=")
     if not rest:
         raise SystemExit(f"{text!r} is neither none nor NAME=model.mvw nor NAME=command")
-    return name, from_weight(Path(rest)) if rest.endswith(".mvw") else from_command(rest)
+    is_weight = rest.endswith(".mvw") and Path(rest).is_file()  # a command may end in a weight file, too
+    return name, from_weight(Path(rest)) if is_weight else from_command(rest)
