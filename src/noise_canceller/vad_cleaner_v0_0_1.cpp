@@ -26,8 +26,18 @@ VadCleaner_v0_0_1::VadCleaner_v0_0_1(ModelEnvironment model, std::size_t frameMs
     if (std::ranges::find(kFrameDurationsMs, frameMs) == std::end(kFrameDurationsMs)) {
         std::cout << "ERROR FRAMEDURATIONS\n" << std::flush;
     }
-    fillContext();
+    resetSession();
+}
+
+bool VadCleaner_v0_0_1::resetSession() {
+    level_ = LevelTracker();
+    watchdog_ = StateWatchdog();
+    std::ranges::fill(state_, 0.0f);
+    samples_.start = samples_.end = 0;
     samples_.push_backNULL(params_.frameLength);
+    features_.start = features_.end = 0;
+    fillContext();
+    return true;
 }
 
 // The first frame already sees a full context, of silence.

@@ -24,6 +24,9 @@ public:
     // Replaces the frame by its score.
     bool cleanNoise(std::vector<float>& frame) override;
 
+    // Restores the start state; always true.
+    bool resetSession() override;
+
     // Features and network for one analysis window of `n` = FrameLength samples; the raw output.
     float probabilityCalc(float const* window, std::size_t n);
 

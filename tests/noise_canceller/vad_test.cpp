@@ -358,6 +358,24 @@ TEST(VoiceActivity, WatchdogClearsTheState) {
     EXPECT_TRUE(cleared);
 }
 
+TEST(VoiceActivity, ResetGivesTheFirstScoresAgain) {
+    VadCleaner_v0_0_1 cleaner(modelFrom(randomVadWeight({})), 20);
+    auto const scores = [&] {
+        Random random(5);
+        Values values;
+        for (int i = 0; i < 30; ++i) {
+            Values frame;
+            for (float const v : random.normal(160, 3000.0F)) frame.push_back(v);
+            values.push_back(scoreOf(cleaner, frame));
+        }
+        return values;
+    };
+    auto const first = scores();
+    EXPECT_NE(scores(), first);
+    EXPECT_TRUE(cleaner.resetSession());
+    EXPECT_EQ(scores(), first);
+}
+
 TEST(VoiceActivity, SaysSoWhenTheFrameLengthIsUnknown) {
     for (std::size_t ms : {10U, 15U, 20U, 30U, 32U, 40U, 25U, 0U}) {
         test_support::CapturedOutput out(1);
