@@ -98,7 +98,8 @@ BENCHMARK(transformPair);
 void analysis(benchmark::State& state) {
     Full full;
     NOISE_CANCELLER::SpectralCleaner cleaner(*full.params, full.environment->second,
-                                             NOISE_CANCELLER::generation(6));
+                                             NOISE_CANCELLER::generation(6),
+                                             NOISE_CANCELLER::Synthesis::FromKept);
     std::vector<float> x;
     for (auto _ : state) cleaner.analyse(full.sound.data(), x);
 }
@@ -107,7 +108,8 @@ BENCHMARK(analysis);
 void synthesis(benchmark::State& state) {
     Full full;
     NOISE_CANCELLER::SpectralCleaner cleaner(*full.params, full.environment->second,
-                                             NOISE_CANCELLER::generation(6));
+                                             NOISE_CANCELLER::generation(6),
+                                             NOISE_CANCELLER::Synthesis::FromKept);
     std::vector<float> x;
     std::vector<float> out;
     cleaner.analyse(full.sound.data(), x);
