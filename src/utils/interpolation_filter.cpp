@@ -70,8 +70,8 @@ std::shared_ptr<InterpolationFilter const> InterpolationFilter::forRates(std::ui
     std::uint64_t const divisor = std::gcd(inRate, outRate);
     std::pair const steps(inRate / divisor, outRate / divisor);
     std::lock_guard const guard(lock);
-    if (auto const shared = known[steps].lock()) return shared;
-    auto const made = std::make_shared<InterpolationFilter const>(steps.first, steps.second);
+    if (auto shared = known[steps].lock()) return shared;
+    auto made = std::make_shared<InterpolationFilter const>(steps.first, steps.second);
     known[steps] = made;
     return made;
 }

@@ -8,7 +8,8 @@ namespace MORVA::UTILS {
 namespace {
 
 constexpr double largestRatio = 256.0;
-constexpr int usualBlock = 3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
+constexpr std::size_t usualBlock =
+    3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
 
 }  // namespace
 
@@ -22,7 +23,7 @@ Resampler::Resampler(unsigned long inRate, unsigned long outRate)
               "Resampler");
     }
     converter_ = makeStreamConverter(inRate, outRate);
-    if (factor_ != 1.0) buffer_.reserve(static_cast<std::size_t>(extraRoom_ + usualBlock));
+    if (factor_ != 1.0) buffer_.reserve(static_cast<std::size_t>(extraRoom_) + usualBlock);
 }
 
 unsigned Resampler::resample(std::vector<float> const& in, std::vector<float>& out) {
@@ -31,7 +32,7 @@ unsigned Resampler::resample(std::vector<float> const& in, std::vector<float>& o
         return static_cast<unsigned>(in.size());
     }
     int const expected = static_cast<int>(factor_ * static_cast<double>(in.size()));
-    buffer_.resize(static_cast<std::size_t>(extraRoom_ + expected));
+    buffer_.resize(static_cast<std::size_t>(extraRoom_) + static_cast<std::size_t>(expected));
     int const room = extraRoom_ + expected - heldOver_;
     int const produced =
         convert(in.data(), static_cast<int>(in.size()), buffer_.data() + heldOver_, room);
