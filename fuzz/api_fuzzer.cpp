@@ -83,6 +83,9 @@ public:
             case 9:
                 sizes();
                 break;
+            case 10:
+                adjust();
+                break;
             default:
                 frame();
                 break;
@@ -183,7 +186,35 @@ private:
         unsigned out = 0;
         answer(MorvaExt_SessionFrameSizes(handle(), &in, &out), {0, 2, -3});
         auto const latency = MorvaExt_SessionLatencySamples(handle());
-        fuzz::require(latency >= 0 || latency == -3, "a latency is not negative");
+        fuzz::require(latency >= -3, "a latency is a count or a code");
+    }
+    // What can be changed while a noise-cancellation session runs.
+    void adjust() {
+        auto* const session = handle();
+        int const on = choices_.ConsumeIntegralInRange(0, 2);
+        switch (choices_.ConsumeIntegralInRange(0, 4)) {
+            case 0: {
+                auto const limit = choices_.ConsumeFloatingPoint<float>();
+                answer(MorvaExt_NC_SetAttenuationLimit(session, limit), {0, 1, 2, -3});
+                break;
+            }
+            case 1:
+                answer(MorvaExt_NC_SetBypass(session, on), {0, 2, -3});
+                break;
+            case 2:
+                answer(MorvaExt_NC_SetBackgroundSpeaker(session, on), {0, 1, 2, -3});
+                break;
+            case 3:
+                answer(MorvaExt_NC_EnableVoice(session, rate(), duration(), pick(names)),
+                       {0, 1, 2, -3});
+                break;
+            default: {
+                float voice = 0.0F;
+                float level = 0.0F;
+                answer(MorvaExt_NC_FrameMeters(session, &voice, &level), {0, 1, 2, -3});
+                fuzz::require(std::isfinite(level), "the removed level is finite");
+            }
+        }
     }
 
     // The session's own sizes most of the time, else any; buffers are exactly as long as they are
