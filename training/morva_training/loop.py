@@ -18,11 +18,14 @@ import torch
 from torch import Tensor, nn
 from tqdm import tqdm
 
+from .optimisers import make_optimiser
+
 
 @dataclass
 class Schedule:
     steps: int
     peak: float = 1e-3
+    orthogonal: bool = False  # Muon for the hidden matrices
     warm_up: int = 50
     decay_share: float = 0.35
     average: float = 0.99  # of the moving average of the weights
@@ -47,7 +50,7 @@ class Run:
         self.step = 0
         self.seconds = 0.0
         folder.mkdir(parents=True, exist_ok=True)
-        self.optimiser = torch.optim.AdamW(network.parameters(), lr=schedule.peak, betas=(0.9, 0.98), weight_decay=1e-3)
+        self.optimiser = make_optimiser(network, schedule)
         self.averaged = copy.deepcopy(network)
         if self.checkpoint.exists():
             self._resume()

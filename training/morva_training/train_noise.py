@@ -21,6 +21,7 @@ from .loop import Run, Schedule
 from .losses import LevelLoss, LossWeights, MaskLoss
 from .mixing import Recipe
 from .networks import LayerNormGatedNetwork, PlainGatedNetwork
+from .reshape import widened
 from .spectra import FULL_32K, SMALL_16K, SMALL_8K, Layout
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
@@ -53,7 +54,7 @@ def start(args: argparse.Namespace, layout: Layout, batches) -> tuple[nn.Module,
     if args.start:
         weight = mvw.read(args.start)
         network = plain_network(weight) if args.plain else gated_network(weight)
-        return network, weight["MU"], weight["SD"]
+        return widened(network, args.hidden or network.hidden), weight["MU"], weight["SD"]
     mean, deviation = feature_statistics(batches, 3)
     kind = PlainGatedNetwork if args.plain else LayerNormGatedNetwork
     hidden = args.hidden or HIDDEN[args.model]
@@ -70,12 +71,13 @@ def parse() -> argparse.Namespace:
     parser.add_argument("--start", type=Path, help="weight file to start from")
     parser.add_argument("--plain", action="store_true", help="version 0.0.5 network")
     parser.add_argument("--level", action="store_true", help="train for the level of the removed noise")
-    parser.add_argument("--hidden", type=int)
+    parser.add_argument("--hidden", type=int, help="units per layer; more than in --start doubles some")
     parser.add_argument("--steps", type=int, default=2000)
     parser.add_argument("--batch", type=int, default=48)
     parser.add_argument("--seconds", type=float, default=Recipe.seconds, help="length of a piece")
     parser.add_argument("--reuse", type=int, default=2, help="mixtures made of one draw of speech and noise")
     parser.add_argument("--rate", type=float, default=1e-3)
+    parser.add_argument("--orthogonal", action="store_true", help="Muon for the matrices")
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--ratio", type=float, default=LossWeights.ratio)
     parser.add_argument("--loudness", type=float, default=LossWeights.loudness)
@@ -98,7 +100,7 @@ def main() -> None:
     source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done, args.reuse)
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     network, mean, deviation = start(args, layout, loader)
-    schedule = Schedule(args.steps, args.rate)
+    schedule = Schedule(args.steps, args.rate, orthogonal=args.orthogonal)
     run = Run(network.to(device), args.run, schedule, {"mean": mean.tolist(), "deviation": deviation.tolist()})
     mean_, deviation_ = (torch.tensor(run.extra[k], device=device) for k in ("mean", "deviation"))
     weights = LossWeights(ratio=args.ratio, loudness=args.loudness, pause=args.pause, lost_speech=args.lost_speech)

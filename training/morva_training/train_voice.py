@@ -2,6 +2,9 @@
 
 The calibration uses the validation share of the training speakers: the middle is the logit with
 the best F1, low and high are the 1st and 99th percentile.
+
+While it learns, the network also says what the clean speech's features would be: who knows the
+speech under the noise knows where it is. The weight file keeps the voice's column only.
 """
 from __future__ import annotations
 
@@ -18,10 +21,12 @@ from .convert import plain_network, plain_values, timestamp
 from .loop import Run, Schedule
 from .mvw import Weight
 from .networks import PlainGatedNetwork
+from .reshape import with_outputs
 from .scoring import best_f1, roc_auc
 from .voice import CONTEXT, FEATURES, FRAME, RATE, VoiceBatches, network_input
 
 SKIPPED_FRAMES = 5
+CLEAN_SHARE = 0.1  # of the loss, per squared standard deviation
 
 
 def voice_weight(network: PlainGatedNetwork, mean: np.ndarray, variance: np.ndarray, points: list[float]) -> Weight:
@@ -49,6 +54,8 @@ def parse() -> argparse.Namespace:
     parser.add_argument("--out", type=Path, required=True)
     parser.add_argument("--start", type=Path, help="weight file to start from")
     parser.add_argument("--hidden", type=int, default=96)
+    parser.add_argument("--layers", type=int, default=3, help="matrices, the output's included")
+    parser.add_argument("--orthogonal", action="store_true", help="Muon for the matrices")
     parser.add_argument("--steps", type=int, default=1500)
     parser.add_argument("--batch", type=int, default=48)
     parser.add_argument("--rate", type=float, default=2e-3)
@@ -72,27 +79,29 @@ def main() -> None:
     else:
         some = torch.cat([next(loader)["features"].flatten(0, 1) for _ in range(4)])
         mean, variance = some.mean(0).numpy(), some.var(0).clamp_min(1e-2).numpy()
-        network = PlainGatedNetwork(CONTEXT * FEATURES, args.hidden, 1, linear_output=True)
-    schedule = Schedule(args.steps, args.rate)
+        network = PlainGatedNetwork(CONTEXT * FEATURES, args.hidden, 1, args.layers, linear_output=True)
+    network = with_outputs(network, 1 + FEATURES)
+    schedule = Schedule(args.steps, args.rate, orthogonal=args.orthogonal)
     run = Run(network.to(device), args.run, schedule, {"mean": mean.tolist(), "variance": variance.tolist()})
     mean_, variance_ = (torch.tensor(run.extra[k], device=device) for k in ("mean", "variance"))
 
-    def logits_of(model: nn.Module, features: Tensor) -> Tensor:
+    def outputs_of(model: nn.Module, features: Tensor) -> Tensor:
         x = network_input(features.to(device), mean_, variance_)
-        return model(x, model.initial_state(len(x)))[0][..., 0]
+        return model(x, model.initial_state(len(x)))[0][:, SKIPPED_FRAMES:]
 
     def loss_of(model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
-        y = logits_of(model, batch["features"])[:, SKIPPED_FRAMES:]
-        voice, weight = (batch[k].to(device)[:, SKIPPED_FRAMES:] for k in ("voice", "weight"))
-        loss = nn.functional.binary_cross_entropy_with_logits(y, voice, weight)
-        return loss, {"loss": loss.item()}
+        y = outputs_of(model, batch["features"])
+        voice, weight, clean = (batch[k].to(device)[:, SKIPPED_FRAMES:] for k in ("voice", "weight", "clean"))
+        loss = nn.functional.binary_cross_entropy_with_logits(y[..., 0], voice, weight)
+        error = (y[..., 1:] - (clean - mean_) * torch.rsqrt(variance_ + 1e-7)).square().mean()
+        return loss + CLEAN_SHARE * error, {"loss": loss.item(), "clean": error.item()}
 
     held = iter(VoiceBatches(args.store, 48, 5, split="dev", blocks=1))
     dev = [next(held) for _ in range(3)]
 
     def dev_scores(model: nn.Module) -> tuple[np.ndarray, np.ndarray]:
         with torch.no_grad():
-            scores = torch.cat([logits_of(model, b["features"])[:, SKIPPED_FRAMES:].flatten().cpu() for b in dev])
+            scores = torch.cat([outputs_of(model, b["features"])[..., 0].flatten().cpu() for b in dev])
         sure = torch.cat([b["weight"][:, SKIPPED_FRAMES:].flatten() for b in dev]) >= 1.0
         voice = torch.cat([b["voice"][:, SKIPPED_FRAMES:].flatten() for b in dev]) > 0.5
         return scores[sure].numpy(), voice[sure].numpy()
@@ -106,7 +115,7 @@ def main() -> None:
     low, high = np.percentile(scores, [1, 99])
     points = [float(low), best_f1(scores, voice)[1], float(high)]
     mean, variance = np.array(run.extra["mean"]), np.array(run.extra["variance"])
-    mvw.write(args.out, voice_weight(run.averaged, mean, variance, points))
+    mvw.write(args.out, voice_weight(with_outputs(run.averaged, 1), mean, variance, points))
     print("calibration", points, validate(run.averaged))
 
 

@@ -80,11 +80,15 @@ def tracked_gains(frames: np.ndarray) -> np.ndarray:
     return gains.astype(np.float32)
 
 
-def stream_features(samples: np.ndarray, frame: int) -> np.ndarray:
-    """Features [B, T, 61], not standardised, of streams [B, n] fed in frames of `frame` samples."""
+def stream_features(samples: np.ndarray, frame: int, heard: np.ndarray | None = None) -> np.ndarray:
+    """Features [B, T, 61], not standardised, of streams [B, n] fed in frames of `frame` samples.
+
+    The level tracker follows `heard` where it is given, for the features of one part of a mixture.
+    """
     count = samples.shape[1] // frame
     frames = samples[:, : count * frame].reshape(len(samples), count, frame)
-    levelled = (frames * tracked_gains(frames)[:, :, None]).reshape(len(samples), -1)
+    tracked = frames if heard is None else heard[:, : count * frame].reshape(frames.shape)
+    levelled = (frames * tracked_gains(tracked)[:, :, None]).reshape(len(samples), -1)
     padded = np.pad(levelled, [(0, 0), (FRAME, 0)])
     view = np.lib.stride_tricks.sliding_window_view(padded, FRAME, axis=1)[:, frame::frame]
     spectra = sfft.rfft((view[:, :count] * hamming_window(FRAME)).astype(np.float32), axis=-1)
@@ -110,16 +114,16 @@ class VoiceBatches(IterableDataset):
         self.store, self.size, self.seed, self.split = store, size, seed, split
         self.recipe, self.blocks = recipe, blocks
 
-    def piece(self, maker: MixtureMaker) -> tuple[np.ndarray, np.ndarray, np.ndarray]:
-        """Noisy samples, voice per block, weight per block."""
+    def piece(self, maker: MixtureMaker) -> tuple[np.ndarray, np.ndarray, np.ndarray, np.ndarray]:
+        """Noisy samples, clean samples, voice per block, weight per block."""
         waves = maker.draw_waves()
         count = len(waves.speech)
         speech_gain, noise_gain = maker.equalisers(count // 2 + 1)
         both = sfft.rfft(np.stack([waves.speech, waves.noise]).astype(np.float32), axis=-1)
         both *= np.stack([speech_gain, noise_gain])
         speech, noise = sfft.irfft(both, n=count, axis=-1)
-        voice, weight = block_labels(speech) if waves.has_speech else block_labels(np.zeros_like(speech))
-        return np.clip(speech + noise, -32768, 32767), voice, weight
+        speech = speech if waves.has_speech else np.zeros_like(speech)
+        return np.clip(speech + noise, -32768, 32767), speech, *block_labels(speech)
 
     def __iter__(self) -> Iterator[dict[str, Tensor]]:
         worker = torch.utils.data.get_worker_info()
@@ -129,11 +133,11 @@ class VoiceBatches(IterableDataset):
         while True:
             blocks = self.blocks or int(maker.rng.choice(self.FRAME_BLOCKS))
             pieces = [self.piece(maker) for _ in range(self.size)]
-            features = stream_features(np.stack([p[0] for p in pieces]), blocks * BLOCK)
-            voice = np.stack([frame_labels(p[1], blocks) for p in pieces])
-            weight = np.stack([frame_labels(p[2], blocks) for p in pieces])
+            noisy, clean = (np.stack([p[i] for p in pieces]) for i in (0, 1))
+            voice, weight = (np.stack([frame_labels(p[i], blocks) for p in pieces]) for i in (2, 3))
             yield {
-                "features": torch.from_numpy(features),
+                "features": torch.from_numpy(stream_features(noisy, blocks * BLOCK)),
+                "clean": torch.from_numpy(stream_features(clean, blocks * BLOCK, heard=noisy)),
                 "voice": torch.from_numpy((voice > 0.5).astype(np.float32)),
                 "weight": torch.from_numpy(weight),
             }

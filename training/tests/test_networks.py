@@ -15,6 +15,7 @@ from morva_training.convert import (
 )
 from morva_training.engine import GatedStep, PlainStep, sigmoid
 from morva_training.networks import LayerNormGatedNetwork, PlainGatedNetwork
+from morva_training.reshape import widened, with_outputs
 from morva_training.spectra import SMALL_8K
 
 
@@ -89,6 +90,34 @@ def test_voice_weight_round_trip() -> None:
     assert restored.linear_output
     for name, value in network.state_dict().items():
         assert torch.equal(restored.state_dict()[name], value), name
+
+
+@pytest.mark.parametrize("kind", [LayerNormGatedNetwork, PlainGatedNetwork])
+def test_a_widened_network_says_about_the_same(kind: type) -> None:
+    torch.manual_seed(5)
+    narrow = kind(20, 32, 6)
+    wide = widened(narrow, 80)
+    x = torch.randn(4, 40, 20)
+    with torch.no_grad():
+        before, _ = narrow(x, narrow.initial_state(4))
+        after, _ = wide(x, wide.initial_state(4))
+    assert wide.hidden == 80
+    assert (after - before).std() < 0.15 * before.std()
+    with pytest.raises(ValueError, match="cannot make"):
+        widened(wide, 32)
+
+
+@pytest.mark.parametrize("outputs", [1, 5])
+def test_outputs_can_be_added_and_taken_away(outputs: int) -> None:
+    network = shaken(PlainGatedNetwork(20, 12, 3, linear_output=True), 6)
+    changed = with_outputs(network, outputs)
+    x = torch.randn(2, 10, 20)
+    with torch.no_grad():
+        before, _ = network(x, network.initial_state(2))
+        after, _ = changed(x, changed.initial_state(2))
+    kept = min(outputs, 3)
+    assert torch.allclose(before[..., :kept], after[..., :kept], atol=1e-6)
+    assert (after[..., kept:] == 0).all()
 
 
 def test_cost_counts_every_product() -> None:

@@ -12,6 +12,7 @@ import torch
 from morva_training import mvw, snapshot, train_noise, train_voice
 from morva_training.engine import NoiseLevelModel, NoiseModel, VoiceModel
 from morva_training.loop import Run, Schedule
+from morva_training.optimisers import orthogonalised
 
 
 def run_main(module, monkeypatch: pytest.MonkeyPatch, *arguments: object) -> None:
@@ -39,8 +40,12 @@ def test_noise_model_learns_and_resumes(store: Path, tmp_path: Path, monkeypatch
     a, b = mvw.read(out), mvw.read(copy)
     assert all(np.array_equal(x, y) for x, y in zip(a["WeightLinear"], b["WeightLinear"]))
 
-    run_main(train_noise, monkeypatch, *common, "--run", tmp_path / "other", "--start", out, "--steps", 0)
-    assert entries(tmp_path / "other", "dev_ratio_db")[0] == pytest.approx(ratios[-1], abs=0.2)
+    wider = ("--start", out, "--hidden", 24, "--orthogonal", "--run", tmp_path / "other")
+    run_main(train_noise, monkeypatch, *common, *wider, "--steps", 0)
+    assert entries(tmp_path / "other", "dev_ratio_db")[0] == pytest.approx(ratios[-1], abs=0.5)
+    run_main(train_noise, monkeypatch, *common, *wider, "--steps", 8, "--rate", 0.01)
+    assert entries(tmp_path / "other", "dev_ratio_db")[-1] > ratios[-1]
+    assert mvw.read(out)["WeightGRU"].shape[1] == 24
 
 
 def test_level_model(store: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
@@ -67,6 +72,12 @@ def test_voice_model(store: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatc
     low, high = weight["Test_MINMAX"]
     assert low < weight["Test_BestF1"][0] < high
     assert 0 < VoiceModel(weight).score(np.zeros(80, np.float32)) < 1
+
+
+def test_orthogonal_steps_are_even_in_all_directions() -> None:
+    matrix = torch.randn(40, 15, generator=torch.Generator().manual_seed(1)) * torch.logspace(-2, 0, 15)
+    values = torch.linalg.svdvals(orthogonalised(matrix))
+    assert values.min() > 0.3 and values.max() < 1.3
 
 
 def test_schedule() -> None:

@@ -1,0 +1,61 @@
+"""Networks of another shape that start with what a trained one has learned."""
+from __future__ import annotations
+
+import torch
+from torch import Tensor
+
+from .networks import LayerNormGatedNetwork, PlainGatedNetwork
+
+Network = LayerNormGatedNetwork | PlainGatedNetwork
+
+NOISE = 0.02  # of a matrix's standard deviation
+
+
+def _like(network: Network, hidden: int, outputs: int) -> Network:
+    arguments = {"linear_output": network.linear_output} if isinstance(network, PlainGatedNetwork) else {}
+    return type(network)(network.features, hidden, outputs, network.layers, **arguments)
+
+
+def widened(network: Network, hidden: int, seed: int = 1) -> Network:
+    """A network with more units per layer (Net2Net, Chen et al. 2016).
+
+    Units are doubled: the copy has the original's inputs, and what reads the original reads half of
+    each. The layer norms see about the same statistics, so the wider network begins close to the
+    narrower one; a little noise lets the copies part.
+    """
+    old = network.hidden
+    if hidden < old:
+        raise ValueError(f"cannot make {hidden} units of {old}")
+    if hidden == old:
+        return network
+    generator = torch.Generator().manual_seed(seed)
+    doubled = torch.randperm(old, generator=generator).repeat(-(-hidden // old))[: hidden - old]
+    units = torch.cat([torch.arange(old), doubled])
+    share = 1.0 / torch.bincount(units, minlength=old)[units].float()
+
+    def grown(name: str, value: Tensor) -> Tensor:
+        wide = value if name.startswith("output") else value[..., units]
+        if value.dim() == 1:
+            return wide
+        wide = torch.cat([wide[units] * share[:, None], wide[old:]])  # rows of units first, then of features
+        return wide + NOISE * wide.std() * torch.randn(wide.shape, generator=generator)
+
+    result = _like(network, hidden, network.outputs)
+    with torch.no_grad():
+        for (name, value), target in zip(network.named_parameters(), result.parameters()):
+            target.copy_(grown(name, value))
+    return result
+
+
+def with_outputs(network: Network, outputs: int) -> Network:
+    """A network with the first `outputs` outputs; new ones start at nothing."""
+    result = _like(network, network.hidden, outputs)
+    kept = min(outputs, network.outputs)
+    with torch.no_grad():
+        for (name, value), target in zip(network.named_parameters(), result.parameters()):
+            if name.startswith("output"):
+                target.zero_()
+                target[..., :kept] = value[..., :kept]
+            else:
+                target.copy_(value)
+    return result
