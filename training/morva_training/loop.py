@@ -20,6 +20,8 @@ from tqdm import tqdm
 
 from .optimisers import make_optimiser
 
+RUNAWAY = 3.0
+
 
 @dataclass
 class Schedule:
@@ -91,15 +93,25 @@ class Run:
             for slow, fast in zip(self.averaged.parameters(), self.network.parameters()):
                 slow.lerp_(fast, 1.0 - decay)
 
+    def _back_to_average(self) -> None:
+        self.network.load_state_dict(self.averaged.state_dict())
+        self.optimiser.state.clear()
+
     def train(
         self,
         batches: Iterator[dict[str, Tensor]],
         loss_of: Callable[[nn.Module, dict[str, Tensor]], tuple[Tensor, dict[str, float]]],
         validate: Callable[[nn.Module], dict[str, float]] | None = None,
     ) -> None:
-        """Runs until the schedule's last step. A loss that is not finite is skipped and counted."""
+        """Runs until the schedule's last step.
+
+        A loss that is not finite, or far above the usual, is counted and changes nothing, but that
+        the network goes back to its averaged weights: a gated layer without normalisation can run
+        away, and no step taken from there leads back.
+        """
         sums: dict[str, float] = {}
         counted = 0
+        usual: float | None = None
         started, before = time.monotonic(), self.seconds
         bar = tqdm(total=self.schedule.steps, initial=self.step, mininterval=10.0, desc=self.folder.name)
         while self.step < self.schedule.steps:
@@ -107,14 +119,17 @@ class Run:
                 group["lr"] = self.schedule.rate(self.step)
             loss, parts = loss_of(self.network, next(batches))
             self.optimiser.zero_grad(set_to_none=True)
-            if torch.isfinite(loss):
+            value = loss.item()
+            if math.isfinite(value) and (usual is None or value < usual + RUNAWAY * max(0.3, abs(usual))):
+                usual = value if usual is None else 0.9 * usual + 0.1 * value
                 loss.backward()
                 norm = nn.utils.clip_grad_norm_(self.network.parameters(), 1.0)
                 if torch.isfinite(norm):
                     self.optimiser.step()
                     self._update_average()
             else:
-                parts = {"not_finite": 1.0}
+                parts = {"ran_away": 1.0}
+                self._back_to_average()
             self.step += 1
             counted += 1
             self.seconds = before + time.monotonic() - started

@@ -41,6 +41,7 @@ class AdamWithMuon(torch.optim.AdamW):
     def _orthogonal_step(self, matrix: Tensor, rate: float, decay: float) -> None:
         state = self.state[matrix]
         if "momentum" not in state:
+            state["step"] = torch.zeros(())  # AdamW looks for it when a state is loaded
             state["momentum"] = torch.zeros_like(matrix)
         momentum = state["momentum"].mul_(self.MOMENTUM).add_(matrix.grad)
         direction = orthogonalised(matrix.grad + self.MOMENTUM * momentum)

@@ -8,7 +8,7 @@ import numpy as np
 import torch
 
 from . import mvw
-from .convert import noise_weight
+from .convert import half_precision, noise_weight
 from .networks import LayerNormGatedNetwork, PlainGatedNetwork
 from .train_noise import LAYOUTS
 
@@ -36,7 +36,7 @@ def main() -> None:
     network = network_of(state["network" if args.raw else "averaged"])
     extra = state["extra"]
     mean, deviation = np.array(extra["mean"]), np.array(extra["deviation"])
-    mvw.write(args.out, noise_weight(network, LAYOUTS[args.model], mean, deviation, args.name))
+    mvw.write(args.out, half_precision(noise_weight(network, LAYOUTS[args.model], mean, deviation, args.name)))
     print(f"step {state['step']} -> {args.out}")
 
 

@@ -16,7 +16,7 @@ from torch.utils.data import DataLoader
 
 from . import mvw
 from .batches import Batch, MixtureBatches
-from .convert import gated_network, noise_weight, plain_network
+from .convert import gated_network, half_precision, noise_weight, plain_network
 from .loop import Run, Schedule
 from .losses import LevelLoss, LossWeights, MaskLoss
 from .mixing import Recipe
@@ -125,7 +125,7 @@ def main() -> None:
         weight = noise_weight(
             run.averaged, layout, np.array(run.extra["mean"]), np.array(run.extra["deviation"]), args.name
         )
-        mvw.write(args.out, weight)
+        mvw.write(args.out, half_precision(weight))
 
 
 if __name__ == "__main__":
