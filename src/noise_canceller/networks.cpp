@@ -110,6 +110,16 @@ void plainHiddenLayers(std::vector<float>& x, std::size_t hidden, FeedForwardWei
     }
 }
 
+// The same behind the update gate; the state follows the first layer's output.
+void gatedHiddenLayers(std::vector<float>& state, std::vector<float>& x, std::size_t hidden,
+                       GatedWeights const& weights, NetworkScratch& scratch) {
+    joinState(state, x, scratch);
+    updateGate(x, weights, scratch);
+    plainHiddenLayers(
+        x, hidden, weights, scratch,
+        [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
+}
+
 void maskLayer(std::vector<float>& x, FeedForwardWeights const& weights, NetworkScratch& scratch) {
     nonLinearLayer(x, weights, weights.weightNonLinear.size() - 1, scratch.joined);
     x.swap(scratch.joined);
@@ -162,11 +172,7 @@ void calcRMForwardProp_GRU_Layernorm(std::vector<float>& state, std::vector<floa
 
 void calcRMForwardProp_GRU_Modify(std::vector<float>& state, std::vector<float>& x,
                                   GatedWeights const& weights, NetworkScratch& scratch) {
-    joinState(state, x, scratch);
-    updateGate(x, weights, scratch);
-    plainHiddenLayers(
-        x, weights.weightNonLinear.size() - 1, weights, scratch,
-        [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
+    gatedHiddenLayers(state, x, weights.weightNonLinear.size() - 1, weights, scratch);
     maskLayer(x, weights, scratch);
 }
 
@@ -179,13 +185,9 @@ void calcRMForwardProp_FeedForward(std::vector<float>&, std::vector<float>& x,
 
 void calcRMForwardProp_GRU_VAD_Modify(std::vector<float>& state, std::vector<float>& x,
                                       GatedWeights const& weights, NetworkScratch& scratch) {
-    joinState(state, x, scratch);
-    updateGate(x, weights, scratch);
-    plainHiddenLayers(
-        x, weights.weightLinear.size() - 1, weights, scratch,
-        [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
     // By the number of matrices: a weight may hold more biases than it has layers.
     std::size_t const last = weights.weightLinear.size() - 1;
+    gatedHiddenLayers(state, x, last, weights, scratch);
     linearLayer(x, weights, last, scratch.joined);
     x.swap(scratch.joined);
 }
