@@ -6,16 +6,12 @@
 #include <array>
 #include <cstdio>
 
-#include "noise_canceller/noise_cleaner_generations.h"
-#include "noise_canceller/noise_cleaner_v0_0_6.h"
-#include "noise_canceller/noise_db_cleaner_v0_0_1.h"
+#include "models.h"
 #include "reference_cleaner.h"
-#include "support/captured_output.h"
 #include "support/error_bound.h"
 #include "support/random.h"
-#include "support/weight_writer.h"
 
-using namespace MORVA::NOISE_CANCELLER;
+using namespace cleaner_test;
 using reference::Tunables;
 using reference::Values;
 using test_support::ErrorBound;
@@ -30,31 +26,38 @@ double quarters(Random& random, std::size_t low, std::size_t high) {
     return static_cast<double>(random.between(4 * low, 4 * high)) / 4.0;
 }
 
+// Each with its default now and then; a parameter at its default is not written into the model.
 Tunables randomTunables(Random& random, int depth) {
     auto const on = [&] { return random.chance(0.4); };
+    auto const rarely = [&] { return random.chance(0.2); };
+    auto const whole = [&](std::size_t low, std::size_t high) {
+        return static_cast<int>(random.between(low, high));
+    };
     Tunables t;
-    if (on()) t.smootCoef = static_cast<double>(random.between(1, 64)) / 64.0;
+    if (on()) t.smootCoef = whole(1, 64) / 64.0;
     t.smootRmModify = on();
     t.highFreqSmoot = on();
     t.clipFix = on();
-    t.clipPoint = static_cast<int>(random.between(1000, 32768));
+    if (!rarely()) t.clipPoint = whole(1000, 32768);
     t.skipFrame = on();
     t.volumeUp = on();
-    t.volumePercent = quarters(random, 0, 200);
+    if (!rarely()) t.volumePercent = quarters(random, 0, 200);
     t.threshCut = on();
-    t.threshRef = static_cast<int>(random.between(1, 1000));
+    if (!rarely()) t.threshRef = whole(1, 1000);
     t.useRmThreshold = on();
-    t.rmThreshold = static_cast<double>(random.between(1, 64)) / 64.0;
+    if (!rarely()) t.rmThreshold = whole(1, 64) / 64.0;
     t.rescale = !on();
-    t.rescaleAmpl = quarters(random, 100, 10000);
-    t.rescaleEnergy = quarters(random, 0, 2000);
+    if (!rarely()) t.rescaleAmpl = quarters(random, 100, 10000);
+    if (!rarely()) t.rescaleEnergy = quarters(random, 0, 2000);
     t.compressRate = depth;
     t.speakerFix = on();
-    t.cutStart = quarters(random, 1, 12);
-    t.cutEnd = t.cutStart + quarters(random, 1, 9);
-    t.runFrames = quarters(random, 1, 50);
-    t.runMinimum = static_cast<int>(random.between(1, 10));
-    t.utterance = static_cast<double>(random.between(8, 160)) / 64.0;
+    if (!rarely()) {
+        t.cutStart = quarters(random, 1, 12);
+        t.cutEnd = t.cutStart + quarters(random, 1, 9);
+    }
+    if (!rarely()) t.runFrames = quarters(random, 1, 50);
+    if (!rarely()) t.runMinimum = whole(1, 10);
+    if (!rarely()) t.utterance = whole(8, 160) / 64.0;
     t.variableWindow = !on();
     return t;
 }
@@ -102,54 +105,31 @@ struct Setup {
 // Half of the parameters come from the environment, half from the weight.
 Setup makeModel(Random& random, NcShape const& shape, Tunables const& tunables) {
     auto const suffix = "_v0_0_" + std::to_string(shape.generation());
-    Setup setup{MORVA::CONTAINERS::makeModelEnvironment(), {}};
+    auto const defaults = Tunables().byName(shape.generation());
+    std::vector<std::pair<std::string, std::string>> texts;
     WeightWriter writer;
+    std::string parameters;
     for (auto const& [name, value] : tunables.byName(shape.generation())) {
+        if (value == defaults.at(name)) continue;
         auto const key = "MORVA_" + name + suffix;
+        bool const inWeight = random.chance(0.5);
         char text[40];
         if (auto const* flag = std::get_if<bool>(&value)) {
             std::snprintf(text, sizeof text, "%s", *flag ? "TRUE" : "FALSE");
+            if (inWeight) writer.add("CONTROL_" + key, *flag ? "t" : "f");
         } else if (auto const* whole = std::get_if<int>(&value)) {
             std::snprintf(text, sizeof text, "%d", *whole);
+            if (inWeight) writer.add("CONTROL_" + key, *whole);
         } else {
             std::snprintf(text, sizeof text, "%.9g", std::get<double>(value));
+            if (inWeight) writer.add("CONTROL_" + key, static_cast<float>(std::get<double>(value)));
         }
-        setup.parameters += name + "=" + text + " ";
-        if (random.chance(0.5)) {
-            setup.model->second.insert<std::string>(key, text, MORVA::CONTAINERS::InsertMode::keep);
-        } else if (auto const* flag = std::get_if<bool>(&value)) {
-            writer.add("CONTROL_" + key, *flag ? "t" : "f");
-        } else if (auto const* whole = std::get_if<int>(&value)) {
-            writer.add("CONTROL_" + key, *whole);
-        } else {
-            writer.add("CONTROL_" + key, static_cast<float>(std::get<double>(value)));
-        }
+        parameters += name + "=" + text + " ";
+        if (!inWeight) texts.emplace_back(key, text);
     }
-    auto const bytes = writer.bytes() + randomNcWeight(shape);
-    setup.model->first = std::make_shared<MORVA::WEIGHTS::Weight>();
-    setup.model->first->read(bytes.data(), bytes.size());
+    Setup setup{modelFrom(writer.bytes() + randomNcWeight(shape)), parameters};
+    for (auto const& [key, text] : texts) setText(setup.model, key, text.c_str());
     return setup;
-}
-
-std::unique_ptr<NoiseCleaner> build(int generation, ModelEnvironment const& model,
-                                    std::size_t frameMs) {
-    test_support::CapturedOutput const quiet(1);
-    switch (generation) {
-        case 0:
-            return std::make_unique<NoiseDBCleaner_v0_0_1>(model, frameMs);
-        case 1:
-            return std::make_unique<NoiseCleaner_v0_0_1>(model, frameMs);
-        case 2:
-            return std::make_unique<NoiseCleaner_v0_0_2>(model, frameMs);
-        case 3:
-            return std::make_unique<NoiseCleaner_v0_0_3>(model, frameMs);
-        case 4:
-            return std::make_unique<NoiseCleaner_v0_0_4>(model, frameMs);
-        case 5:
-            return std::make_unique<NoiseCleaner_v0_0_5>(model, frameMs);
-        default:
-            return std::make_unique<NoiseCleaner_v0_0_6>(model, frameMs);
-    }
 }
 
 class AgainstReference : public ::testing::TestWithParam<int> {
@@ -172,11 +152,13 @@ protected:
                      << " ms, bins " << shape.filtrBegin << ".." << shape.filtrEnd << ", P "
                      << shape.previewFrames << ", L " << shape.layers << ", H " << shape.hidden
                      << ", G " << shape.gates << ", " << setup.parameters);
-        auto const cleaner = build(level ? 0 : GetParam(), setup.model, frameMs);
+        auto const cleaner = makeCleaner(level ? 0 : GetParam(), setup.model, frameMs);
         reference::Cleaner wanted(reference::Model(*setup.model->first, tunables, GetParam()),
                                   modelMs, frameMs);
         std::size_t const size = rateHz * frameMs / 1000;
-        auto const sound = randomSound(random, size * (800 / frameMs), size);
+        // The energy gate remembers 4 s of active frames, the level reference 3 s.
+        bool const longEnough = seed % 8 == 0;
+        auto const sound = randomSound(random, size * ((longEnough ? 7000 : 600) / frameMs), size);
         for (std::size_t at = 0; at + size <= sound.size(); at += size) {
             Values const in(sound.begin() + static_cast<long>(at),
                             sound.begin() + static_cast<long>(at + size));
@@ -217,3 +199,53 @@ TEST_P(NoiseLevel, OfWhatIsRemoved) {
     }
 }
 INSTANTIATE_TEST_SUITE_P(Generation, NoiseLevel, ::testing::Values(5));
+
+// What is left of the level when nothing is removed, 90 dB below a full-scale input.
+TEST(NoiseLevelOfIdentity, IsBelowMinus50) {
+    ErrorBound bound("noise level of an identity mask over -60 dB", 10.0);
+    Random random(5);
+    for (int hz : {8000, 16000, 32000}) {
+        for (int modelMs : {20, 30, 32}) {
+            NcShape const shape{
+                .version = "0.0.5", .sampleRate = hz, .frameLength = hz * modelMs / 1000};
+            auto const cleaner =
+                makeCleaner(0, modelFrom(test_support::identityNcWeight(shape)), 10);
+            for (int n = 0; n < 60; ++n) {
+                // A tone, then full-scale noise, then a square.
+                auto frame = random.normal(static_cast<std::size_t>(hz) / 100);
+                for (std::size_t i = 0; i < frame.size(); ++i) {
+                    if (n < 20) frame[i] = std::sin(0.3F * static_cast<float>(i));
+                    if (n >= 40) frame[i] = std::copysign(1.0F, frame[i]);
+                    frame[i] = 32767.0F * std::clamp(frame[i], -1.0F, 1.0F);
+                }
+                ASSERT_TRUE(cleaner->cleanNoise(frame));
+                bound.add(frame.at(0), -60.0);
+            }
+        }
+    }
+}
+
+TEST(BackgroundSpeaker, CanBeSwitchedWhileItRuns) {
+    auto const model = modelFrom(test_support::identityNcWeight({}));
+    MORVA::NOISE_CANCELLER::NoiseCleaner_v0_0_6 cleaner(model, 10);
+    auto const plain = makeCleaner(6, model, 10);
+    Random random(4);
+    // The last of `count` frames, from the cleaner and from one that is never switched.
+    auto const last = [&](int count, float level) {
+        std::pair<std::vector<float>, std::vector<float>> out;
+        for (int i = 0; i < count; ++i) {
+            out.first = out.second = random.normal(160, level);
+            cleaner.cleanNoise(out.first);
+            plain->cleanNoise(out.second);
+        }
+        return out;
+    };
+    test_support::CapturedOutput const quiet(1);
+    EXPECT_TRUE(cleaner.background_speaker_fix_switch(true));
+    auto const [loud, wanted] = last(100, 6000.0F);
+    EXPECT_EQ(loud, wanted);
+    EXPECT_LT(std::abs(last(50, 60.0F).first.back()), 1e-3F);
+    EXPECT_TRUE(cleaner.background_speaker_fix_switch(false));
+    auto const [off, quietly] = last(50, 60.0F);
+    EXPECT_EQ(off, quietly);
+}

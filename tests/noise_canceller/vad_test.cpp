@@ -7,14 +7,14 @@
 #include <deque>
 #include <numbers>
 
+#include "models.h"
 #include "noise_canceller/vad_cleaner_v0_0_1.h"
 #include "reference_cleaner.h"
-#include "support/captured_output.h"
 #include "support/error_bound.h"
 #include "support/random.h"
-#include "support/weight_writer.h"
 
 using namespace MORVA::NOISE_CANCELLER;
+using cleaner_test::modelFrom;
 using MORVA::CONTAINERS::Matrix;
 using reference::affine;
 using reference::Values;
@@ -25,13 +25,6 @@ using test_support::VadShape;
 using test_support::WeightWriter;
 
 namespace {
-
-ModelEnvironment modelFrom(std::string const& bytes) {
-    auto const model = MORVA::CONTAINERS::makeModelEnvironment();
-    model->first = std::make_shared<MORVA::WEIGHTS::Weight>();
-    model->first->read(bytes.data(), bytes.size());
-    return model;
-}
 
 class ReferenceVad {
 public:
@@ -245,46 +238,6 @@ TEST(VoiceActivity, CalibrationIsPiecewiseLinearAndLimited) {
     }
 }
 
-TEST(VoiceActivity, LevelTracker) {
-    LevelTracker tracker;
-    auto const gainFor = [&](float amplitude) {
-        return tracker.gainFor(std::vector<float>(80, amplitude));
-    };
-    double level = 4000000.0;
-    auto const gain = [&] { return static_cast<float>(2000.0 / (std::sqrt(level) + 1e-7)); };
-    double const alpha = 0.954992586021436;
-    EXPECT_FLOAT_EQ(gainFor(0), gain());
-    EXPECT_FLOAT_EQ(gainFor(99.99F), gain());  // below the floor nothing moves
-    level = alpha * level + (1.0 - alpha) * 10000.0;
-    EXPECT_FLOAT_EQ(gainFor(100), gain());
-    level = alpha * level + (1.0 - alpha) * 2500.0 * 2500.0;  // less than twice as much
-    EXPECT_FLOAT_EQ(gainFor(2500), gain());
-    level = (1.0 - alpha) * level + alpha * 8000.0 * 8000.0;
-    EXPECT_FLOAT_EQ(gainFor(8000), gain());
-}
-
-TEST(VoiceActivity, PoolingKeepsAQuarterAndHalvesUpwards) {
-    for (auto const& [bins, wanted] : {std::pair<std::size_t, std::size_t>{121, 61},
-                                       {129, 65},
-                                       {41, 21},
-                                       {81, 41},
-                                       {257, 129},
-                                       {61, 38}}) {
-        EXPECT_EQ(pooledBandCount(bins), wanted);
-        std::vector<float> powers(bins, 3.0F);
-        poolBands(powers);
-        EXPECT_EQ(powers, std::vector<float>(wanted, 3.0F)) << bins;  // means, and no bin left out
-    }
-    std::vector<float> powers(121);
-    for (std::size_t i = 0; i < powers.size(); ++i) powers[i] = static_cast<float>(i);
-    poolBands(powers);
-    EXPECT_EQ(powers[30], 30.0F);
-    EXPECT_EQ(powers[31], 31.5F);
-    EXPECT_EQ(powers[45], 59.5F);
-    EXPECT_EQ(powers[46], 62.5F);
-    EXPECT_EQ(powers[60], 118.5F);
-}
-
 TEST(VoiceActivity, WatchdogCountsLowScores) {
     // `lowShare` of every 20 frames are low; returns the frames at which the state is cleared.
     auto const clearings = [](int lowOf20) {
@@ -324,12 +277,8 @@ TEST(VoiceActivity, WatchdogSwitch) {
         auto bytes = randomVadWeight({});
         if (row.stored != nullptr) bytes += WeightWriter().add(control, row.stored).bytes();
         auto const model = modelFrom(bytes);
-        auto const put = [&](std::string const& name, char const* text) {
-            if (text)
-                model->second.insert<std::string>(name, text, MORVA::CONTAINERS::InsertMode::keep);
-        };
-        put(key, row.first);
-        put(control, row.second);
+        if (row.first != nullptr) cleaner_test::setText(model, key, row.first);
+        if (row.second != nullptr) cleaner_test::setText(model, control, row.second);
         EXPECT_EQ(VadParams(*model).enableStateReset, row.on);
     }
 }
@@ -374,12 +323,4 @@ TEST(VoiceActivity, ResetGivesTheFirstScoresAgain) {
     EXPECT_NE(scores(), first);
     EXPECT_TRUE(cleaner.resetSession());
     EXPECT_EQ(scores(), first);
-}
-
-TEST(VoiceActivity, SaysSoWhenTheFrameLengthIsUnknown) {
-    for (std::size_t ms : {10U, 15U, 20U, 30U, 32U, 40U, 25U, 0U}) {
-        test_support::CapturedOutput out(1);
-        VadCleaner_v0_0_1 const cleaner(modelFrom(randomVadWeight({})), ms);
-        EXPECT_EQ(out.text(), ms == 25 || ms == 0 ? "ERROR FRAMEDURATIONS\n" : "") << ms;
-    }
 }
