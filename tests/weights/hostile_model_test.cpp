@@ -16,6 +16,7 @@ namespace {
 using namespace test_support;
 
 constexpr int frames = 5;
+std::vector<short> const loud(160, 5000);
 
 NcShape smallShape(std::string version) {
     NcShape shape;
@@ -59,8 +60,7 @@ bool runNc() {
 bool runVad() {
     auto* const session = Morva_VAD_CreateSession(MORVA_RATE_8000, MORVA_FRAME_20_MS, "model");
     if (session == nullptr) return false;
-    std::vector<short> const frame(160, 5000);
-    for (int i = 0; i < frames; ++i) Morva_VAD_FrameInt16(session, frame.data(), 160);
+    for (int i = 0; i < frames; ++i) Morva_VAD_FrameInt16(session, loud.data(), 160);
     EXPECT_EQ(Morva_VAD_CloseSession(session), 0);
     return true;
 }
@@ -68,8 +68,7 @@ bool runVad() {
 bool runLevel() {
     auto* const session = Morva_NoiseDB_CreateSession(MORVA_RATE_8000, MORVA_FRAME_20_MS, "model");
     if (session == nullptr) return false;
-    std::vector<short> const frame(160, 5000);
-    for (int i = 0; i < frames; ++i) Morva_NoiseDB_FrameInt16(session, frame.data(), 160);
+    for (int i = 0; i < frames; ++i) Morva_NoiseDB_FrameInt16(session, loud.data(), 160);
     EXPECT_EQ(Morva_NoiseDB_ResetSession(session), 1);
     EXPECT_EQ(Morva_NoiseDB_CloseSession(session), 0);
     return true;

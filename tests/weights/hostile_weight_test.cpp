@@ -157,11 +157,4 @@ TEST(HostileWeight, ManyEmptyElementsAreKept) {
     expectModestAndEqualToReference(writer.bytes());
 }
 
-TEST(HostileWeight, NullBytesCountAsNone) {
-    testing::internal::CaptureStdout();
-    Weight weight;
-    EXPECT_TRUE(weight.read(nullptr, 100));
-    EXPECT_EQ(testing::internal::GetCapturedStdout(), "Warning Nothing added from weight\n");
-}
-
 }  // namespace

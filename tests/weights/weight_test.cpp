@@ -1,9 +1,10 @@
 // Reading well-formed weights, typed access, and the containers behind it.
 #include "weights/weight.h"
 
-#include <gmock/gmock.h>
+#include <gtest/gtest.h>
 #include <sys/stat.h>
 
+#include <array>
 #include <bit>
 #include <random>
 #include <thread>
@@ -17,7 +18,6 @@ namespace {
 
 using namespace MORVA;
 using namespace test_support;
-using testing::HasSubstr;
 using testing::internal::CaptureStdout;
 using testing::internal::GetCapturedStdout;
 using WEIGHTS::Weight;
@@ -108,29 +108,19 @@ TEST(Weight, FirstOfTwoEqualNamesWinsWhateverTheTypes) {
     EXPECT_EQ(weight.getReference<std::string>("b"), "x");
 }
 
-TEST(Weight, EmptySourcesSucceedWithAWarningLine) {
+TEST(Weight, SourcesWithoutARecord) {
     TempDir const dir;
-    auto const file = dir.write("empty.mvw", "").wstring();
-    for (auto const* path : {file.c_str(), L"/dev/null", static_cast<wchar_t const*>(nullptr)}) {
+    auto const empty = dir.write("empty.mvw", "").wstring();
+    for (auto const& [path, readable] : {std::pair{empty, true},
+                                         {L"/dev/null", true},
+                                         {dir.path().wstring() + L"/missing.mvw", false},
+                                         {dir.path().wstring(), false}}) {
         Weight weight;
         CaptureStdout();
-        bool const result = path != nullptr ? weight.read(UTILS::Path(path)) : weight.read("", 0);
-        EXPECT_EQ(GetCapturedStdout(), "Warning Nothing added from weight\n");
-        EXPECT_TRUE(result);
+        EXPECT_EQ(weight.read(UTILS::Path(path.c_str())), readable);
+        EXPECT_EQ(GetCapturedStdout(), readable ? "Warning Nothing added from weight\n" : "");
         EXPECT_TRUE(weight.values().empty());
-        EXPECT_EQ(weight.message(), "");
-    }
-}
-
-TEST(Weight, AMissingFileAndAFolderAreCorrupted) {
-    TempDir const dir;
-    for (auto const& path : {dir.path() / "missing.mvw", dir.path()}) {
-        Weight weight;
-        CaptureStdout();
-        EXPECT_FALSE(weight.read(UTILS::Path(path.wstring().c_str()))) << path;
-        EXPECT_EQ(GetCapturedStdout(), "");
-        EXPECT_TRUE(weight.values().empty());
-        EXPECT_EQ(weight.message(), "Corrupted weight file!");
+        EXPECT_EQ(weight.message(), readable ? "" : "Corrupted weight file!");
     }
 }
 
@@ -145,18 +135,6 @@ TEST(Weight, APipeReadsLikeAFile) {
     writer.join();
     EXPECT_TRUE(result);
     EXPECT_EQ(writeBack(weight.values()), ReferenceReader(bytes).read());
-}
-
-TEST(Weight, ANonAsciiPathOpens) {
-    TempDir const dir;
-    auto const file = dir.write(
-        "m\xc3\xb6"
-        "del \xf0\x9f\x8e\xa4.mvw",
-        WeightWriter().add("a", 7).bytes());
-    Weight weight;
-    EXPECT_TRUE(
-        weight.read(UTILS::Path((dir.path().wstring() + L"/m\u00f6del \U0001f3a4.mvw").c_str())));
-    EXPECT_EQ(weight.getReference<int>("a"), 7);
 }
 
 TEST(Weight, AnEmptyMatrixKeepsItsCounts) {
@@ -174,74 +152,58 @@ TEST(Weight, AnEmptyMatrixKeepsItsCounts) {
 }
 
 TEST(Weight, AccessorsHandOutOneObjectAndNamesEndInTheirException) {
-    auto const weight = fromBlob(WeightWriter().add("gain", 1.5F).bytes());
+    auto const weight = fromBlob(WeightWriter().add("gain", 1.5F).add("Version", 6).bytes());
     EXPECT_EQ(&weight.getReference<float>("gain"), &weight.getReference<float>("gain"));
+    auto const refusal = [](auto call) -> std::string {
+        try {
+            call();
+        } catch (UTILS::MORVA_Exception const& error) {
+            return error.what();
+        }
+        return "nothing was thrown";
+    };
     for (std::string const name : {"gain", "Gain", ""}) {
-        try {
-            weight.getReference<int>(name);
-            ADD_FAILURE() << name;
-        } catch (UTILS::MORVA_Exception const& error) {
-            EXPECT_EQ(error.what(),
-                      "MORVA_Exeption in file src/weights/weight Line 90 Function getReference\n "
-                      "messege ERROR DATA With Key: " +
-                          name + "doesn't exists");
-        }
+        EXPECT_EQ(refusal([&] { weight.getReference<int>(name); }),
+                  "MORVA_Exeption in file src/weights/weight Line 90 Function getReference\n "
+                  "messege ERROR DATA With Key: " +
+                      name + "doesn't exists");
     }
+    EXPECT_EQ(refusal([&] { weight.getWeightVersion(); }),
+              "MORVA_Exeption in file src/weights/weight Line 348 Function getWeightVersion\n "
+              "messege there are no Weight version in Weight ");
+    EXPECT_EQ(refusal([&] { weight.getWeightInfo(); }),
+              "MORVA_Exeption in file src/weights/weight Line 339 Function getWeightInfo\n "
+              "messege there are no needing Weight information in Weight ");
 }
 
-TEST(Weight, VersionIsAStringOrThrows) {
-    EXPECT_EQ(fromBlob(WeightWriter().add("Version", "0.0.6").bytes()).getWeightVersion(), "0.0.6");
-    for (auto const& bytes :
-         {WeightWriter().add("Version", 6), WeightWriter().add("version", "6")}) {
-        try {
-            fromBlob(bytes.bytes()).getWeightVersion();
-            ADD_FAILURE();
-        } catch (UTILS::MORVA_Exception const& error) {
-            EXPECT_STREQ(error.what(),
-                         "MORVA_Exeption in file src/weights/weight Line 348 Function "
-                         "getWeightVersion\n messege there are no Weight version in Weight ");
+// Rate and length, and the duration that follows from them; 0: refused.
+TEST(Weight, DurationFollowsFromLengthAndRate) {
+    for (auto const& [rate, length, duration] : {std::array{16000, 160, 10},
+                                                 {16000, 175, 10},
+                                                 {16000, 176, 0},
+                                                 {8000, 120, 15},
+                                                 {8000, 240, 30},
+                                                 {16000, 512, 32},
+                                                 {32000, 640, 20},
+                                                 {32000, 1280, 40},
+                                                 {16000, 400, 0},
+                                                 {44100, 441, 0},
+                                                 {48000, 480, 0},
+                                                 {0, 160, 0},
+                                                 {-16000, -160, 0},
+                                                 {8000, INT32_MIN, 0},
+                                                 {8000, 0, 0},
+                                                 {8000, INT32_MAX, 0},
+                                                 {16000, 536871072, 0}}) {  // x 1000 wraps round
+        auto const weight =
+            fromBlob(WeightWriter().add("SampleRate", rate).add("FrameLength", length).bytes());
+        if (duration == 0) {
+            EXPECT_THROW(weight.getWeightInfo(), UTILS::MORVA_Exception) << rate << ' ' << length;
+            continue;
         }
-    }
-}
-
-struct InfoCase {
-    int rate;
-    int length;
-    int duration;  // 0: throws
-};
-
-class WeightInfo : public testing::TestWithParam<InfoCase> {};
-
-TEST_P(WeightInfo, DurationFollowsFromLengthAndRate) {
-    auto const [rate, length, duration] = GetParam();
-    auto const weight =
-        fromBlob(WeightWriter().add("SampleRate", rate).add("FrameLength", length).bytes());
-    try {
         auto const info = weight.getWeightInfo();
         EXPECT_EQ(static_cast<int>(info.first), rate);
-        EXPECT_EQ(static_cast<int>(info.second), duration);
-    } catch (UTILS::MORVA_Exception const& error) {
-        EXPECT_EQ(duration, 0);
-        EXPECT_STREQ(error.what(),
-                     "MORVA_Exeption in file src/weights/weight Line 339 Function getWeightInfo\n "
-                     "messege there are no needing Weight information in Weight ");
-    }
-}
-
-constexpr InfoCase infoCases[] = {
-    {16000, 160, 10},  {16000, 161, 10},     {16000, 175, 10},      {16000, 176, 0},
-    {8000, 120, 15},   {8000, 240, 30},      {16000, 512, 32},      {32000, 640, 20},
-    {32000, 1280, 40}, {16000, 400, 0},      {44100, 441, 0},       {48000, 480, 0},
-    {0, 160, 0},       {-16000, -160, 0},    {16000, -160, 0},      {8000, INT32_MIN, 0},
-    {8000, 0, 0},      {8000, INT32_MAX, 0}, {16000, 536871072, 0},  // x 1000 wraps to 160000
-};
-INSTANTIATE_TEST_SUITE_P(Table, WeightInfo, testing::ValuesIn(infoCases));
-
-TEST(Weight, InfoNeedsBothValuesAsInts) {
-    for (auto const& bytes :
-         {WeightWriter().add("SampleRate", 8000), WeightWriter().add("FrameLength", 80),
-          WeightWriter().add("SampleRate", 8000.0F).add("FrameLength", 80)}) {
-        EXPECT_THROW(fromBlob(bytes.bytes()).getWeightInfo(), UTILS::MORVA_Exception);
+        EXPECT_EQ(static_cast<int>(info.second), duration) << rate << ' ' << length;
     }
 }
 
@@ -290,16 +252,6 @@ TEST(AnyMap, InsertModesAndSharing) {
     EXPECT_EQ(*map.find<int>("k"), 3);
     EXPECT_EQ(*first, "one") << "a holder keeps the replaced value";
     EXPECT_NE(map.insert<float>("new", 1.0F, InsertMode::replace), nullptr);
-}
-
-TEST(AnyMap, KeysAreOrderedAsBytes) {
-    CONTAINERS::AnyMap map;
-    for (auto const* key : {"b", "\xc3\xa4", "a", "", "B"}) {
-        map.insert<int>(key, 0, CONTAINERS::InsertMode::keep);
-    }
-    std::vector<std::string> keys;
-    for (auto const& entry : map) keys.push_back(entry.first);
-    EXPECT_THAT(keys, testing::ElementsAre("", "B", "a", "b", "\xc3\xa4"));
 }
 
 }  // namespace
