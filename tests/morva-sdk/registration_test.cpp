@@ -147,31 +147,6 @@ TEST_F(Registration, Blobs) {
     EXPECT_EQ(openNamed(nullptr, 24000).result, nullptr);
 }
 
-TEST_F(Registration, IncompleteIdentifiersAreNoReasonToRefuse) {
-    struct Row {
-        char const* name;
-        WeightWriter writer;
-    };
-    auto const base = [] { return WeightWriter().add("Version", "0.0.6"); };
-    Row const rows[] = {
-        {"no stamp", base().add("SampleRate", 8000).add("FrameLength", 160).add("ModelName", "m")},
-        {"slow", base()
-                     .add("SampleRate", 999)
-                     .add("FrameLength", 160)
-                     .add("ModelName", "m")
-                     .add("TimeStamp", "t")},
-        {"no rate", base().add("FrameLength", 160).add("ModelName", "m").add("TimeStamp", "t")},
-        {"wrong type", base()
-                           .add("SampleRate", 8000.0F)
-                           .add("FrameLength", 160)
-                           .add("ModelName", "m")
-                           .add("TimeStamp", "t")},
-    };
-    for (auto const& row : rows) {
-        EXPECT_THAT(addBlob(row.writer.bytes(), row.name), gives(0, "", kInvalid)) << row.name;
-    }
-}
-
 // The identifier is version, milliseconds, kilohertz, model name and time stamp. The two weights
 // differ in their masks, so that a session tells which one it runs.
 TEST_F(Registration, EqualIdentifiersShareOneWeight) {

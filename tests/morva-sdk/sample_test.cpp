@@ -143,15 +143,13 @@ TEST_F(Samples, FullScaleSaturates) {
 TEST_F(Samples, Int16IsTheTruncatedFloat) {
     for (auto const& [in, out] : {std::pair{16000, 16000}, {48000, 44100}}) {
         auto const pcm = toPcm(voice(in, 0.5, 8));
-        std::vector<float> unit(pcm.size());
-        std::ranges::transform(pcm, unit.begin(),
-                               [](short v) { return static_cast<float>(v) / 32768.0F; });
-        auto const got = cleanAll(openNc(in, out, 20, "NC_small_16k"), pcm);
-        auto const wanted = cleanAll(openNc(in, out, 20, "NC_small_16k"), unit);
-        ASSERT_EQ(got.size(), wanted.size());
-        for (std::size_t i = 0; i < got.size(); ++i) {
-            ASSERT_EQ(got[i], static_cast<int>(wanted[i] * 32768.0F)) << i;
+        std::vector<float> unit(pcm.begin(), pcm.end());
+        for (float& v : unit) v /= 32768.0F;
+        std::vector<short> truncated;
+        for (float const v : cleanAll(openNc(in, out, 20, "NC_small_16k"), unit)) {
+            truncated.push_back(static_cast<short>(v * 32768.0F));
         }
+        EXPECT_EQ(cleanAll(openNc(in, out, 20, "NC_small_16k"), pcm), truncated);
     }
 }
 
@@ -161,17 +159,6 @@ TEST_F(Samples, FrameLengthChangesOnlyTheDelay) {
     auto const ten = cleanAll(openNc(16000, 16000, 10, "NC_small_16k"), sound);
     for (int ms : {20, 30, 40}) {
         EXPECT_EQ(cleanAll(openNc(16000, 16000, ms, "NC_small_16k"), sound), ten) << ms;
-    }
-}
-
-TEST_F(Samples, EqualInputGivesEqualBits) {
-    for (int hz : kRates) {
-        auto const sound = voice(hz, 0.3, 10);
-        for (std::string const model : kShipped) {
-            auto const first = cleanAll(openNc(hz, 48000, 10, model.c_str()), sound);
-            std::vector<float> spacer(3);  // moves the next session's memory
-            EXPECT_EQ(cleanAll(openNc(hz, 48000, 10, model.c_str()), sound), first) << model << hz;
-        }
     }
 }
 
