@@ -27,7 +27,6 @@ RUNAWAY = 3.0
 class Schedule:
     steps: int
     peak: float = 1e-3
-    orthogonal: bool = False  # Muon for the hidden matrices
     warm_up: int = 50
     decay_share: float = 0.35
     average: float = 0.99  # of the moving average of the weights
@@ -52,7 +51,7 @@ class Run:
         self.step = 0
         self.seconds = 0.0
         folder.mkdir(parents=True, exist_ok=True)
-        self.optimiser = make_optimiser(network, schedule)
+        self.optimiser = make_optimiser(network, schedule.peak)
         self.averaged = copy.deepcopy(network)
         if self.checkpoint.exists():
             self._resume()

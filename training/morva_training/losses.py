@@ -35,10 +35,10 @@ DEEPEST_DB = -40.0
 class LossWeights:
     compressed: float = 8.0
     phase: float = 2.0
-    lost_speech: float = 3.0
-    ratio: float = 0.03  # per dB
-    loudness: float = 1.0  # per point of listening quality
-    pause: float = 0.01  # per dB of noise left in pauses
+    lost_speech: float = 5.0
+    ratio: float = 0.17  # per dB
+    loudness: float = 1.4  # per point of listening quality
+    pause: float = 0.012  # per dB of noise left in pauses
 
 
 def bark(frequency: np.ndarray) -> np.ndarray:

@@ -25,7 +25,7 @@ from .reshape import widened
 from .spectra import FULL_32K, SMALL_16K, SMALL_8K, Layout
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
-HIDDEN = {"32k": 224, "16k": 192, "8k": 128}
+HIDDEN = {"32k": 304, "16k": 208, "8k": 160}
 LEVEL_RECIPE = Recipe(snr_db=(-8.0, 30.0), noise_only_share=0.2, synthetic_share=0.25)
 SKIPPED_FRAMES = 20  # at the start of a piece, while the memory fills
 
@@ -72,12 +72,11 @@ def parse() -> argparse.Namespace:
     parser.add_argument("--plain", action="store_true", help="version 0.0.5 network")
     parser.add_argument("--level", action="store_true", help="train for the level of the removed noise")
     parser.add_argument("--hidden", type=int, help="units per layer; more than in --start doubles some")
-    parser.add_argument("--steps", type=int, default=2000)
-    parser.add_argument("--batch", type=int, default=48)
-    parser.add_argument("--seconds", type=float, default=Recipe.seconds, help="length of a piece")
-    parser.add_argument("--reuse", type=int, default=2, help="mixtures made of one draw of speech and noise")
-    parser.add_argument("--rate", type=float, default=1e-3)
-    parser.add_argument("--orthogonal", action="store_true", help="Muon for the matrices")
+    parser.add_argument("--steps", type=int, default=6000)
+    parser.add_argument("--batch", type=int, default=32)
+    parser.add_argument("--seconds", type=float, default=3.0, help="length of a piece")
+    parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw of speech and noise")
+    parser.add_argument("--rate", type=float, default=1.5e-3)
     parser.add_argument("--seed", type=int, default=1)
     parser.add_argument("--ratio", type=float, default=LossWeights.ratio)
     parser.add_argument("--loudness", type=float, default=LossWeights.loudness)
@@ -100,7 +99,7 @@ def main() -> None:
     source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done, args.reuse)
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     network, mean, deviation = start(args, layout, loader)
-    schedule = Schedule(args.steps, args.rate, orthogonal=args.orthogonal)
+    schedule = Schedule(args.steps, args.rate)
     run = Run(network.to(device), args.run, schedule, {"mean": mean.tolist(), "deviation": deviation.tolist()})
     mean_, deviation_ = (torch.tensor(run.extra[k], device=device) for k in ("mean", "deviation"))
     weights = LossWeights(ratio=args.ratio, loudness=args.loudness, pause=args.pause, lost_speech=args.lost_speech)

@@ -41,7 +41,7 @@ def test_noise_model_learns_and_resumes(store: Path, tmp_path: Path, monkeypatch
     assert all(np.array_equal(x, y) for x, y in zip(a["WeightLinear"], b["WeightLinear"]))
     assert np.array_equal(a["WeightGRU"], a["WeightGRU"].astype(np.float16)), "the engine packs such matrices tighter"
 
-    wider = ("--start", out, "--hidden", 24, "--orthogonal", "--run", tmp_path / "other")
+    wider = ("--start", out, "--hidden", 24, "--run", tmp_path / "other")
     run_main(train_noise, monkeypatch, *common, *wider, "--steps", 0)
     assert entries(tmp_path / "other", "dev_ratio_db")[0] == pytest.approx(ratios[-1], abs=0.5)
     for steps in (4, 8):
