@@ -1,11 +1,14 @@
 // The way around the model: the caller's own sound at the session's latency, cross-faded against
 // the cleaned sound, so that switching neither clicks nor shifts. One thread at a time; the switch
 // itself may be thrown from any thread.
+//
+// While it is off, nothing but a copy of the last input frames is kept. The frame that finds the
+// switch on converts all of them at once; the filter of the conversion has then heard enough to
+// give what it would give had it run all the time.
 #pragma once
 
 #include <atomic>
 #include <cstddef>
-#include <memory>
 #include <vector>
 
 #include "utils/cyclic_block_data.h"
@@ -27,10 +30,18 @@ public:
     void mix(std::vector<float>& cleaned);
 
 private:
+    void convertLast(std::size_t frames);
+
     UTILS::Resampler toOutput_;
-    std::vector<float> converted_;
+    std::size_t ownDelay_;  // of the conversion, output samples
+    std::size_t outputFrame_;
+    std::size_t waiting_;  // converted samples that wait for their time between two frames
+    std::size_t frames_;   // input frames that make up for not having run
+    std::vector<float> frame_;
+    CONTAINERS::CyclicBlockData input_;
     CONTAINERS::CyclicBlockData delayed_;
     std::atomic<bool> target_ = false;
+    bool running_ = false;
     float share_ = 0.0f;  // of the bypassed sound, at the end of the last frame
 };
 

@@ -129,8 +129,12 @@ std::size_t allocationsOfAllSessions(std::vector<std::string> const& noiseModels
             unsigned outSize = 0;
             MorvaExt_SessionFrameSizes(session, nullptr, &outSize);
             std::vector<Sample> out(outSize);
-            seen += allocationsAfterSilence<Sample>(
-                size, count, [&](auto const& in) { EXPECT_EQ(clean(session, in, out), 0); });
+            int done = 0;
+            seen += allocationsAfterSilence<Sample>(size, count, [&](auto const& in) {
+                // Never before the warm-up ends: what is bypassed late finds its memory, too.
+                MorvaExt_NC_SetBypass(session, ++done > 100 && done / 5 % 2 == 1);
+                EXPECT_EQ(clean(session, in, out), 0);
+            });
         }
         auto* const voiceSession = Morva_VAD_CreateSession(rate(hz), duration(10), "vad");
         seen += allocationsAfterSilence<Sample>(

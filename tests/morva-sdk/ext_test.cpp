@@ -18,6 +18,20 @@ using test_support::Random;
 using test_support::randomNcWeight;
 using test_support::randomVadWeight;
 
+// The linker sends every block that is resampled through here: --wrap of Resampler::resample.
+namespace {
+std::size_t resampledBlocks = 0;
+}
+extern "C" {
+unsigned __real__ZN5MORVA5UTILS9Resampler8resampleERKSt6vectorIfSaIfEERS4_(
+    void*, std::vector<float> const&, std::vector<float>&);
+unsigned __wrap__ZN5MORVA5UTILS9Resampler8resampleERKSt6vectorIfSaIfEERS4_(
+    void* resampler, std::vector<float> const& in, std::vector<float>& out) {
+    ++resampledBlocks;
+    return __real__ZN5MORVA5UTILS9Resampler8resampleERKSt6vectorIfSaIfEERS4_(resampler, in, out);
+}
+}
+
 namespace {
 
 constexpr float kOneStep = 1.0F / 32768.0F;
@@ -67,11 +81,14 @@ float largestStep(std::vector<float> const& sound) {
     return largest;
 }
 
-// Cleans `sound` (10 ms frames) and calls `before(k)` ahead of frame k.
-std::vector<float> cleanWith(void* session, std::vector<float> const& sound, std::size_t size,
+// Cleans `sound` and calls `before(k)` ahead of frame k.
+std::vector<float> cleanWith(void* session, std::vector<float> const& sound,
                              std::function<void(std::size_t)> const& before) {
+    unsigned size = 0;
+    unsigned outSize = 0;
+    EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &size, &outSize), 0);
     std::vector<float> all;
-    std::vector<float> out(size);
+    std::vector<float> out(outSize);
     for (std::size_t k = 0; (k + 1) * size <= sound.size(); ++k) {
         before(k);
         auto const* const first = sound.data() + k * size;
@@ -181,7 +198,7 @@ TEST_F(Extension, ChangesDoNotClick) {
     Random random(4);
     TRACE_SEED(random);
     auto* const limit = open(16000, 10, "closed");
-    auto const limited = cleanWith(limit, sound, 160, [&](std::size_t k) {
+    auto const limited = cleanWith(limit, sound, [&](std::size_t k) {
         if (k % 3 == 0) {
             float const db = random.chance(0.5) ? 0.0F : random.uniform(0.0F, 60.0F);
             MorvaExt_NC_SetAttenuationLimit(limit, db);
@@ -191,9 +208,8 @@ TEST_F(Extension, ChangesDoNotClick) {
     EXPECT_GT(largestStep(limited), ownStep * 0.9F);
 
     auto* const bypass = open(16000, 10, "closed");
-    auto const switched = cleanWith(bypass, sound, 160, [&](std::size_t) {
-        MorvaExt_NC_SetBypass(bypass, random.chance(0.3));
-    });
+    auto const switched = cleanWith(
+        bypass, sound, [&](std::size_t) { MorvaExt_NC_SetBypass(bypass, random.chance(0.3)); });
     EXPECT_LE(largestStep(switched), ownStep + fade);
     EXPECT_GT(largestStep(switched), ownStep * 0.9F);
 }
@@ -240,12 +256,67 @@ TEST_F(Extension, BypassBetweenRatesKeepsItsPlace) {
     }
 }
 
+// However often the switch is thrown, the output is the fade between what sessions give that are
+// never and always bypassed: no click, no shift, and nothing missing after a time without.
+TEST_F(Extension, SwitchingFadesBetweenNeverAndAlways) {
+    Random random(9);
+    TRACE_SEED(random);
+    struct Setting {
+        int in;
+        int out;
+        int ms;
+    };
+    for (auto const [in, out, ms] :
+         {Setting{16000, 16000, 10}, {48000, 16000, 10}, {44100, 48000, 20}, {8000, 96000, 40}}) {
+        // The filter's table is read without interpolation: a clock that has run for another time
+        // may round to the next entry.
+        double const limit = in == out ? 0.05 : 4.0;
+        ErrorBound bound("switching, " + std::to_string(in) + " -> " + std::to_string(out), limit);
+        auto const sound = whiteNoise(static_cast<std::size_t>(in) * 6 / 5, 10);
+        auto* const always = openNc(in, out, ms, "narrow");
+        MorvaExt_NC_SetBypass(always, 1);
+        auto const bypassed = cleanAll(always, sound);
+        auto const cleaned = cleanAll(openNc(in, out, ms, "narrow"), sound);
+
+        auto* const session = openNc(in, out, ms, "narrow");
+        std::vector<float> shares = {0.0F};
+        auto const switched = cleanWith(session, sound, [&](std::size_t k) {
+            bool const change = k > 1 && random.chance(0.2);  // the first frame of `always` fades
+            shares.push_back(change ? 1.0F - shares.back() : shares.back());
+            MorvaExt_NC_SetBypass(session, shares.back() != 0.0F);
+        });
+        std::size_t const size = samples(out, ms);
+        for (std::size_t i = 0; i < switched.size(); ++i) {
+            float const from = shares[i / size];
+            float const passed = static_cast<float>(i % size + 1) / static_cast<float>(size);
+            float const share = from + passed * (shares[i / size + 1] - from);
+            bound.add(switched[i], cleaned[i] + share * (bypassed[i] - cleaned[i]), kOneStep);
+        }
+    }
+}
+
+TEST_F(Extension, BypassConvertsNothingWhileItIsOff) {
+    auto* const session = openNc(48000, 16000, 10, "narrow");
+    std::vector<std::size_t> conversions;
+    std::size_t before = 0;
+    cleanWith(session, whiteNoise(48000 / 5, 11), [&](std::size_t k) {
+        if (k > 0) conversions.push_back(resampledBlocks - before);
+        before = resampledBlocks;
+        MorvaExt_NC_SetBypass(session, k >= 10 && k < 13);
+    });
+    std::vector<std::size_t> expected(19, 2);  // into the model and out of it
+    expected[11] = expected[12] = expected[13] = 3;
+    EXPECT_GT(conversions[10], 3U);  // makes up for what was left out
+    expected[10] = conversions[10];
+    EXPECT_EQ(conversions, expected);
+}
+
 TEST_F(Extension, TheModelListensDuringBypass) {
     auto const sound = whiteNoise(16000, 5);
     auto* const steady = open(16000, 10, "random");
     auto* const switched = open(16000, 10, "random");
     auto const wanted = cleanAll(steady, sound);
-    auto const got = cleanWith(switched, sound, 160, [&](std::size_t k) {
+    auto const got = cleanWith(switched, sound, [&](std::size_t k) {
         MorvaExt_NC_SetBypass(switched, k >= 20 && k < 40);
     });
     auto const between = [&](std::size_t first, std::size_t last) {
