@@ -9,6 +9,7 @@ namespace quorral {
 template <class... Args>
 std::string FormatString(const Args&... args) {
     std::ostringstream text;
+    text.exceptions(std::ios::badbit);  // out of memory is an error, not half a text
     (text << ... << args);
     return text.str();
 }

@@ -28,9 +28,24 @@ struct EntryPoints {
 
 EntryPoints gValto;
 
+// What a copy of the module with failing allocations has in addition; null in the module itself.
+struct AllocationControl {
+    void (*fail)(unsigned) = nullptr;
+    int (*isPending)() = nullptr;
+    long (*held)() = nullptr;
+    void (*forgetEngine)() = nullptr;
+};
+
+AllocationControl gAllocations;
+
+template <class F>
+void FindOptional(void* library, const char* name, F& function) {
+    function = reinterpret_cast<F>(dlsym(library, name));
+}
+
 template <class F>
 void Find(void* library, const char* name, F& function) {
-    function = reinterpret_cast<F>(dlsym(library, name));
+    FindOptional(library, name, function);
     if (function == nullptr) throw std::runtime_error(std::string("no symbol ") + name);
 }
 
@@ -43,6 +58,10 @@ void FindAll(const std::string& path) {
     Find(library, "ValtoVADSetup", gValto.vadSetup);
     Find(library, "ValtoVADProcess", gValto.vadProcess);
     Find(library, "ValtoVADReset", gValto.vadReset);
+    FindOptional(library, "FailAllocation", gAllocations.fail);
+    FindOptional(library, "IsFailurePending", gAllocations.isPending);
+    FindOptional(library, "HeldAllocations", gAllocations.held);
+    FindOptional(library, "ForgetEngine", gAllocations.forgetEngine);
 }
 
 // One stream on its own thread: cleans the input, reads a voice score per frame.
@@ -169,6 +188,25 @@ napi_value VadReset(napi_env env, napi_callback_info info) {
     return call.Number(gValto.vadReset(call.Pointer(0)));
 }
 
+// failAllocation(n): the n-th allocation of the module fails; 0 disarms.
+napi_value FailAllocation(napi_env env, napi_callback_info info) {
+    gAllocations.fail(static_cast<unsigned>(Call(env, info).Int(0)));
+    return nullptr;
+}
+
+napi_value IsFailurePending(napi_env env, napi_callback_info info) {
+    return Call(env, info).Number(gAllocations.isPending());
+}
+
+napi_value HeldAllocations(napi_env env, napi_callback_info info) {
+    return Call(env, info).Number(static_cast<double>(gAllocations.held()));
+}
+
+napi_value ForgetEngine(napi_env /*env*/, napi_callback_info /*info*/) {
+    gAllocations.forgetEngine();
+    return nullptr;
+}
+
 // start(rateHz, frameMs, input): runs the whole input once on the engine's thread.
 napi_value Start(napi_env env, napi_callback_info info) {
     const Call call(env, info);
@@ -244,12 +282,21 @@ NAPI_MODULE_INIT() {
                                         .data = nullptr};
     };
     const std::array methods{
-        method("attach", Attach),         method("ncSetup", NcSetup),
-        method("ncProcess", NcProcess),   method("ncReset", NcReset),
-        method("vadSetup", VadSetup),     method("vadProcess", VadProcess),
-        method("vadReset", VadReset),     method("start", Start),
-        method("running", Running),       method("result", Result),
+        method("attach", Attach),
+        method("ncSetup", NcSetup),
+        method("ncProcess", NcProcess),
+        method("ncReset", NcReset),
+        method("vadSetup", VadSetup),
+        method("vadProcess", VadProcess),
+        method("vadReset", VadReset),
+        method("start", Start),
+        method("running", Running),
+        method("result", Result),
         method("runForever", RunForever),
+        method("failAllocation", FailAllocation),
+        method("isFailurePending", IsFailurePending),
+        method("heldAllocations", HeldAllocations),
+        method("forgetEngine", ForgetEngine),
     };
     napi_define_properties(env, exports, methods.size(), methods.data());
     return exports;

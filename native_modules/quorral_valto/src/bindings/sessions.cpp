@@ -108,9 +108,11 @@ napi_value Open(napi_env env, napi_callback_info info, Opener open, int (*close)
     napi_get_value_int32(env, arguments[0], &rateHz);
     napi_get_value_int32(env, arguments[1], &frameMs);
     try {
+        // First, since an open session that finds no owner would stay open for ever.
+        auto session = std::make_unique<Session>(nullptr, close);
         const OpenResult result = open(rateHz, frameMs, TextOf(env, arguments[2]));
         if (result.status != OpenStatus::kOpen) return Code(env, static_cast<int>(result.status));
-        auto session = std::make_unique<Session>(result.session, close);
+        session->handle = result.session;
         napi_value external = nullptr;
         if (napi_create_external(env, session.get(), DestroySession, nullptr, &external) !=
             napi_ok) {

@@ -72,11 +72,13 @@ int RegisterShippedModels(const std::string& directory) {
     return 0;
 }
 
-bool CreateEngine(const std::string& directory) {
+// Puts the working directory into `directory`.
+bool CreateEngine(std::string& directory) {
     try {
+        directory = util::ModuleBasePath();
         return Morva_SDK_GlobalInit(util::ToUTF16(directory).c_str(), kEngineThreads) == 0;
     } catch (const std::exception&) {
-        return false;  // a directory whose name is not UTF-8
+        return false;  // no memory, or a directory whose name is not UTF-8
     }
 }
 
@@ -97,7 +99,7 @@ int ValtoInitialize(CpuFeatureQuery query) {
         PrintLine("Failed to initialize Morva SDK: CPU does not support AVX2");
         return kNoAvx2;
     }
-    const std::string directory = util::ModuleBasePath();
+    std::string directory;
     if (!CreateEngine(directory)) {
         PrintLine("Faild to initialize Morva SDK");
         return kNoEngine;

@@ -2,7 +2,7 @@
 import assert from 'node:assert/strict';
 import { spawn } from 'node:child_process';
 import { once } from 'node:events';
-import { binaryFile, bindingPath, enginePath, packageDir } from './package.mjs';
+import { binaryFile, bindingPath, enginePath, failingPath, packageDir } from './package.mjs';
 
 const TIMEOUT_MS = 120_000;
 
@@ -16,6 +16,7 @@ const BINARY = ${JSON.stringify(binaryFile)};
 const PACKAGE = ${JSON.stringify(packageDir)};
 const ENGINE = ${JSON.stringify(enginePath)};
 const BINDING = ${JSON.stringify(bindingPath)};
+const FAILING = ${JSON.stringify(failingPath)};
 const loadRaw = () => require(BINARY);
 const loadEngine = () => { const e = require(ENGINE); e.attach(BINARY); return e; };
 const again = (file) => { const m = { exports: {} }; process.dlopen(m, file); return m.exports; };

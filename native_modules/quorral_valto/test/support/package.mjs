@@ -21,6 +21,7 @@ export const binaryFile = path.join(binaryDir, 'quorral_valto.node');
 const addons = process.env.QUORRAL_VALTO_TEST_ADDONS ?? path.join(build, '..', 'test_addons');
 export const enginePath = path.join(addons, 'valto_engine_probe.node');
 export const bindingPath = path.join(addons, 'binding_probe.node');
+export const failingPath = path.join(addons, 'failing', 'quorral_valto.node');
 
 export const underSanitizer = (process.env.LD_PRELOAD ?? '').includes('asan');
 
