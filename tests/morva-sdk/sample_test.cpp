@@ -127,6 +127,15 @@ TEST_F(Samples, HostileSoundLeavesFiniteValues) {
     EXPECT_NEAR(levels.back(), run(openDb, levelOf, sound).back(), 3.0F);
 }
 
+// What the changed weights of the fuzzer show at length.
+TEST_F(Samples, AWeightOfNoNumbersGivesLegalSamples) {
+    test_support::WeightWriter bad;
+    bad.add("MU", std::vector<float>{NAN}).add("SD", std::vector<float>{1e-38F});
+    ASSERT_EQ(Engine::add("nan", bad.bytes() + randomNcWeight({.timeStamp = "nan"})), 0);
+    for (float const y : cleanAll(openNc(16000, 48000, 10, "nan"), voice(16000, 0.1, 5)))
+        ASSERT_TRUE(y >= -1.0F && y < 1.0F) << y;
+}
+
 TEST_F(Samples, FullScaleSaturates) {
     auto* const session = openNc(16000, 16000, 10, "id");
     auto* const session16 = openNc(16000, 16000, 10, "id");
