@@ -45,6 +45,15 @@ template <class Function, class... Arguments>
 auto call(Function function, Arguments... arguments) {
     return observe([&] { return function(arguments...); });
 }
+auto tryNc(int in, int out, int ms, char const* model) {
+    return call(Morva_NC_CreateSession, rate(in), rate(out), duration(ms), model);
+}
+auto tryVad(int hz, int ms, char const* model) {
+    return call(Morva_VAD_CreateSession, rate(hz), duration(ms), model);
+}
+auto tryDb(int hz, int ms, char const* model) {
+    return call(Morva_NoiseDB_CreateSession, rate(hz), duration(ms), model);
+}
 
 }  // namespace
 
@@ -69,9 +78,9 @@ TEST(LifeCycle, WithoutEngineEveryCallFailsAfterItsOwnChecks) {
     auto const handle = fails<void*>(nullptr, "Instance", kNoEngine, kInstance);
     EXPECT_THAT(call(Morva_SDK_SetModel, L"x.mvw", "x"), code);
     EXPECT_THAT(call(Morva_SDK_SetModel_Blob, "x", 1U, "x"), code);
-    EXPECT_THAT(call(Morva_NC_CreateSession, rate(8000), rate(8000), duration(10), "x"), handle);
-    EXPECT_THAT(call(Morva_VAD_CreateSession, rate(8000), duration(10), "x"), handle);
-    EXPECT_THAT(call(Morva_NoiseDB_CreateSession, rate(8000), duration(10), nullptr), handle);
+    EXPECT_THAT(tryNc(8000, 8000, 10, "x"), handle);
+    EXPECT_THAT(tryVad(8000, 10, "x"), handle);
+    EXPECT_THAT(tryDb(8000, 10, nullptr), handle);
     for (auto* close : {Morva_NC_CloseSession, Morva_VAD_CloseSession, Morva_NoiseDB_CloseSession,
                         Morva_NoiseDB_ResetSession, MorvaExt_SessionLatencySamples}) {
         EXPECT_THAT(call(close, nullptr), code);
@@ -90,52 +99,45 @@ TEST(LifeCycle, WithoutEngineEveryCallFailsAfterItsOwnChecks) {
                 gives(2, "", "WARRNING Morva_SetWeight FUNCTION CALL with nullptr\n"));
     EXPECT_THAT(call(Morva_SDK_SetModel_Blob, nullptr, 5U, "x"),
                 gives(2, "", "WARRNING Morva_SDK_SetModel_Blob FUNCTION CALL with nullptr\n"));
-    EXPECT_THAT(call(Morva_VAD_CreateSession, rate(1), duration(10), nullptr),
-                gives<void*>(nullptr, "Unsupported Sampling rates!\n"));
+    EXPECT_THAT(tryVad(1, 10, nullptr), gives<void*>(nullptr, "Unsupported Sampling rates!\n"));
 }
 
 TEST_F(Interface, OnlyNineRatesAreTaken) {
     auto const refused = gives<void*>(nullptr, "Unsupported Sampling rates!\n");
     for (int hz : {-1, 0, 7999, 11025, 22050, 96001, 192000}) {
-        EXPECT_THAT(call(Morva_NC_CreateSession, rate(hz), rate(16000), duration(10), "nc"),
-                    refused);
-        EXPECT_THAT(call(Morva_NC_CreateSession, rate(16000), rate(hz), duration(10), "nc"),
-                    refused);
-        EXPECT_THAT(call(Morva_VAD_CreateSession, rate(hz), duration(10), "vad"), refused);
-        EXPECT_THAT(call(Morva_NoiseDB_CreateSession, rate(hz), duration(10), "db"), refused);
+        EXPECT_THAT(tryNc(hz, 16000, 10, "nc"), refused);
+        EXPECT_THAT(tryNc(16000, hz, 10, "nc"), refused);
+        EXPECT_THAT(tryVad(hz, 10, "vad"), refused);
+        EXPECT_THAT(tryDb(hz, 10, "db"), refused);
     }
 }
 
 TEST_F(Interface, DurationsAreRefusedAfterTheModelIsLookedUp) {
     for (int ms : {-10, 0, 1, 15, 25, 32, 50, 1000000}) {
         EXPECT_THAT(
-            call(Morva_NC_CreateSession, rate(16000), rate(48000), duration(ms), "nc"),
+            tryNc(16000, 48000, ms, "nc"),
             fails<void*>(nullptr, "MorvaSessionT", "RESAMPLER WORKS WITH WRONG FRAMEDURATION ",
                          "src/morva-sdk/session Line [0-9]*"));
-        EXPECT_THAT(call(Morva_NC_CreateSession, rate(16000), rate(48000), duration(ms), "none"),
+        EXPECT_THAT(tryNc(16000, 48000, ms, "none"),
                     fails<void*>(nullptr, "create", "Weight with this name isn't found",
                                  "src/noise_canceller/noise_cleaner Line 100"));
         bool const known = ms == 15 || ms == 32;
-        EXPECT_EQ(call(Morva_VAD_CreateSession, rate(16000), duration(ms), "vad").out,
-                  known ? "" : "ERROR FRAMEDURATIONS\n");
+        EXPECT_EQ(tryVad(16000, ms, "vad").out, known ? "" : "ERROR FRAMEDURATIONS\n");
     }
 }
 
 TEST_F(Interface, ModelsServeTheSessionsOfTheirVersion) {
     auto const wrongKind = fails<void*>(nullptr, "create", "Unsupported weight version",
                                         "src/noise_canceller/noise_cleaner Line 127");
-    EXPECT_THAT(call(Morva_NC_CreateSession, rate(16000), rate(16000), duration(10), "vad"),
-                wrongKind);
-    EXPECT_THAT(call(Morva_VAD_CreateSession, rate(16000), duration(10), "nc"), wrongKind);
-    EXPECT_THAT(call(Morva_VAD_CreateSession, rate(16000), duration(10), "db"), wrongKind);
-    EXPECT_THAT(call(Morva_NoiseDB_CreateSession, rate(16000), duration(10), "nc"), wrongKind);
-    for (char const* version : {"0.0.0", "0.0.7", "0.0.60", "", "VAD_0.0.2"}) {
-        ASSERT_EQ(Engine::add(version[0] ? version : "empty",
-                              test_support::WeightWriter().add("Version", version).bytes()),
-                  0);
-        EXPECT_THAT(call(Morva_NC_CreateSession, rate(16000), rate(16000), duration(10),
-                         version[0] ? version : "empty"),
-                    wrongKind);
+    EXPECT_THAT(tryNc(16000, 16000, 10, "vad"), wrongKind);
+    EXPECT_THAT(tryVad(16000, 10, "nc"), wrongKind);
+    EXPECT_THAT(tryVad(16000, 10, "db"), wrongKind);
+    EXPECT_THAT(tryDb(16000, 10, "nc"), wrongKind);
+    for (std::string const version : {"0.0.0", "0.0.7", "0.0.60", "", "VAD_0.0.2"}) {
+        auto const name = "version " + version;
+        auto const weight = test_support::WeightWriter().add("Version", version).bytes();
+        ASSERT_EQ(Engine::add(name.c_str(), weight), 0);
+        EXPECT_THAT(tryNc(16000, 16000, 10, name.c_str()), wrongKind);
     }
     EXPECT_NE(openNc(16000, 16000, 10, "db"), nullptr);
 }
@@ -263,50 +265,42 @@ TEST_F(Interface, FloatValuesOutsideTheUnitRangeAreRefused) {
     EXPECT_EQ(out32[0], -60.0F);
 
     // An uncalibrated model answers with a logit.
-    VadShape shape;
-    shape.calibration.clear();
-    shape.timeStamp = "raw";
     for (unsigned seed = 1; seed < 9; ++seed) {
-        shape.seed = seed;
-        shape.timeStamp = std::to_string(seed);
-        auto const name = "raw" + shape.timeStamp;
+        auto const name = "raw" + std::to_string(seed);
+        VadShape const shape{.calibration = {}, .seed = seed, .timeStamp = name};
         ASSERT_EQ(Engine::add(name.c_str(), randomVadWeight(shape)), 0);
-        auto* const a = Morva_VAD_CreateSession(rate(8000), duration(10), name.c_str());
-        auto* const b = Morva_VAD_CreateSession(rate(8000), duration(10), name.c_str());
-        auto const whole = call(Morva_VAD_FrameInt16, a, in16.data(), 80U);
-        auto const unit = call(Morva_VAD_FrameFloat, b, in32.data(), 80U);
+        auto const whole =
+            call(Morva_VAD_FrameInt16, tryVad(8000, 10, name.c_str()).result, in16.data(), 80U);
+        auto const unit =
+            call(Morva_VAD_FrameFloat, tryVad(8000, 10, name.c_str()).result, in32.data(), 80U);
         EXPECT_EQ(whole.err, "");
-        if (whole.result >= 0.0F && whole.result <= 1.0F) {
-            EXPECT_THAT(unit, gives(whole.result));
-        } else {
-            std::ostringstream text;
-            text << "THE CLEANING ERROR OUTPUT result " << whole.result << "\n" << kWrongSession;
-            EXPECT_THAT(unit, gives(-4.0F, text.str()));
-        }
+        std::ostringstream text;
+        text << "THE CLEANING ERROR OUTPUT result " << whole.result << "\n" << kWrongSession;
+        bool const inUnit = whole.result >= 0.0F && whole.result <= 1.0F;
+        EXPECT_THAT(unit, inUnit ? gives(whole.result) : gives(-4.0F, text.str()));
     }
 }
 
 TEST_F(Interface, SizesOfAllRatesAndDurations) {
+    auto const sizes = [](void* session) {
+        std::pair<unsigned, unsigned> found;
+        EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &found.first, &found.second), 0);
+        EXPECT_EQ(MorvaExt_SessionFrameSizes(session, nullptr, nullptr), 0);
+        return found;
+    };
     for (int ms : kDurations) {
         for (int hz : kRates) {
+            unsigned const in = samples(hz, ms);
             for (int out : {8000, 44100, 96000}) {
                 auto* const session = openNc(hz, out, ms, "db");
-                unsigned sizes[2] = {};
-                EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &sizes[0], &sizes[1]), 0);
-                EXPECT_EQ(sizes[0], samples(hz, ms));
-                EXPECT_EQ(sizes[1], samples(out, ms));
+                EXPECT_EQ(sizes(session), std::pair(in, samples(out, ms)));
                 EXPECT_EQ(Morva_NC_CloseSession(session), 0);
             }
             auto* const voiceSession = Morva_VAD_CreateSession(rate(hz), duration(ms), "vad");
+            EXPECT_EQ(sizes(voiceSession), std::pair(in, 0U));
             auto* const levelSession = Morva_NoiseDB_CreateSession(rate(hz), duration(ms), "db");
-            unsigned in = 0;
-            unsigned out = 1;
-            EXPECT_EQ(MorvaExt_SessionFrameSizes(voiceSession, &in, &out), 0);
-            EXPECT_EQ(in, samples(hz, ms));
-            EXPECT_EQ(out, 0U);
-            EXPECT_EQ(MorvaExt_SessionFrameSizes(levelSession, nullptr, &out), 0);
-            EXPECT_EQ(out, samples(16000, ms));  // whatever the caller's rate
-            std::vector<short> const silence(samples(hz, ms));
+            EXPECT_EQ(sizes(levelSession), std::pair(in, samples(16000, ms)));  // at any rate
+            std::vector<short> const silence(in);
             EXPECT_EQ(level(levelSession, silence), -60.0F);
             EXPECT_THAT(vad(voiceSession, silence),
                         ::testing::AllOf(::testing::Ge(1e-5F), ::testing::Le(0.99999F)));
