@@ -114,15 +114,5 @@ TEST(SpeechSegments, TheDefaultsBridgeAGapOfNineFramesButNotOfTen) {
     EXPECT_EQ(two[1].startMs, 270.0);  // 300 less the padding
 }
 
-TEST(SpeechSegments, AScoreBetweenTheThresholdsNeitherStartsNorEndsSpeech) {
-    std::vector<float> const between(50, 0.4F);
-    EXPECT_TRUE(speechSegments(between, 10.0, {}).empty());
-    std::vector<float> held{0.6F};
-    held.insert(held.end(), between.begin(), between.end());
-    auto const segments = speechSegments(held, 10.0, {});
-    ASSERT_EQ(segments.size(), 1U);
-    EXPECT_EQ(segments[0].endMs, 510.0);
-}
-
 }  // namespace
 }  // namespace morva::cli
