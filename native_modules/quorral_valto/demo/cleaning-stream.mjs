@@ -138,12 +138,11 @@ export class CleaningStream {
   /** What is still inside; the stream takes no more sound afterwards. */
   finish() {
     const frameSize = this.#pending.length;
-    const missing = this.#received + this.latency - this.#processed - this.#pendingLength;
-    const padded = Math.ceil((this.#pendingLength + missing) / frameSize) * frameSize;
     const frames = Math.ceil(this.#received / frameSize);
     const [voiceLeft, noiseLeft] = [frames - this.#voiceFrames, frames - this.#noiseFrames];
-    const tail = this.#collect(new Int16Array(padded - this.#pendingLength));
-    const excess = this.#processed - this.latency - this.#received;
+    const total = (frames + Math.ceil(this.latency / frameSize)) * frameSize;
+    const tail = this.#collect(new Int16Array(total - this.#received));
+    const excess = total - this.latency - this.#received;
     return {
       samples: tail.samples.subarray(0, tail.samples.length - excess),
       voice: tail.voice.slice(0, voiceLeft),

@@ -13,6 +13,7 @@ import {
   mkdtempSync,
   readdirSync,
   rmSync,
+  symlinkSync,
   writeFileSync,
 } from 'node:fs';
 import os from 'node:os';
@@ -50,7 +51,14 @@ function install(tarball, folder) {
   const quiet = ['--silent', '--no-audit', '--no-fund', '--offline'];
   run('npm', ['install', '--ignore-scripts', ...quiet, tarball], { cwd: folder });
   cpSync(path.join(root, 'test'), path.join(folder, 'test'), { recursive: true });
-  cpSync(path.join(root, '../../examples/node/denoise.mjs'), path.join(folder, 'denoise.mjs'));
+  for (const example of ['node/denoise.mjs', 'audio/noisy.flac']) {
+    cpSync(path.join(root, '../../examples', example), path.join(folder, path.basename(example)));
+  }
+  // The live page, which is no part of the package, and what it and its tests call.
+  cpSync(path.join(root, 'demo'), path.join(folder, 'demo'), { recursive: true });
+  for (const name of ['ws', 'playwright-core']) {
+    symlinkSync(path.join(root, 'node_modules', name), path.join(folder, 'node_modules', name));
+  }
 }
 
 // A tree whose voice-activity model is still to be trained is tested with a random one.

@@ -44,10 +44,11 @@ class Sound {
   }
 }
 
-// A pause is where the score has been below this for a while.
+// Frames below this score count as pauses.
 const PAUSE_SCORE = 0.5;
-const PAUSE_MARGIN_FRAMES = 15;
 const FEWEST_PAUSE_FRAMES = 20;
+
+const energy = (samples) => samples.reduce((sum, sample) => sum + sample ** 2, 0);
 
 export class Take {
   constructor(rate, name) {
@@ -80,24 +81,21 @@ export class Take {
     return this.before.samples.length / this.rate;
   }
 
-  /** How much quieter the pauses have become, in dB; null when there are hardly any. */
+  /**
+   * How much quieter the pauses have become, in dB: the median of their frames, which a few frames of
+   * speech among them do not move. Null when there are hardly any.
+   */
   pauseReduction() {
-    const frame = (this.rate * FRAME_MS) / 1000;
+    const frameSize = (this.rate * FRAME_MS) / 1000;
     const [before, after] = [this.before.samples.values, this.after.samples.values];
-    const voice = this.voice.values;
-    const sums = [0, 0];
-    let frames = 0;
-    let quiet = 0;
-    for (let k = 0; k < voice.length && (k + 1) * frame <= after.length; ++k) {
-      quiet = voice[k] < PAUSE_SCORE ? quiet + 1 : 0;
-      if (quiet <= PAUSE_MARGIN_FRAMES) continue;
-      frames += 1;
-      for (let i = k * frame; i < (k + 1) * frame; ++i) {
-        sums[0] += before[i] ** 2;
-        sums[1] += after[i] ** 2;
-      }
-    }
-    if (frames < FEWEST_PAUSE_FRAMES || sums[0] === 0) return null;
-    return 10 * Math.log10((sums[1] + 1) / (sums[0] + 1));
+    const changes = [];
+    this.voice.values.forEach((score, k) => {
+      const frame = [k * frameSize, (k + 1) * frameSize];
+      const original = energy(before.subarray(...frame));
+      if (score >= PAUSE_SCORE || original === 0) return;
+      changes.push(10 * Math.log10((energy(after.subarray(...frame)) + 1) / original));
+    });
+    if (changes.length < FEWEST_PAUSE_FRAMES) return null;
+    return changes.sort((a, b) => a - b)[changes.length >> 1];
   }
 }
