@@ -115,9 +115,9 @@ void gatedHiddenLayers(std::vector<float>& state, std::vector<float>& x, std::si
                        GatedWeights const& weights, NetworkScratch& scratch) {
     joinState(state, x, scratch);
     updateGate(x, weights, scratch);
-    plainHiddenLayers(
-        x, hidden, weights, scratch,
-        [&](std::vector<float> const& first) { blend<true>(state, first, scratch.gate); });
+    plainHiddenLayers(x, hidden, weights, scratch, [&](std::vector<float> const& first) {
+        blend<true>(state, first, scratch.gate);
+    });
 }
 
 void maskLayer(std::vector<float>& x, FeedForwardWeights const& weights, NetworkScratch& scratch) {
