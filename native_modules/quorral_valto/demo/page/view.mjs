@@ -32,6 +32,8 @@ function addTo(parent, className, text = '') {
 function setMeter(id, value, text) {
   const meter = element(id);
   meter.value = value;
+  const place = (meter.value - meter.min) / (meter.max - meter.min);
+  meter.style.setProperty('--fill', `${100 * place}%`);
   meter.setAttribute('aria-valuetext', text);
   element(`${id}-text`).value = text;
 }
