@@ -19,6 +19,8 @@ struct ShippedModel {
 inline constexpr ShippedModel kNoiseModels[] = {{"small_8k", "NC_small_8k.mvw"},
                                                 {"small_16k", "NC_small_16k.mvw"},
                                                 {"full", "c6.xs.f.ca03f4.mvw"}};
+inline constexpr ShippedModel kVoiceModel = {"voice", "VAD_weight.mvw"};
+inline constexpr ShippedModel kLevelModel = {"level", "noise_level_16k.mvw"};
 inline constexpr int kRates[] = {8000, 16000, 32000, 44100, 48000, 96000};
 
 // Where the shipped models are, unless MORVA_BENCH_MODELS names another folder.
@@ -32,11 +34,13 @@ inline void startEngine() {
     static bool const started = [] {
         std::wstring const folder = modelFolder().wstring();
         if (Morva_SDK_GlobalInit(folder.c_str(), 1) != 0) std::exit(1);
-        for (auto const& [name, file] : kNoiseModels) {
-            if (Morva_SDK_SetModel(std::filesystem::path(file).wstring().c_str(), name) != 0) {
-                std::exit(1);
-            }
-        }
+        auto const add = [](ShippedModel const& model) {
+            auto const file = std::filesystem::path(model.file).wstring();
+            if (Morva_SDK_SetModel(file.c_str(), model.name) != 0) std::exit(1);
+        };
+        for (auto const& model : kNoiseModels) add(model);
+        add(kVoiceModel);
+        add(kLevelModel);
         return true;
     }();
     static_cast<void>(started);

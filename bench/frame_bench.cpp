@@ -26,19 +26,31 @@ void cleanFrames(benchmark::State& state, char const* model, int rate, Sound kin
                            benchmark::Counter::kIsRate | benchmark::Counter::kInvert);
 }
 
-void openSession(benchmark::State& state) {
+// Opens and closes a session, whose model's shared parts are there already.
+void openNoiseSession(benchmark::State& state, char const* model) {
     startEngine();
-    for (auto _ : state) Session const session("full", 48000);
+    Session const first(model, 48000);
+    for (auto _ : state) Session const session(model, 48000);
 }
 
-void loadModel(benchmark::State& state) {
+template <auto create, auto close>
+void openValueSession(benchmark::State& state, char const* model) {
     startEngine();
-    std::ifstream file(modelFolder() / "c6.xs.f.ca03f4.mvw", std::ios::binary);
+    auto const open = [&] { return create(MORVA_RATE_48000, MORVA_FRAME_10_MS, model); };
+    void* const first = open();
+    for (auto _ : state) close(open());
+    close(first);
+}
+
+// From bytes in memory to a weight.
+void loadModel(benchmark::State& state, char const* name) {
+    std::ifstream file(modelFolder() / name, std::ios::binary);
     std::string const bytes{std::istreambuf_iterator<char>(file), {}};
     for (auto _ : state) {
         MORVA::WEIGHTS::Weight weight;
         benchmark::DoNotOptimize(weight.read(bytes.data(), bytes.size()));
     }
+    state.SetBytesProcessed(static_cast<std::int64_t>(state.iterations() * bytes.size()));
 }
 
 struct NamedSound {
@@ -63,8 +75,24 @@ constexpr NamedSound kSounds[] = {{"speech", Sound::speech},
             }
         }
     }
-    benchmark::RegisterBenchmark("session_open/full/48000", openSession);
-    benchmark::RegisterBenchmark("model_load/full", loadModel);
+    auto const load = [](ShippedModel const& model) {
+        std::string const name = std::string("model_load/") + model.name;
+        benchmark::RegisterBenchmark(name.c_str(), loadModel, model.file);
+    };
+    for (auto const& model : kNoiseModels) {
+        load(model);
+        std::string const name = std::string("session_open/") + model.name;
+        benchmark::RegisterBenchmark(name.c_str(), openNoiseSession, model.name);
+    }
+    load(kVoiceModel);
+    load(kLevelModel);
+    benchmark::RegisterBenchmark("session_open/voice",
+                                 openValueSession<Morva_VAD_CreateSession, Morva_VAD_CloseSession>,
+                                 kVoiceModel.name);
+    benchmark::RegisterBenchmark(
+        "session_open/level",
+        openValueSession<Morva_NoiseDB_CreateSession, Morva_NoiseDB_CloseSession>,
+        kLevelModel.name);
     return true;
 }();
 

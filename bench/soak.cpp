@@ -251,12 +251,6 @@ struct Progress {
     }
 };
 
-void startAll() {
-    startEngine();
-    Morva_SDK_SetModel(L"VAD_weight.mvw", "voice");
-    Morva_SDK_SetModel(L"noise_level_16k.mvw", "level");
-}
-
 void soak(std::string const& stateFile, double hours) {
     auto progress = Progress::load(stateFile);
     std::vector<std::unique_ptr<NoiseStream>> streams;
@@ -298,7 +292,7 @@ int main(int argc, char** argv) {
         std::puts("usage: morva_soak STATE_FILE HOURS");
         return 2;
     }
-    startAll();
+    startEngine();
     soak(argv[1], std::strtod(argv[2], nullptr));
     Morva_SDK_GlobalDestroy();
     return 0;

@@ -1,17 +1,23 @@
 // The stages of one 10 ms frame of the full model at 48000 Hz, each alone.
 #include <benchmark/benchmark.h>
 
+#include <cmath>
 #include <random>
+#include <string>
 
 #include "bench_engine.h"
 #include "bench_sound.h"
+#include "noise_canceller/feature_context.h"
+#include "noise_canceller/hop_pipeline.h"
+#include "noise_canceller/mask_shaper.h"
 #include "noise_canceller/network_weights.h"
 #include "noise_canceller/networks.h"
 #include "noise_canceller/noise_cleaner_generations.h"
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
 #include "noise_canceller/spectral_cleaner.h"
+#include "noise_canceller/spectral_kernels.h"
 #include "utils/fft.h"
-#include "utils/mat_mul.h"
+#include "utils/packed_matrix.h"
 #include "utils/resampler.h"
 #include "utils/vector_math.h"
 #include "weights/model_environment.h"
@@ -51,37 +57,41 @@ void network(benchmark::State& state) {
 }
 BENCHMARK(network);
 
-void layer(benchmark::State& state, CONTAINERS::Matrix const& matrix) {
-    std::vector<float> x(matrix.rows, 0.5f);
-    std::vector<float> bias(matrix.cols, 0.1f);
-    std::vector<float> out;
+// One matrix of the network with its bias; the counter says how fast its weights are read.
+using Packed = std::vector<CONTAINERS::PackedMatrix> NOISE_CANCELLER::PackedNetwork::*;
+
+void layer(benchmark::State& state, Packed list, std::size_t index) {
+    Full const full;
+    auto const& matrix = ((*full.params->packed).*list)[index];
+    std::vector<float> const x(matrix.rows(), 0.5f);
+    std::vector<float> const bias(matrix.cols(), 0.1f);
+    std::vector<float> out(matrix.cols());
     for (auto _ : state) {
-        UTIL_FUNCTIONS::matMulPlusB(x, matrix, bias, out);
+        matrix.affine(x.data(), bias.data(), out.data());
         benchmark::DoNotOptimize(out.data());
     }
+    std::size_t const size = matrix.isHalfPrecision() ? 2 : 4;
     state.SetBytesProcessed(static_cast<std::int64_t>(state.iterations()) *
-                            static_cast<std::int64_t>(matrix.data.size() * sizeof(float)));
+                            static_cast<std::int64_t>(matrix.rows() * matrix.cols() * size));
 }
 
-void layers(benchmark::State& state) {
+[[maybe_unused]] bool const layersRegistered = [] {
+    using NOISE_CANCELLER::PackedNetwork;
+    struct NamedList {
+        char const* name;
+        Packed list;
+    };
     Full const full;
-    auto const& p = *full.params;
-    switch (state.range(0)) {
-        case 0:
-            layer(state, p.weightGRU);
-            break;
-        case 1:
-            layer(state, p.weightNonLinear[0]);
-            break;
-        case 2:
-            layer(state, p.weightNonLinear[1]);
-            break;
-        default:
-            layer(state, p.weightNonLinear.back());
-            break;
+    for (auto const& [name, list] : {NamedList{"gate", &PackedNetwork::gates},
+                                     {"rectified", &PackedNetwork::nonLinear},
+                                     {"linear", &PackedNetwork::linear}}) {
+        for (std::size_t i = 0; i < ((*full.params->packed).*list).size(); ++i) {
+            std::string const title = std::string("layer/") + name + "/" + std::to_string(i);
+            benchmark::RegisterBenchmark(title.c_str(), layer, list, i);
+        }
     }
-}
-BENCHMARK(layers)->DenseRange(0, 3);
+    return true;
+}();
 
 void transformPair(benchmark::State& state) {
     auto const fft = UTILS::FFT::create(640);
@@ -104,6 +114,49 @@ void analysis(benchmark::State& state) {
     for (auto _ : state) cleaner.analyse(full.sound.data(), x);
 }
 BENCHMARK(analysis);
+
+// From spectrum to network input, without window and transform.
+void features(benchmark::State& state) {
+    Full full;
+    auto const& params = *full.params;
+    std::vector<std::complex<float>> spectrum(params.coefficientNumber);
+    for (auto& value : spectrum) value = {1e4f * full.noise(full.random), 0.0f};
+    NOISE_CANCELLER::FeatureContext context(params.previewFrames, params.bands.bands(),
+                                            10 * full.x.size());
+    std::vector<float> powers;
+    std::vector<float> x;
+    for (auto _ : state) {
+        NOISE_CANCELLER::NOISE_CLEANER_FUNCTIONS::calcRescaleAbsAndFiltr(spectrum, powers, 1.0f,
+                                                                         params);
+        params.bands.compress(powers);
+        for (float& value : powers) value = std::log(value + 1000.0f);
+        context.push(powers, params.mu, params.sd, x);
+        benchmark::DoNotOptimize(x.data());
+    }
+}
+BENCHMARK(features);
+
+void mask(benchmark::State& state) {
+    Full const full;
+    NOISE_CANCELLER::MaskShaper shaper(*full.params);
+    std::vector<float> const bands(full.params->bands.bands(), 0.7f);
+    for (auto _ : state) benchmark::DoNotOptimize(shaper.shape(bands).data());
+}
+BENCHMARK(mask);
+
+// Queues, overlap-add and delay of one frame, around a model that copies.
+void overlapAdd(benchmark::State& state) {
+    Full const full;
+    NOISE_CANCELLER::HopPipeline pipeline(full.params->pipelineShape());
+    std::vector<float> frame(full.params->step, 100.0f);
+    for (auto _ : state) {
+        pipeline.process(frame, [&](float const* in, std::vector<float>& out) {
+            out.assign(in, in + full.params->frameLength);
+        });
+        benchmark::DoNotOptimize(frame.data());
+    }
+}
+BENCHMARK(overlapAdd);
 
 void synthesis(benchmark::State& state) {
     Full full;
