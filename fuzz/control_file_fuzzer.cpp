@@ -49,14 +49,13 @@ void checkEntries(std::filesystem::path const& file) {
 
 extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size) {
     std::string const text(reinterpret_cast<char const*>(data), size);
-    checkEntries(folder().write("bare.cfg", text));
-    folder().write("model.cfg", "WEIGHT weight.mvw\n" + text);
+    checkEntries(folder().write("model.cfg", "WEIGHT weight.mvw\n" + text));
 
     auto const workingPath = folder().path().wstring();
     fuzz::Engine const engine(workingPath.c_str());
     if (Morva_SDK_SetModel(L"model.cfg", "model") != 0) return 0;
     fuzz::NcSession session(8000, 8000, 10, "model");
     fuzz::TestSignal signal;
-    for (int i = 0; session && i < 20; ++i) session.clean(signal.frame(session.inputSize()));
+    for (int i = 0; session && i < 10; ++i) session.clean(signal.frame(session.inputSize()));
     return 0;
 }

@@ -76,23 +76,28 @@ private:
     std::vector<float> output_;
 };
 
-// Seeded noise with a slow swell, -1..1.
+// Noise with a slow swell, -1..1: always the same, and made only once.
 class TestSignal {
 public:
-    explicit TestSignal(unsigned seed = 1) : engine_(seed) {}
-
     std::vector<float> frame(std::size_t size) {
-        std::uniform_real_distribution<float> noise(-1.0F, 1.0F);
+        static std::vector<float> const sound = make();
         std::vector<float> samples(size);
-        for (auto& sample : samples) {
-            sample = 0.6F * std::sin(static_cast<float>(time_++) * 0.001F) * noise(engine_);
-        }
+        for (auto& sample : samples) sample = sound[time_++ % sound.size()];
         return samples;
     }
 
 private:
-    std::mt19937 engine_;
-    unsigned time_ = 0;
+    static std::vector<float> make() {
+        std::mt19937 engine(1);
+        std::uniform_real_distribution<float> noise(-1.0F, 1.0F);
+        std::vector<float> sound(200'000);
+        for (std::size_t i = 0; i < sound.size(); ++i) {
+            sound[i] = 0.6F * std::sin(static_cast<float>(i) * 0.001F) * noise(engine);
+        }
+        return sound;
+    }
+
+    std::size_t time_ = 0;
 };
 
 }  // namespace fuzz
