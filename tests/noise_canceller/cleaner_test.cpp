@@ -153,6 +153,7 @@ protected:
                      << shape.previewFrames << ", L " << shape.layers << ", H " << shape.hidden
                      << ", G " << shape.gates << ", " << setup.parameters);
         auto const cleaner = makeCleaner(level ? 0 : GetParam(), setup.model, frameMs);
+        ASSERT_EQ(cleaner->getVersion(), shape.version);
         reference::Cleaner wanted(reference::Model(*setup.model->first, tunables, GetParam()),
                                   modelMs, frameMs);
         std::size_t const size = rateHz * frameMs / 1000;

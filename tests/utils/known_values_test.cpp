@@ -79,7 +79,8 @@ TEST(MeanEnergy, InitialEnergyCountsAsTheFirstActiveFrame) {
 // it out once more.
 TEST(Noise, TheOldestFrameCanBeTakenOutTwice) {
     Noise noise(2, 1);
-    noise.addNullFrameNoise();
+    float const silence = 0.0f;
+    noise.addFrameNoise(&silence, 1);
     noise.addNullFrameNoise();
     for (float const value : {4.0f, 8.0f}) {
         noise.addFrameNoiseRemoveBack(&value, 1);
