@@ -242,11 +242,11 @@ test('the microphone is heard live only when asked for', { skip }, async (t) => 
   const { page, finished, end } = await visit(t, { prelude: TAP });
   await page.click('#record');
   await recorded(page, 3);
-  assert.equal(await page.evaluate('loudness()'), 0);
+  assert.equal(await page.evaluate(() => globalThis.loudness()), 0);
   await page.check('#monitor');
-  await page.waitForFunction('loudness() > 0.01');
+  await page.waitForFunction(() => globalThis.loudness() > 0.01);
   await page.uncheck('#monitor');
-  await page.waitForFunction('loudness() === 0');
+  await page.waitForFunction(() => globalThis.loudness() === 0);
   await page.click('#record');
   await finished();
   end();
