@@ -8,7 +8,7 @@ import { Strip } from './strip.mjs';
 const LIVE_SECONDS = 10;
 const PITCHES = [250, 1000, 4000, 12000];
 const TICK_STEPS = [0.5, 1, 2, 5, 10, 20, 30, 60, 120];
-const MOST_TICKS = 11;
+const TICK_PIXELS = 60; // room for one label
 const SHORTEST_INTERVAL_MS = 30; // half of a usual screen's rate is smooth enough
 
 const element = (id) => document.getElementById(id);
@@ -112,7 +112,8 @@ export class View {
   }
 
   #drawTimes({ from, to }) {
-    const step = TICK_STEPS.find((seconds) => (to - from) / seconds <= MOST_TICKS) ?? 120;
+    const most = canvases[0].clientWidth / TICK_PIXELS;
+    const step = TICK_STEPS.find((seconds) => (to - from) / seconds <= most) ?? 120;
     const ticks = [];
     for (let at = Math.ceil(from / step) * step; at <= to; at += step) {
       const place = (at - from) / (to - from);
