@@ -22,7 +22,7 @@ from .spectra import Layout
 
 SPEECH_SPL = 79.0  # dB, level at which P.862 listens
 TRUSTED_EDGE_HZ = 7000.0  # of recordings without content above 8 kHz
-HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.1  # what such recordings may say about the noise above
+HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.3  # what such recordings may say about the noise above
 SYLLABLE_HOPS = 32
 # Fitted to P.862.2 scores of noisy and cleaned recordings (correlation 0.96): the frames and bands
 # here are not quite the standard's.

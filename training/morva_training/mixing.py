@@ -49,6 +49,8 @@ class Recipe:
     pause_share: float = 0.5
     pause_seconds: float = 0.5  # mean length
     speed_share: float = 0.25
+    noise_speed_share: float = 0.5
+    noise_speed: tuple[float, float] = (0.75, 1.35)
     whisper_share: float = 0.04
     full_band_share: float = 0.35
     boosted: tuple[str, ...] = IMPULSIVE  # noise categories drawn three times as often
@@ -217,7 +219,7 @@ class MixtureMaker:
             offset = int(self.rng.integers(max(1, clip.length - self.rate))) if self.rng.random() < 0.4 else 0
             piece = self.speech.read(clip, offset, self.count)
             if self.rng.random() < self.recipe.speed_share:
-                piece = self._speed(piece)
+                piece = self._speed(piece, 0.9, 1.1)
             piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
@@ -225,9 +227,9 @@ class MixtureMaker:
                 position += int(self.rng.exponential(self.recipe.pause_seconds) * self.rate)
         return out
 
-    def _speed(self, piece: np.ndarray) -> np.ndarray:
-        """Faster and higher, or slower and lower, by up to a tenth (linear interpolation)."""
-        factor = self.rng.uniform(0.9, 1.1)
+    def _speed(self, piece: np.ndarray, slowest: float, fastest: float) -> np.ndarray:
+        """Faster and higher, or slower and lower (linear interpolation)."""
+        factor = self.rng.uniform(slowest, fastest)
         points = np.arange(0, len(piece) - 1, factor)
         return np.interp(points, np.arange(len(piece)), piece).astype(np.float32)
 
@@ -259,8 +261,12 @@ class MixtureMaker:
         out = np.zeros(self.count, np.float32)
         offset = int(self.rng.integers(clip.length)) if self.rng.random() < 0.7 else 0
         position = 0
+        warped = self.rng.random() < self.recipe.noise_speed_share
         while position < self.count:
-            piece = self.noise.read(clip, offset, self.count - position)
+            piece = self.noise.read(clip, offset, self.count)
+            if warped:
+                piece = self._speed(piece, *self.recipe.noise_speed)
+            piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
             offset = 0
