@@ -4,6 +4,7 @@
 #include <cstring>
 
 #include "harness.h"
+#include "support/temp_dir.h"
 #include "support/weight_mutator.h"
 
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
@@ -11,6 +12,14 @@ extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, st
 namespace {
 
 constexpr int frames = 10;
+
+// Some inputs are read from a file, too.
+void checkFile(std::string const& bytes, bool registered) {
+    static test_support::TempDir const folder;
+    auto const file = folder.write("weight.mvw", bytes).wstring();
+    fuzz::require((Morva_SDK_SetModel(file.c_str(), "file") == 0) == registered,
+                  "a file is taken or refused as its bytes are");
+}
 
 void runNc(int inputRate, int outputRate, int durationMs) {
     fuzz::NcSession session(inputRate, outputRate, durationMs, "model");
@@ -46,7 +55,10 @@ void runLevel(int rate, int durationMs) {
 
 extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size) {
     fuzz::Engine const engine;
-    if (engine.setModel({reinterpret_cast<char const*>(data), size}, "model") != 0) return 0;
+    std::string const bytes(reinterpret_cast<char const*>(data), size);
+    bool const registered = engine.setModel(bytes, "model") == 0;
+    if (size % 8 == 0) checkFile(bytes, registered);
+    if (!registered) return 0;
     runNc(8000, 8000, 40);
     runNc(48000, 16000, 10);
     runVad(8000, 20);
