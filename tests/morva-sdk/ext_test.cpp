@@ -20,7 +20,7 @@ using test_support::randomVadWeight;
 
 // The linker sends every block that is resampled through here: --wrap of Resampler::resample.
 namespace {
-std::size_t resampledBlocks = 0;
+thread_local std::size_t resampledBlocks = 0;
 }
 extern "C" {
 unsigned __real__ZN5MORVA5UTILS9Resampler8resampleERKSt6vectorIfSaIfEERS4_(
