@@ -1,7 +1,6 @@
 // The stages of one 10 ms frame of the full model at 48000 Hz, each alone.
 #include <benchmark/benchmark.h>
 
-#include <cmath>
 #include <random>
 #include <string>
 
@@ -126,10 +125,7 @@ void features(benchmark::State& state) {
     std::vector<float> powers;
     std::vector<float> x;
     for (auto _ : state) {
-        NOISE_CANCELLER::NOISE_CLEANER_FUNCTIONS::calcRescaleAbsAndFiltr(spectrum, powers, 1.0f,
-                                                                         params);
-        params.bands.compress(powers);
-        for (float& value : powers) value = std::log(value + 1000.0f);
+        NOISE_CANCELLER::NOISE_CLEANER_FUNCTIONS::calcFeatures(spectrum, powers, 1.0f, params);
         context.push(powers, params.mu, params.sd, x);
         benchmark::DoNotOptimize(x.data());
     }

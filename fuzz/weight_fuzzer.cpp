@@ -5,7 +5,7 @@
 
 #include "harness.h"
 #include "support/temp_dir.h"
-#include "support/weight_mutator.h"
+#include "weight_mutator.h"
 
 extern "C" std::size_t LLVMFuzzerMutate(std::uint8_t* data, std::size_t size, std::size_t maxSize);
 

@@ -11,8 +11,6 @@ namespace {
 
 // Frames that the energy statistics and the running noise mean look back.
 constexpr std::size_t kStatisticsFrames = 10;
-// Keeps the logarithm of silent bands finite.
-constexpr float kFeatureOffset = 1000.0f;
 // Seconds of active frames that the energy gate and the level reference remember. The gate counts
 // model frames, the level reference hops.
 constexpr std::size_t kGateSeconds = 4;
@@ -89,9 +87,7 @@ void SpectralCleaner::analyse(float const* in, std::vector<float>& x) {
     UTIL_FUNCTIONS::multiply(in, analysis_->data(), windowed_.data(), windowed_.size());
     if (gate_) gate_->setCurrentData(windowed_);
     transform_->computeForward(windowed_, spectrum_);
-    NOISE_CLEANER_FUNCTIONS::calcRescaleAbsAndFiltr(spectrum_, features_, levelGain(in), params_);
-    params_.bands.compress(features_);
-    for (float& value : features_) value = std::log(value + kFeatureOffset);
+    NOISE_CLEANER_FUNCTIONS::calcFeatures(spectrum_, features_, levelGain(in), params_);
     if (noiseMean_) {
         noiseMean_->addFrameNoiseRemoveBack(features_.data(), features_.size());
         noiseMean_->calculateNoise();

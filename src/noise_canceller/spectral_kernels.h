@@ -1,4 +1,4 @@
-// Two small kernels that every noise cleaner runs. No state; any thread.
+// Small kernels that every noise cleaner runs. No state; any thread.
 #pragma once
 
 #include <complex>
@@ -13,6 +13,10 @@ namespace NOISE_CLEANER_FUNCTIONS {
 // Band power: out_k = (|X_k| gain)^2 for the bins FiltrBegin <= k < FiltrEnd.
 void calcRescaleAbsAndFiltr(std::vector<std::complex<float>> const& spectrum,
                             std::vector<float>& out, float gain, SpectralParams const& params);
+
+// Features: log(P_k + 1000) of the band powers P_k after compression, one value per band.
+void calcFeatures(std::vector<std::complex<float>> const& spectrum, std::vector<float>& out,
+                  float gain, SpectralParams const& params);
 
 // Peak limiter: scales the frame so that its most positive sample is the clip point when it is
 // above. Negative peaks are not considered.

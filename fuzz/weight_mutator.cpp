@@ -1,4 +1,4 @@
-#include "support/weight_mutator.h"
+#include "weight_mutator.h"
 
 #include <array>
 #include <cmath>
