@@ -5,6 +5,7 @@
 
 CLEAN is the speech in NOISY without its noise; the three files are mono, of one rate and length.
 """
+
 import sys
 
 import matplotlib

@@ -6,6 +6,7 @@ else is synthesised here from a fixed seed: a fan with its motor hum, a car pass
 
     scripts/make_demo_audio.py [FOLDER]
 """
+
 import pathlib
 import subprocess
 import sys

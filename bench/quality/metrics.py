@@ -1,4 +1,5 @@
 """Scores of one processed recording. Samples are floats, -1..1, mono; levels in dB."""
+
 from __future__ import annotations
 
 import sys

@@ -7,6 +7,7 @@ scored. `clean-*` pairs hold speech only (noisy = clean).
 
     python bench/quality/mixtures.py --store STORE --out FOLDER
 """
+
 from __future__ import annotations
 
 import argparse

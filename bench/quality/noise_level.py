@@ -6,6 +6,7 @@ Steady noises are white, pink and brown noise and the held-out recordings whose 
 less than 3 dB; each is scaled to several true levels. The value compared is the median of the
 reported levels after two seconds (16-bit scale, dB).
 """
+
 from __future__ import annotations
 
 import argparse

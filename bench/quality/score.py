@@ -7,6 +7,7 @@ noisy one, the pair counts for the no-harm figures instead. Means over the pairs
 PESQ (wide band), STOI, SI-SDR and its gain in dB, attenuation of the noise in pauses in dB, and
 for clean speech SI-SDR, PESQ and the change of level.
 """
+
 from __future__ import annotations
 
 import argparse

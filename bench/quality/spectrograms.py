@@ -5,6 +5,7 @@
 Speech and noise are held-out material; the whisper is synthesised by espeak-ng. Prints for every
 example the numbers that stand in its title.
 """
+
 from __future__ import annotations
 
 import argparse

@@ -5,6 +5,7 @@ A system is named on the command line:
     NAME=model.mvw       a noise model, run by the NumPy reference of the engine
     NAME=command         any program called as `command in.wav out.wav`
 """
+
 from __future__ import annotations
 
 import shlex

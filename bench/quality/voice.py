@@ -1,20 +1,30 @@
 """Scores voice-activity models on held-out mixtures and on sounds that must not pass for a voice.
 
-    python bench/quality/voice.py --pairs FOLDER --store STORE models/VAD_weight.mvw
+    python bench/quality/voice.py PAIRS --store STORE ours=models/VAD_weight.mvw "peer=some-program --flag"
 
-The recordings are taken to 8 kHz; labels come from the clean speech,
-frames that are neither voice nor silence are left out. Prints, for each frame length: the area
-under the ROC curve over all frames and over those further than 50 ms from where a voice starts or
-ends, the best F1, the F1 at score 0.5 (both over all). Then for 10 ms: how long after a word's
-start the score passes 0.5 (median and share within 30 ms, words that follow at least 0.3 s of
-silence), and the share of frames above 0.5 in recordings without any speech, by category.
-FOLDER is one that mixtures.py made, or any other with `noisy/` and `clean/`.
+A peer is called as `program in.wav` and prints what `morva vad --format csv` prints: a line with
+names, then rows that begin with a frame's start in seconds and its score. Its score holds for all
+blocks that its frame covers, so a peer with longer frames may look ahead to their ends.
+
+Labels come from the clean speech at 8 kHz; frames that are neither voice nor silence are left out.
+First, for each frame length: the area under the ROC curve over all frames and over those further
+than 50 ms from where a voice starts or ends, the best F1, the F1 at score 0.5 (both over all).
+Then, for 10 ms and each signal-to-noise ratio: the area under the curve, and how long after a
+word's start the score passes 0.5 (words after at least 0.3 s of silence). Last, the share of
+frames above 0.5 in recordings without any speech, by category.
+PAIRS is a folder that mixtures.py made, or any other with `noisy/` and `clean/`.
 """
+
 from __future__ import annotations
 
 import argparse
 import json
+import shlex
+import subprocess
+import tempfile
+from dataclasses import dataclass
 from pathlib import Path
+from typing import Callable
 
 import numpy as np
 import soundfile
@@ -22,23 +32,65 @@ import soundfile
 import metrics
 import systems  # noqa: F401  (makes the training package importable)
 from morva_training import mvw
-from morva_training.corpus import Store
+from morva_training.corpus import BASE_RATE, Store
 from morva_training.engine import VoiceModel
 from morva_training.voice import BLOCK, RATE, block_labels, frame_labels
 
 FOOLING = ("music", "keyboard", "mouse_click", "human_nonspeech", "animal", "dog_bark", "vacuum", "rain", "birds")
 COLLAR_BLOCKS = 5  # of 10 ms, on both sides of a start or end
-CLEAR_DB = 10  # mixtures at or above this SNR count for the onset
+
+Scorer = Callable[[np.ndarray, int, int], np.ndarray]  # samples, rate, blocks per frame -> score per frame
 
 
-def scores_of(weight: mvw.Weight, samples: np.ndarray, frame: int) -> np.ndarray:
-    model = VoiceModel(weight)
-    return np.array([model.score(samples[at : at + frame]) for at in range(0, len(samples) - frame + 1, frame)])
+def on_model_scale(samples: np.ndarray, rate: int) -> np.ndarray:
+    return np.clip(np.rint(metrics.at_rate(samples, rate, RATE) * 32768), -32768, 32767).astype(np.float32)
 
 
-def read_8k(path: Path) -> np.ndarray:
-    samples, rate = soundfile.read(path, dtype="float32", always_2d=True)
-    return np.clip(np.rint(metrics.at_rate(samples[:, 0], rate, RATE) * 32768), -32768, 32767).astype(np.float32)
+def from_weight(weight: mvw.Weight) -> Scorer:
+    def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
+        model, x, frame = VoiceModel(weight), on_model_scale(samples, rate), blocks * BLOCK
+        return np.array([model.score(x[at : at + frame]) for at in range(0, len(x) - frame + 1, frame)])
+
+    return scores
+
+
+def from_command(command: str) -> Scorer:
+    def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
+        with tempfile.TemporaryDirectory() as folder:
+            source = Path(folder) / "in.wav"
+            soundfile.write(source, samples, rate, "PCM_16")
+            printed = subprocess.run([*shlex.split(command), source], check=True, capture_output=True, text=True).stdout
+        rows = np.array([line.split(",")[:2] for line in printed.splitlines()[1:]], float)
+        starts = np.arange(len(samples) * 100 // rate) * 0.01
+        covering = np.searchsorted(rows[:, 0], starts + 0.005, side="right") - 1
+        return frame_labels(rows[np.maximum(covering, 0), 1], blocks)
+
+    return scores
+
+
+def parse(text: str) -> tuple[str, Scorer]:
+    name, _, rest = text.partition("=")
+    if not rest:
+        raise SystemExit(f"{text!r} is neither NAME=model.mvw nor NAME=command")
+    is_weight = rest.endswith(".mvw") and Path(rest).is_file()
+    return name, from_weight(mvw.read(Path(rest))) if is_weight else from_command(rest)
+
+
+@dataclass
+class Recording:
+    noisy: np.ndarray
+    rate: int
+    voice: np.ndarray  # per block
+    sure: np.ndarray
+    snr_db: float | None
+
+
+def near_an_edge(voice: np.ndarray) -> np.ndarray:
+    """Blocks within the collar around the label's changes."""
+    near = np.zeros(len(voice), bool)
+    for start in np.flatnonzero(np.diff(voice.astype(int))) + 1:
+        near[max(0, start - COLLAR_BLOCKS) : start + COLLAR_BLOCKS] = True
+    return near
 
 
 def onset_delays(scores: np.ndarray, voice: np.ndarray) -> list[float]:
@@ -52,71 +104,101 @@ def onset_delays(scores: np.ndarray, voice: np.ndarray) -> list[float]:
     return delays
 
 
-def near_an_edge(voice: np.ndarray) -> np.ndarray:
-    """Blocks within the collar around the label's changes."""
-    near = np.zeros(len(voice), bool)
-    for start in np.flatnonzero(np.diff(voice.astype(int))) + 1:
-        near[max(0, start - COLLAR_BLOCKS) : start + COLLAR_BLOCKS] = True
-    return near
-
-
-def score_pairs(folder: Path, weight: mvw.Weight, limit: int) -> str:
+def read_pairs(folder: Path, limit: int) -> list[Recording]:
     listing = folder / "pairs.json"
     snrs = {p["name"]: p["snr_db"] for p in json.loads(listing.read_text())} if listing.exists() else {}
     files = sorted((folder / "noisy").glob("*.wav"))
-    files = files[:: max(1, len(files) // limit)] if limit else files
-    material = [(f.stem, read_8k(f), *block_labels(read_8k(folder / "clean" / f.name))) for f in files]
-    lines = ["| frame | ROC-AUC | off the edges | best F1 | F1 at 0.5 |", "|---|---|---|---|---|"]
-    delays: list[float] = []
-    for blocks in (1, 2, 3, 4):
-        all_scores, all_voice, all_inner = [], [], []
-        for name, noisy, voice, sure in material:
-            scores = scores_of(weight, noisy, blocks * BLOCK)
-            label = frame_labels(voice, blocks)[: len(scores)]
-            clear = (frame_labels(sure, blocks)[: len(scores)] >= 1.0) & ((label == 0) | (label == 1))
-            all_scores.append(scores[clear])
-            all_voice.append(label[clear] > 0.5)
-            all_inner.append(frame_labels(near_an_edge(voice), blocks)[: len(scores)][clear] == 0)
-            if blocks == 1 and (snrs.get(name) is None or snrs[name] >= CLEAR_DB):
-                delays += onset_delays(scores, voice[: len(scores)])
-        scores, voice, inner = map(np.concatenate, (all_scores, all_voice, all_inner))
-        hits = ((scores > 0.5) & voice).sum()
-        at_half = 2 * hits / ((scores > 0.5).sum() + voice.sum())
-        lines.append(
-            f"| {10 * blocks} ms | {metrics.roc_auc(scores, voice):.4f} "
-            f"| {metrics.roc_auc(scores[inner], voice[inner]):.4f} "
-            f"| {metrics.best_f1(scores, voice)[0]:.4f} | {at_half:.4f} |"
-        )
-    if delays:
-        within = np.mean(np.array(delays) <= 30)
-        lines.append(f"\nonset: {len(delays)} words, median {np.median(delays):.0f} ms, within 30 ms {within:.0%}")
+    result = []
+    for file in files[:: max(1, len(files) // limit)] if limit else files:
+        noisy, rate = soundfile.read(file, dtype="float32", always_2d=True)
+        clean, clean_rate = soundfile.read(folder / "clean" / file.name, dtype="float32", always_2d=True)
+        labels = block_labels(on_model_scale(clean[:, 0], clean_rate))
+        result.append(Recording(noisy[:, 0], rate, *labels, snrs.get(file.stem)))
+    return result
+
+
+@dataclass
+class Judged:
+    """The frames of one recording that count."""
+
+    scores: np.ndarray
+    voice: np.ndarray
+    inner: np.ndarray
+
+
+def judged(scores: np.ndarray, recording: Recording, blocks: int) -> Judged:
+    label, sure, edge = (
+        frame_labels(x, blocks)[: len(scores)] for x in (recording.voice, recording.sure, near_an_edge(recording.voice))
+    )
+    scores = scores[: len(label)]
+    clear = (sure >= 1.0) & ((label == 0) | (label == 1))
+    return Judged(scores[clear], label[clear] > 0.5, edge[clear] == 0)
+
+
+def together(parts: list[Judged]) -> Judged:
+    return Judged(*(np.concatenate([getattr(p, name) for p in parts]) for name in ("scores", "voice", "inner")))
+
+
+def frame_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str:
+    lines = ["| system | frame | ROC-AUC | off the edges | best F1 | F1 at 0.5 |", "|---|---|---|---|---|---|"]
+    for name, scorer in systems_.items():
+        for blocks in (1, 2, 3, 4):
+            all_ = together([judged(scorer(r.noisy, r.rate, blocks), r, blocks) for r in recordings])
+            above = all_.scores > 0.5
+            at_half = 2 * (above & all_.voice).sum() / (above.sum() + all_.voice.sum())
+            lines.append(
+                f"| {name} | {10 * blocks} ms | {metrics.roc_auc(all_.scores, all_.voice):.4f} "
+                f"| {metrics.roc_auc(all_.scores[all_.inner], all_.voice[all_.inner]):.4f} "
+                f"| {metrics.best_f1(all_.scores, all_.voice)[0]:.4f} | {at_half:.4f} |"
+            )
     return "\n".join(lines)
 
 
-def false_alarms(store: Path, weight: mvw.Weight, split: str) -> str:
-    noise = Store(store, "noise", RATE)
-    lines = ["| sound without speech | recordings | frames above 0.5 |", "|---|---|---|"]
+def snr_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str:
+    lines = ["| system | SNR | ROC-AUC | words | median onset | within 30 ms |", "|---|---|---|---|---|---|"]
+    snrs = sorted({r.snr_db for r in recordings}, key=lambda snr: np.inf if snr is None else snr)
+    for name, scorer in systems_.items():
+        for snr in snrs:
+            some = [r for r in recordings if r.snr_db == snr]
+            scores = [scorer(r.noisy, r.rate, 1) for r in some]
+            all_ = together([judged(s, r, 1) for s, r in zip(scores, some)])
+            delays = np.array([d for s, r in zip(scores, some) for d in onset_delays(s, r.voice[: len(s)])])
+            onset = f"{np.median(delays):.0f} ms | {np.mean(delays <= 30):.0%}" if len(delays) else " | "
+            label = "clean" if snr is None else f"{snr:g} dB"
+            area = metrics.roc_auc(all_.scores, all_.voice)
+            lines.append(f"| {name} | {label} | {area:.4f} | {len(delays)} | {onset} |")
+    return "\n".join(lines)
+
+
+def false_alarms(store: Path, systems_: dict[str, Scorer], split: str) -> str:
+    noise = Store(store, "noise")
+    lines = ["| sound without speech | recordings | frames above 0.5, " + " | ".join(systems_) + " |"]
+    lines.append("|---|---|" + "---|" * len(systems_))
     for category in FOOLING:
         clips = [c for c in noise.of_split(split) if c.category == category]
         if not clips:
             continue
-        scores = np.concatenate([scores_of(weight, noise.read(c), BLOCK) for c in clips])
-        lines.append(f"| {category} | {len(clips)} | {np.mean(scores > 0.5):.1%} |")
+        shares = []
+        for scorer in systems_.values():
+            scores = np.concatenate([scorer(noise.read(c) / 32768, BASE_RATE, 1) for c in clips])
+            shares.append(f"{np.mean(scores > 0.5):.1%}")
+        lines.append(f"| {category} | {len(clips)} | " + " | ".join(shares) + " |")
     return "\n".join(lines)
 
 
 def main() -> None:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("weight", type=Path)
-    parser.add_argument("--pairs", type=Path, required=True, help="folder made by mixtures.py, or of the same form")
+    parser.add_argument("pairs", type=Path, help="folder made by mixtures.py, or of the same form")
+    parser.add_argument("systems", nargs="+", help="NAME=model.mvw or NAME=command")
     parser.add_argument("--store", type=Path, help="decoded audio, for the sounds without speech")
     parser.add_argument("--split", default="heldout")
     parser.add_argument("--limit", type=int, default=0)
     args = parser.parse_args()
-    weight = mvw.read(args.weight)
-    print(score_pairs(args.pairs, weight, args.limit))
+    chosen = dict(parse(text) for text in args.systems)
+    recordings = read_pairs(args.pairs, args.limit)
+    print(frame_table(chosen, recordings) + "\n\n" + snr_table(chosen, recordings))
     if args.store:
-        print("\n" + false_alarms(args.store, weight, args.split))
+        print("\n" + false_alarms(args.store, chosen, args.split))
 
 
 if __name__ == "__main__":

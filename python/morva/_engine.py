@@ -48,9 +48,7 @@ def failure(what: str) -> EngineError:
 
 def check_rate(rate: int) -> int:
     if rate not in RATES:
-        raise ValueError(
-            f"a rate of {rate} Hz is not supported; the engine takes {RATES}: resample first"
-        )
+        raise ValueError(f"a rate of {rate} Hz is not supported; the engine takes {RATES}: resample first")
     return int(rate)
 
 
@@ -98,9 +96,7 @@ def models() -> list[Model]:
         count = _library.library().MorvaExt_ListModels(None, 0)
         found = (_library.ModelInfo * count)()
         _library.library().MorvaExt_ListModels(found, count)
-    return [
-        Model(m.name.decode(), m.version.decode(), m.sampleRate, m.frameMs, m.size) for m in found
-    ]
+    return [Model(m.name.decode(), m.version.decode(), m.sampleRate, m.frameMs, m.size) for m in found]
 
 
 def version() -> str:

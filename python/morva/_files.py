@@ -22,9 +22,7 @@ _BLOCK_SECONDS = 1.0
 @contextmanager
 def _complete_or_absent(target: Path) -> Iterator[Path]:
     """A temporary file that takes the target's name only when its block ends well."""
-    handle, name = tempfile.mkstemp(
-        prefix=f".{target.stem}-", suffix=target.suffix, dir=target.parent
-    )
+    handle, name = tempfile.mkstemp(prefix=f".{target.stem}-", suffix=target.suffix, dir=target.parent)
     os.close(handle)
     try:
         yield Path(name)
@@ -56,17 +54,12 @@ def denoise_file(
             "model": model,
             "attenuation_limit_db": attenuation_limit_db,
         }
-        streams = [
-            stack.enter_context(Denoiser(reader.samplerate, **options))
-            for _ in range(reader.channels)
-        ]
+        streams = [stack.enter_context(Denoiser(reader.samplerate, **options)) for _ in range(reader.channels)]
         unfinished = stack.enter_context(_complete_or_absent(target))
         kind = target.suffix[1:].upper()
         subtype = reader.subtype if soundfile.check_format(kind, reader.subtype) else None
         writer = stack.enter_context(
-            soundfile.SoundFile(
-                unfinished, "w", reader.samplerate, reader.channels, subtype, format=kind
-            )
+            soundfile.SoundFile(unfinished, "w", reader.samplerate, reader.channels, subtype, format=kind)
         )
         bar = stack.enter_context(
             tqdm(
@@ -77,9 +70,7 @@ def denoise_file(
                 desc=Path(source).name,
             )
         )
-        for block in reader.blocks(
-            int(reader.samplerate * _BLOCK_SECONDS), dtype="float32", always_2d=True
-        ):
+        for block in reader.blocks(int(reader.samplerate * _BLOCK_SECONDS), dtype="float32", always_2d=True):
             writer.write(np.stack([s.push(block[:, c]) for c, s in enumerate(streams)], axis=1))
             bar.update(len(block))
         writer.write(np.stack([s.flush() for s in streams], axis=1))

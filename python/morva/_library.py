@@ -52,9 +52,7 @@ def _path() -> str:
     if chosen:
         return chosen
     bundled = BUNDLED / "libmorva.so"
-    return (
-        str(bundled) if bundled.exists() else ctypes.util.find_library("morva") or "libmorva.so.1"
-    )
+    return str(bundled) if bundled.exists() else ctypes.util.find_library("morva") or "libmorva.so.1"
 
 
 @functools.cache

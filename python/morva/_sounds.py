@@ -29,16 +29,12 @@ def denoise(
         raise TypeError(f"samples are int16 or floating point, not {given.dtype}")
     cleaned = np.empty_like(channels)
     for c in range(channels.shape[1]):
-        with Denoiser(
-            rate, frame_ms=frame_ms, model=model, attenuation_limit_db=attenuation_limit_db
-        ) as stream:
+        with Denoiser(rate, frame_ms=frame_ms, model=model, attenuation_limit_db=attenuation_limit_db) as stream:
             cleaned[:, c] = np.concatenate([stream.push(channels[:, c]), stream.flush()])
     return cleaned.reshape(given.shape)
 
 
-def _per_frame(
-    stream: Any, sound: npt.ArrayLike, one: Callable[[Sound], float]
-) -> npt.NDArray[np.float32]:
+def _per_frame(stream: Any, sound: npt.ArrayLike, one: Callable[[Sound], float]) -> npt.NDArray[np.float32]:
     given = np.asarray(sound)
     if given.dtype == np.int16:
         given = given / np.float32(32768)
@@ -49,9 +45,7 @@ def _per_frame(
     return np.array([one(frame) for frame in padded.reshape(-1, size)], np.float32)
 
 
-def voice(
-    sound: npt.ArrayLike, rate: int, *, frame_ms: int = 10, model: str | None = None
-) -> npt.NDArray[np.float32]:
+def voice(sound: npt.ArrayLike, rate: int, *, frame_ms: int = 10, model: str | None = None) -> npt.NDArray[np.float32]:
     """Voice scores, 0..1, one per frame; channels are averaged, the last frame is filled with zeros."""
     with VoiceDetector(rate, frame_ms=frame_ms, model=model) as stream:
         return _per_frame(stream, sound, stream.frame)

@@ -42,9 +42,7 @@ class _Session:
         if not handle:
             raise _engine.failure(f"{model} cannot be used")
         self._handle = handle
-        self._closer = weakref.finalize(
-            self, getattr(library(), f"Morva_{kind}_CloseSession"), handle
-        )
+        self._closer = weakref.finalize(self, getattr(library(), f"Morva_{kind}_CloseSession"), handle)
         self._closer.atexit = False  # the engine closes what is open when it ends
 
     def close(self) -> None:
@@ -80,9 +78,7 @@ class Denoiser(_Session):
         model: str | None = None,
         attenuation_limit_db: float = math.inf,
     ) -> None:
-        super().__init__(
-            "NC", rate, frame_ms, model or _engine.cleaning_model(_engine.check_rate(rate))
-        )
+        super().__init__("NC", rate, frame_ms, model or _engine.cleaning_model(_engine.check_rate(rate)))
         self.latency: int = library().MorvaExt_SessionLatencySamples(self._handle)
         self._skip = self.latency
         self._taken = self._given = 0
@@ -154,9 +150,7 @@ class VoiceDetector(_Session):
     def frame(self, frame: Sound) -> float:
         """Voice score of one frame, 0..1."""
         pcm = np.ascontiguousarray(to_pcm16(frame))
-        score = library().Morva_VAD_FrameInt16(
-            self._live(), _pointer(pcm, ctypes.c_short), pcm.size
-        )
+        score = library().Morva_VAD_FrameInt16(self._live(), _pointer(pcm, ctypes.c_short), pcm.size)
         if not 0.0 <= score <= 1.0:
             raise _engine.failure("no voice score")
         return score
@@ -173,6 +167,4 @@ class NoiseLevelMeter(_Session):
         if frame.shape != (self.frame_size,):
             raise ValueError(f"a frame has {self.frame_size} samples, not shape {frame.shape}")
         pcm = np.ascontiguousarray(to_pcm16(frame))
-        return library().Morva_NoiseDB_FrameInt16(
-            self._live(), _pointer(pcm, ctypes.c_short), pcm.size
-        )
+        return library().Morva_NoiseDB_FrameInt16(self._live(), _pointer(pcm, ctypes.c_short), pcm.size)

@@ -149,13 +149,9 @@ def main(arguments: list[str] | None = None) -> int:
     parser.add_argument("inputs", nargs="+", type=Path, help="sound files and folders")
     parser.add_argument("-o", "--output", required=True, type=Path, help="folder of the results")
     parser.add_argument("--scheduler", help="address of a Dask scheduler; without it, this machine")
-    parser.add_argument(
-        "--workers", type=int, default=os.cpu_count(), help="processes on this machine"
-    )
+    parser.add_argument("--workers", type=int, default=os.cpu_count(), help="processes on this machine")
     parser.add_argument("--model", help="shipped model's file name or path of a weight file")
-    parser.add_argument(
-        "--frame", type=int, default=10, choices=(10, 20, 30, 40), help="milliseconds"
-    )
+    parser.add_argument("--frame", type=int, default=10, choices=(10, 20, 30, 40), help="milliseconds")
     parser.add_argument("--attenuation-limit", type=float, default=math.inf, help="decibels")
     parser.add_argument("--quiet", action="store_true", help="no progress bar")
     options = parser.parse_args(arguments)

@@ -1,4 +1,5 @@
 """The program under test and files for it. MORVA_BUILD names the build folder."""
+
 import os
 import pathlib
 import subprocess

@@ -1,4 +1,5 @@
 """morva denoise on real files: what comes out has the place, length, shape and format of what went in."""
+
 import itertools
 import os
 import pathlib
@@ -75,9 +76,14 @@ def test_channels_do_not_mix(morva, model, recording, tmp_path, channels, rate):
 FORMATS = [("wav", s) for s in ("PCM_U8", "PCM_16", "PCM_24", "PCM_32", "FLOAT", "DOUBLE", "ULAW")]
 FORMATS += [("flac", s) for s in ("PCM_S8", "PCM_16", "PCM_24")] + [("ogg", "VORBIS")]
 NEAREST = {  # where the container has no such sample type
-    ("flac", "PCM_U8"): "PCM_S8", ("flac", "PCM_32"): "PCM_24", ("flac", "FLOAT"): "PCM_24",
-    ("flac", "DOUBLE"): "PCM_24", ("flac", "ULAW"): "PCM_16", ("flac", "VORBIS"): "PCM_16",
-    ("wav", "PCM_S8"): "PCM_U8", ("wav", "VORBIS"): "PCM_16",
+    ("flac", "PCM_U8"): "PCM_S8",
+    ("flac", "PCM_32"): "PCM_24",
+    ("flac", "FLOAT"): "PCM_24",
+    ("flac", "DOUBLE"): "PCM_24",
+    ("flac", "ULAW"): "PCM_16",
+    ("flac", "VORBIS"): "PCM_16",
+    ("wav", "PCM_S8"): "PCM_U8",
+    ("wav", "VORBIS"): "PCM_16",
 }
 
 
@@ -120,9 +126,17 @@ def test_tags_are_kept(morva, model, tmp_path):
         assert file.title == "Interview 7"
 
 
-@pytest.mark.parametrize(("rate", "name"), [(8000, "NC_small_8k"), (4000, "NC_small_8k"), (11025, "NC_small_16k"),
-                                            (16000, "NC_small_16k"), (22050, "c6.xs.f.ca03f4"),
-                                            (96000, "c6.xs.f.ca03f4")])
+@pytest.mark.parametrize(
+    ("rate", "name"),
+    [
+        (8000, "NC_small_8k"),
+        (4000, "NC_small_8k"),
+        (11025, "NC_small_16k"),
+        (16000, "NC_small_16k"),
+        (22050, "c6.xs.f.ca03f4"),
+        (96000, "c6.xs.f.ca03f4"),
+    ],
+)
 def test_the_shipped_model_follows_the_rate(morva, recording, tmp_path, rate, name):
     source = recording(np.zeros(rate // 10), rate)
     done = morva("denoise", source, "-o", tmp_path / "out.wav", "--models", SOURCE / "models")
@@ -133,8 +147,9 @@ def test_the_shipped_model_follows_the_rate(morva, recording, tmp_path, rate, na
 def test_the_bundled_recording_gets_cleaner(morva, tmp_path):
     audio = SOURCE / "examples/audio"
     morva("denoise", audio / "noisy.flac", tmp_path / "out.flac")
-    noisy, clean, cleaned = (soundfile.read(p)[0] for p in (audio / "noisy.flac", audio / "clean.flac",
-                                                            tmp_path / "out.flac"))
+    noisy, clean, cleaned = (
+        soundfile.read(p)[0] for p in (audio / "noisy.flac", audio / "clean.flac", tmp_path / "out.flac")
+    )
     silent = np.convolve(clean**2, np.ones(4800), "same") < 1e-6
     assert silent.mean() > 0.1
     noise_before, noise_after = np.mean(noisy[silent] ** 2), np.mean(cleaned[silent] ** 2)
@@ -174,8 +189,10 @@ def test_names_outside_ascii(morva, model, recording, tmp_path):
 
 
 def test_folder_keeps_its_structure_and_names_every_failure(morva, model, recording, tmp_path):
-    names = [f"{folder}take{i}.{ending}" for i, (folder, ending) in
-             enumerate(itertools.product(["", "a/", "a/b/"], ["wav", "flac", "ogg"]))]
+    names = [
+        f"{folder}take{i}.{ending}"
+        for i, (folder, ending) in enumerate(itertools.product(["", "a/", "a/b/"], ["wav", "flac", "ogg"]))
+    ]
     sounds = {name: speechlike(16000, 0.2, seed=i) for i, name in enumerate(names)}
     for name, sound in sounds.items():
         recording(sound, 16000, "in/" + name)
@@ -205,6 +222,7 @@ def test_several_files_give_the_same_as_one_by_one(morva, recording, tmp_path):
 
 def write_bad_models(folder: pathlib.Path):
     from weights import encode, loudness_voice
+
     (folder / "text.mvw").write_text("this is not a model")
     (folder / "empty.mvw").write_bytes(b"")
     (folder / "voice.mvw").write_bytes(encode(loudness_voice()))
@@ -213,36 +231,39 @@ def write_bad_models(folder: pathlib.Path):
     (folder / "half.cfg").write_text("WEIGHT\n")
 
 
-@pytest.mark.parametrize(("arguments", "text"), [
-    (["in.wav"], "name one input and one output"),
-    (["in.wav", "other.wav", "out.wav"], "name one input and one output"),
-    (["missing.wav", "out.wav"], "missing.wav: no such file"),
-    (["notes.txt", "out.wav"], "notes.txt: cannot be read"),
-    (["cut.flac", "out.wav"], "cut.flac"),
-    (["fast.wav", "out.wav"], "192000 Hz is not supported"),
-    (["in.wav", "in.wav"], "is an input as well"),
-    (["in.wav", "link.wav"], "is an input as well"),
-    (["in.wav", "./x/../in.wav"], "is an input as well"),
-    (["in.wav", "folder"], "folder: is a folder"),
-    (["folder", "out.wav"], "folder: is a folder"),
-    (["folder", "-o", "out"], "no .wav, .flac or .ogg file"),
-    (["in.wav", "missing/out.wav"], "missing/out.wav: cannot be written"),
-    (["in.wav", "out.mp3"], "ends in .wav, .flac or .ogg"),
-    (["in.wav", "device.wav"], "not a regular file"),
-    (["in.wav", "other.wav", "-o", "notes.txt"], "notes.txt: is a file"),
-    (["in.wav", "sub/in.wav", "-o", "out"], "two inputs would be written"),
-    (["in.wav", "out.wav", "--model", "missing.mvw"], "missing.mvw: no such file"),
-    (["in.wav", "out.wav", "--model", "notes.txt"], "ends in .mvw or .cfg"),
-    (["in.wav", "out.wav", "--model", "folder"], "is a folder"),
-    (["in.wav", "out.wav", "--model", "text.mvw"], "text.mvw"),
-    (["in.wav", "out.wav", "--model", "empty.mvw"], "empty.mvw"),
-    (["in.wav", "out.wav", "--model", "cut.mvw"], "cut.mvw"),
-    (["in.wav", "out.wav", "--model", "voice.mvw"], "Unsupported weight version"),
-    (["in.wav", "out.wav", "--model", "half.cfg"], "half.cfg"),
-    (["in.wav", "out.wav", "--control", "missing.cfg"], "missing.cfg: no such file"),
-    (["in.wav", "out.wav", "--models", "folder"], "no such file"),
-    (["in.wav", "out.wav", "--frame", "15"], "--frame"),
-])
+@pytest.mark.parametrize(
+    ("arguments", "text"),
+    [
+        (["in.wav"], "name one input and one output"),
+        (["in.wav", "other.wav", "out.wav"], "name one input and one output"),
+        (["missing.wav", "out.wav"], "missing.wav: no such file"),
+        (["notes.txt", "out.wav"], "notes.txt: cannot be read"),
+        (["cut.flac", "out.wav"], "cut.flac"),
+        (["fast.wav", "out.wav"], "192000 Hz is not supported"),
+        (["in.wav", "in.wav"], "is an input as well"),
+        (["in.wav", "link.wav"], "is an input as well"),
+        (["in.wav", "./x/../in.wav"], "is an input as well"),
+        (["in.wav", "folder"], "folder: is a folder"),
+        (["folder", "out.wav"], "folder: is a folder"),
+        (["folder", "-o", "out"], "no .wav, .flac or .ogg file"),
+        (["in.wav", "missing/out.wav"], "missing/out.wav: cannot be written"),
+        (["in.wav", "out.mp3"], "ends in .wav, .flac or .ogg"),
+        (["in.wav", "device.wav"], "not a regular file"),
+        (["in.wav", "other.wav", "-o", "notes.txt"], "notes.txt: is a file"),
+        (["in.wav", "sub/in.wav", "-o", "out"], "two inputs would be written"),
+        (["in.wav", "out.wav", "--model", "missing.mvw"], "missing.mvw: no such file"),
+        (["in.wav", "out.wav", "--model", "notes.txt"], "ends in .mvw or .cfg"),
+        (["in.wav", "out.wav", "--model", "folder"], "is a folder"),
+        (["in.wav", "out.wav", "--model", "text.mvw"], "text.mvw"),
+        (["in.wav", "out.wav", "--model", "empty.mvw"], "empty.mvw"),
+        (["in.wav", "out.wav", "--model", "cut.mvw"], "cut.mvw"),
+        (["in.wav", "out.wav", "--model", "voice.mvw"], "Unsupported weight version"),
+        (["in.wav", "out.wav", "--model", "half.cfg"], "half.cfg"),
+        (["in.wav", "out.wav", "--control", "missing.cfg"], "missing.cfg: no such file"),
+        (["in.wav", "out.wav", "--models", "folder"], "no such file"),
+        (["in.wav", "out.wav", "--frame", "15"], "--frame"),
+    ],
+)
 def test_errors_are_told_and_leave_nothing_behind(morva, model, recording, tmp_path, arguments, text):
     recording(np.zeros(1600), 16000)
     recording(np.zeros(1600), 16000, "other.wav")
@@ -274,6 +295,7 @@ def test_progress_bar_only_on_a_terminal(morva, model, recording, tmp_path):
 
     import pty
     import subprocess
+
     leader, follower = pty.openpty()
     process = subprocess.Popen([BUILD / "morva", *map(str, arguments)], stderr=follower)
     os.close(follower)

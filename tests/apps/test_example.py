@@ -1,4 +1,5 @@
 """The C example cleans a raw stream and leaves a model's faults to the caller."""
+
 import subprocess
 
 import numpy as np

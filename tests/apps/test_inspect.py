@@ -1,4 +1,5 @@
 """morva inspect: the facts of a weight file, compared with how it was written."""
+
 import json
 import math
 
@@ -17,8 +18,10 @@ def facts(morva, path, *options, **more):
 def test_values_are_described_as_written(morva, tmp_path, seed):
     rng = np.random.default_rng(seed)
     kinds = [
-        lambda: float(np.float32(rng.standard_normal())), lambda: int(rng.integers(-1000, 1000)),
-        lambda: "".join(rng.choice(list("abc äöü<\"\\\n"), 5)), lambda: rng.standard_normal(rng.integers(1, 9)),
+        lambda: float(np.float32(rng.standard_normal())),
+        lambda: int(rng.integers(-1000, 1000)),
+        lambda: "".join(rng.choice(list('abc äöü<"\\\n'), 5)),
+        lambda: rng.standard_normal(rng.integers(1, 9)),
         lambda: rng.standard_normal(rng.integers(1, 9, 2)),
         lambda: [rng.standard_normal(n) for n in rng.integers(1, 5, 3)],
         lambda: [rng.standard_normal(rng.integers(1, 5, 2)) for _ in range(2)],
@@ -42,8 +45,12 @@ def test_values_are_described_as_written(morva, tmp_path, seed):
         parts = value if many else [value]
         if not isinstance(value, float):
             assert entry["shape"] == " ".join("x".join(map(str, part.shape)) for part in parts)
-            assert entry["type"] == {(False, 1): "vector", (False, 2): "matrix", (True, 1): "vectors",
-                                     (True, 2): "matrices"}[many, parts[0].ndim]
+            assert (
+                entry["type"]
+                == {(False, 1): "vector", (False, 2): "matrix", (True, 1): "vectors", (True, 2): "matrices"}[
+                    many, parts[0].ndim
+                ]
+            )
             arrays += sum(part.size for part in parts)
         numbers = np.concatenate([np.ravel(part) for part in parts]).astype("f4").astype(float)
         for name, expected in [("min", numbers.min()), ("max", numbers.max()), ("mean", numbers.mean())]:

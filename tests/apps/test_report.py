@@ -1,4 +1,5 @@
 """morva report in a real browser: every plot is drawn, both sounds play, the console stays silent."""
+
 import shutil
 import urllib.parse
 
@@ -38,12 +39,24 @@ def browser(tmp_path_factory):
     from selenium import webdriver
     from selenium.webdriver.chrome.options import Options
     from selenium.webdriver.chrome.service import Service
+
     options = Options()
     options.binary_location = BROWSER
     profile = tmp_path_factory.mktemp("profile")
-    for flag in ("headless", "no-sandbox", "disable-gpu", "disable-quic", "no-first-run", "disable-dev-shm-usage",
-                 "disable-background-networking", "disable-component-update", "disable-sync", "window-size=1100,1300",
-                 "autoplay-policy=no-user-gesture-required", f"user-data-dir={profile}"):
+    for flag in (
+        "headless",
+        "no-sandbox",
+        "disable-gpu",
+        "disable-quic",
+        "no-first-run",
+        "disable-dev-shm-usage",
+        "disable-background-networking",
+        "disable-component-update",
+        "disable-sync",
+        "window-size=1100,1300",
+        "autoplay-policy=no-user-gesture-required",
+        f"user-data-dir={profile}",
+    ):
         options.add_argument("--" + flag)
     options.set_capability("goog:loggingPrefs", {"browser": "ALL"})
     driver = webdriver.Chrome(service=Service(DRIVER), options=options)
@@ -63,21 +76,32 @@ def text_of(browser, name):
 
 
 def plays(browser, name):
-    return browser.execute_async_script("""
+    return browser.execute_async_script(
+        """
         const [name, done] = arguments, audio = document.getElementById(name);
         audio.addEventListener("timeupdate", () => audio.currentTime > 0 && done([audio.duration, audio.error]));
         audio.muted = true;
-        audio.play().catch((error) => done(String(error)));""", name)
+        audio.play().catch((error) => done(String(error)));""",
+        name,
+    )
 
 
 @pytest.fixture
 def full_page(morva, model, recording, tmp_path):
     sound = speechlike(48000, 2.0, seed=5)[:, 0]
     sound[: 48000 // 2] = 0
-    source = recording(sound, 48000, "a <b> & \"c\" </script> äö.wav")
-    morva("report", source, tmp_path / "page.html", "--model", model(constant_mask(16000, 20, 0.0)),
-          "--vad-model", model(loudness_voice(), "voice.mvw"),
-          "--level-model", model(constant_mask(16000, 20, 0.0, "0.0.5"), "level.mvw"))
+    source = recording(sound, 48000, 'a <b> & "c" </script> äö.wav')
+    morva(
+        "report",
+        source,
+        tmp_path / "page.html",
+        "--model",
+        model(constant_mask(16000, 20, 0.0)),
+        "--vad-model",
+        model(loudness_voice(), "voice.mvw"),
+        "--level-model",
+        model(constant_mask(16000, 20, 0.0, "0.0.5"), "level.mvw"),
+    )
     return tmp_path / "page.html", source
 
 
@@ -126,9 +150,17 @@ def test_the_page_is_self_contained_and_holds_the_sound(morva, model, recording,
     import base64
     import io
     import re
+
     sound = speechlike(16000, 0.5, seed=1)[:, 0]
-    morva("report", recording(sound, 16000), tmp_path / "page.html", "--model", model(constant_mask(16000)),
-          "--models", tmp_path)
+    morva(
+        "report",
+        recording(sound, 16000),
+        tmp_path / "page.html",
+        "--model",
+        model(constant_mask(16000)),
+        "--models",
+        tmp_path,
+    )
     page = (tmp_path / "page.html").read_text()
     assert not re.search(r"""(?:src|href)=["'](?!data:)""", page)
     assert "http" not in re.sub(r"http-equiv", "", page)
@@ -140,15 +172,29 @@ def test_the_page_is_self_contained_and_holds_the_sound(morva, model, recording,
 
 def test_only_the_first_seconds_of_a_long_file(morva, model, recording, tmp_path):
     source = recording(np.zeros(16000 * 3), 16000)
-    done = morva("report", source, tmp_path / "p.html", "--model", model(constant_mask(16000)), "--max-seconds", 1,
-                 "--models", tmp_path)
+    done = morva(
+        "report",
+        source,
+        tmp_path / "p.html",
+        "--model",
+        model(constant_mask(16000)),
+        "--max-seconds",
+        1,
+        "--models",
+        tmp_path,
+    )
     assert "first 1 s" in done.stderr
 
 
-@pytest.mark.parametrize(("arguments", "text"), [
-    (["in.wav", "in.wav"], "is the input"), (["in.wav", "no/page.html"], "cannot be written"),
-    (["none.wav", "p.html"], "no such file"), (["in.wav", "p.html", "--vad-model", "none.mvw"], "none.mvw"),
-])
+@pytest.mark.parametrize(
+    ("arguments", "text"),
+    [
+        (["in.wav", "in.wav"], "is the input"),
+        (["in.wav", "no/page.html"], "cannot be written"),
+        (["none.wav", "p.html"], "no such file"),
+        (["in.wav", "p.html", "--vad-model", "none.mvw"], "none.mvw"),
+    ],
+)
 def test_errors(morva, model, recording, tmp_path, arguments, text):
     recording(np.zeros(1600), 16000)
     done = morva("report", *arguments, "--model", model(constant_mask(16000)), cwd=tmp_path, fails=True)

@@ -1,4 +1,5 @@
 """morva vad and morva level, with models whose answer can be told beforehand."""
+
 import csv
 import io
 import json
@@ -59,7 +60,9 @@ def test_csv_and_text_tell_the_same_as_json(morva, model, recording, tmp_path):
     table = rows(morva(*arguments, "--format", "csv").stdout)
     assert [float(r["score"]) for r in table] == pytest.approx(page["scores"], abs=1e-6)
     assert [float(r["time_s"]) for r in table] == pytest.approx(np.arange(len(table)) / 100)
-    spoken = [any(s["start_s"] <= t < s["end_s"] for s in page["segments"]) for t in np.arange(len(table)) / 100 + 0.005]
+    spoken = [
+        any(s["start_s"] <= t < s["end_s"] for s in page["segments"]) for t in np.arange(len(table)) / 100 + 0.005
+    ]
     assert [r["speech"] == "1" for r in table] == spoken
     text = morva(*arguments).stdout.splitlines()
     assert len(text) == len(page["segments"]) + 2
@@ -87,7 +90,9 @@ def test_what_is_removed_is_the_level(morva, model, recording, rate, level):
     second = slice(rate, 2 * rate)
     noise *= 10 ** (level / 20) / np.sqrt(np.mean(noise[second] ** 2))
     source = recording(noise, rate, subtype="FLOAT")
-    table = rows(morva("level", source, "--model", model(constant_mask(16000, 20, 0.0, "0.0.5")), "--format", "csv").stdout)
+    table = rows(
+        morva("level", source, "--model", model(constant_mask(16000, 20, 0.0, "0.0.5")), "--format", "csv").stdout
+    )
     heard = [10 ** (float(r["level_dbfs"]) / 10) for r in table if 1 <= float(r["time_s"]) < 2]
     assert 10 * np.log10(np.mean(heard)) == pytest.approx(level, abs=0.5)
     for r in table:
@@ -115,9 +120,14 @@ def test_errors(morva, model, recording, tmp_path, command):
     with open("/dev/full", "w") as full:
         import subprocess
         from conftest import BUILD
+
         weight = model(constant_mask(16000, 20, 1.0, "0.0.5"), "level.mvw") if command == "level" else good
-        done = subprocess.run([BUILD / "morva", command, source, "--model", weight, "--format", "csv"],
-                              stdout=full, stderr=subprocess.PIPE, text=True)
+        done = subprocess.run(
+            [BUILD / "morva", command, source, "--model", weight, "--format", "csv"],
+            stdout=full,
+            stderr=subprocess.PIPE,
+            text=True,
+        )
     assert done.returncode == 1 and "standard output" in done.stderr
 
 

@@ -1,4 +1,5 @@
 """Small weight files for the tests: networks whose answer is known without running them."""
+
 import struct
 
 import numpy as np
@@ -39,21 +40,34 @@ def constant_mask(rate: int, frame_ms: int = 20, mask: float = 1.0, version: str
     bins, hidden = length // 2 + 1, 2
     key = "v" + version.replace(".", "_")
     values = {
-        "Version": version, "SampleRate": rate, "FrameLength": length, "Step": length // 2,
-        "ModelName": f"constant {mask:g}", "TimeStamp": f"{rate}-{frame_ms}-{mask:g}",
-        "FiltrBegin": 0, "FiltrEnd": bins, "PreviewFrames": 1, "CoefficientNumber": bins,
+        "Version": version,
+        "SampleRate": rate,
+        "FrameLength": length,
+        "Step": length // 2,
+        "ModelName": f"constant {mask:g}",
+        "TimeStamp": f"{rate}-{frame_ms}-{mask:g}",
+        "FiltrBegin": 0,
+        "FiltrEnd": bins,
+        "PreviewFrames": 1,
+        "CoefficientNumber": bins,
         f"CONTROL_MORVA_COMPRESS_RATE_{key}": 0,
-        "MU": np.zeros(bins), "SD": np.ones(bins),
-        "WeightGRU": np.zeros((hidden + bins, hidden)), "BaesGRU": np.zeros(hidden),
-        "WeightLinear": [np.zeros((hidden + bins, hidden))], "BaesLinear": [np.zeros(hidden)],
+        "MU": np.zeros(bins),
+        "SD": np.ones(bins),
+        "WeightGRU": np.zeros((hidden + bins, hidden)),
+        "BaesGRU": np.zeros(hidden),
+        "WeightLinear": [np.zeros((hidden + bins, hidden))],
+        "BaesLinear": [np.zeros(hidden)],
         "WeightNonLinear": [np.zeros((hidden + bins, hidden)), np.zeros((hidden, bins))],
         "BaesNonLinear": [np.zeros(hidden), np.full(bins, 100.0 if mask else -100.0)],
     }
     if version == "0.0.6":
         values |= {
-            "WeightGRU_reset": np.zeros((hidden + bins, hidden)), "BiasGRU_reset": np.zeros(hidden),
-            "GainLinearNorm": [np.ones(hidden)], "BiasLinearNorm": [np.zeros(hidden)],
-            "GainNonLinearNorm": [np.ones(hidden)], "BiasNonLinearNorm": [np.zeros(hidden)],
+            "WeightGRU_reset": np.zeros((hidden + bins, hidden)),
+            "BiasGRU_reset": np.zeros(hidden),
+            "GainLinearNorm": [np.ones(hidden)],
+            "BiasLinearNorm": [np.zeros(hidden)],
+            "GainNonLinearNorm": [np.ones(hidden)],
+            "BiasNonLinearNorm": [np.zeros(hidden)],
         }
     return values
 
@@ -64,11 +78,19 @@ def loudness_voice() -> dict:
     weights = np.zeros((hidden + context * features, 1))
     weights[-features:, 0] = 1 / features  # mean log energy of the newest frame's bands
     return {
-        "Version": "VAD_0.0.1", "SampleRate": 8000, "FrameLength": 240,
-        "ModelName": "loudness", "TimeStamp": "1",
-        "MU": np.zeros(features), "SD": np.ones(features),
-        "WeightGRU": np.zeros((hidden + context * features, hidden)), "BaesGRU": np.zeros(hidden),
-        "WeightLinear": [weights], "BaesLinear": [np.zeros(1)],
-        "WeightNonLinear": [np.zeros((hidden, 1))], "BaesNonLinear": [np.zeros(1)],
-        "Test_MINMAX": np.array([0.0, 12.0]), "Test_BestF1": np.array([6.0]),
+        "Version": "VAD_0.0.1",
+        "SampleRate": 8000,
+        "FrameLength": 240,
+        "ModelName": "loudness",
+        "TimeStamp": "1",
+        "MU": np.zeros(features),
+        "SD": np.ones(features),
+        "WeightGRU": np.zeros((hidden + context * features, hidden)),
+        "BaesGRU": np.zeros(hidden),
+        "WeightLinear": [weights],
+        "BaesLinear": [np.zeros(1)],
+        "WeightNonLinear": [np.zeros((hidden, 1))],
+        "BaesNonLinear": [np.zeros(1)],
+        "Test_MINMAX": np.array([0.0, 12.0]),
+        "Test_BestF1": np.array([6.0]),
     }

@@ -16,9 +16,7 @@ def command():
     program = Path(os.environ.get("MORVA_COMMAND", ROOT / "build/release/morva"))
 
     def run(*arguments):
-        return subprocess.run(
-            [program, *map(str, arguments)], check=True, capture_output=True, text=True
-        ).stdout
+        return subprocess.run([program, *map(str, arguments)], check=True, capture_output=True, text=True).stdout
 
     return run
 

@@ -42,11 +42,7 @@ def test_a_folder_is_cleaned_resumed_and_its_failures_listed(recordings, tmp_pat
         if name != "deep/c.ogg":  # which is lossy
             np.testing.assert_allclose(got, morva.denoise(source, rate), atol=1.01 / 32768)
     assert not (out / "broken.wav").exists()
-    failed = [
-        e
-        for e in map(json.loads, filter(None, (out / batch.JOURNAL).read_text().split("\n")))
-        if e["error"]
-    ]
+    failed = [e for e in map(json.loads, filter(None, (out / batch.JOURNAL).read_text().split("\n"))) if e["error"]]
     assert [os.path.basename(e["source"]) for e in failed] == ["broken.wav"]
 
     # Again: only what failed, changed or vanished. The journal's last line was cut by a crash.

@@ -72,9 +72,7 @@ def test_voice_and_level_are_the_command_lines(command, speech, write):
         lines = command(name, path, "--format", "csv").splitlines()
         column = lines[0].split(",").index(key)
         wanted = np.array([float(line.split(",")[column]) for line in lines[1:]])
-        np.testing.assert_allclose(
-            ours(speech[:100100], 48000), wanted, atol=1e-2 if name == "level" else 1e-4
-        )
+        np.testing.assert_allclose(ours(speech[:100100], 48000), wanted, atol=1e-2 if name == "level" else 1e-4)
 
 
 def test_limit_and_bypass(speech):

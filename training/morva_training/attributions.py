@@ -3,6 +3,7 @@
 Authors are named wherever a licence asks for it; public-domain and CC0 sources are named, too, as
 collections.
 """
+
 from __future__ import annotations
 
 import argparse

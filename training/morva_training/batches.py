@@ -4,6 +4,7 @@ The mask is one number per band, so every loss that is quadratic in the masked s
 the bins of a band only through a few sums. They are taken here, once and without gradients; the
 losses then work on a hundred bands instead of 320 bins.
 """
+
 from __future__ import annotations
 
 from dataclasses import dataclass

@@ -3,6 +3,7 @@
 A weight file holds matrices inputs-down like the modules do, so values are only named and copied.
 The key spellings ("Baes...") belong to the file format.
 """
+
 from __future__ import annotations
 
 import datetime

@@ -8,6 +8,7 @@ Room responses are short and stay in one `rooms.npz`. Lower rates are made on de
 
 Units: samples are int16; rates in hertz; positions and lengths in samples of the store's rate.
 """
+
 from __future__ import annotations
 
 import argparse
@@ -48,10 +49,7 @@ def rows_of_folder(folder: Path, kind: str) -> list[dict[str, str]]:
     """Manifest rows for a bare folder: everything is training material, a folder is a category."""
     files = sorted(p for p in folder.rglob("*") if p.suffix.lower() in AUDIO_SUFFIXES)
     column = "speaker" if kind == "speech" else "category"
-    return [
-        {"path": str(p.relative_to(folder.parent)), column: p.parent.name, "split": "train"}
-        for p in files
-    ]
+    return [{"path": str(p.relative_to(folder.parent)), column: p.parent.name, "split": "train"} for p in files]
 
 
 def read_audio(path: Path, rate: int) -> np.ndarray:

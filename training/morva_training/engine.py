@@ -5,6 +5,7 @@ training code agree. It follows the engine's order of operations in single preci
 double. Samples are floats on the 16-bit scale at the model's rate. One object is one stream; not
 for use from several threads.
 """
+
 from __future__ import annotations
 
 from collections import deque

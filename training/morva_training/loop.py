@@ -4,6 +4,7 @@ The learning rate warms up, stays, and falls to nothing over the last part of th
 is resumed with another number of steps simply continues on the new schedule. The weights that are
 exported are an exponential moving average of the trained ones.
 """
+
 from __future__ import annotations
 
 import copy
@@ -94,7 +95,7 @@ class Run:
 
     def _back_to_average(self) -> None:
         self.network.load_state_dict(self.averaged.state_dict())
-        self.optimiser.state.clear()
+        self.optimiser.stop()
 
     def train(
         self,

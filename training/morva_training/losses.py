@@ -9,6 +9,7 @@ Five terms, each on the spectrum after the engine's squaring of the mask:
   over the piece, mapped to the listening-quality scale of P.862.2;
 - noise left in pauses, in decibels, levelled off at -40 dB.
 """
+
 from __future__ import annotations
 
 from dataclasses import dataclass

@@ -5,6 +5,7 @@ piece of speech and of what disturbs it (noise, clipping). Room reverberation be
 remove noise, not the room. Recordings without content above 8 kHz are flagged, so that the loss
 gives them no say about the bins above.
 """
+
 from __future__ import annotations
 
 import zlib
@@ -49,6 +50,7 @@ class Recipe:
     pause_share: float = 0.5
     pause_seconds: float = 0.5  # mean length
     speed_share: float = 0.25
+    speed: tuple[float, float] = (0.9, 1.1)
     noise_speed_share: float = 0.5
     noise_speed: tuple[float, float] = (0.75, 1.35)
     whisper_share: float = 0.04
@@ -219,7 +221,7 @@ class MixtureMaker:
             offset = int(self.rng.integers(max(1, clip.length - self.rate))) if self.rng.random() < 0.4 else 0
             piece = self.speech.read(clip, offset, self.count)
             if self.rng.random() < self.recipe.speed_share:
-                piece = self._speed(piece, 0.9, 1.1)
+                piece = self._speed(piece, *self.recipe.speed)
             piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
@@ -324,6 +326,4 @@ class MixtureMaker:
         waves = self.draw_waves()
         spectra = analyse(np.stack([waves.speech, waves.noise]).astype(np.float32), FULL_32K)
         speech_gain, noise_gain = self.equalisers(spectra.shape[-1])
-        return Mixture(
-            spectra[0] * speech_gain, spectra[1] * noise_gain, waves.wideband, waves.has_speech, waves.noisy
-        )
+        return Mixture(spectra[0] * speech_gain, spectra[1] * noise_gain, waves.wideband, waves.has_speech, waves.noisy)

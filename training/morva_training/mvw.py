@@ -5,6 +5,7 @@ name, type code (i32), value. Type codes: 0 float, 1 int, 2 bytes, 3 vector, 4 m
 vectors, 6 list of matrices. Matrices are row-major float32. The reader here is for our own files
 and raises on damage; the engine has its own forgiving one.
 """
+
 from __future__ import annotations
 
 import struct

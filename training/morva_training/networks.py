@@ -6,6 +6,7 @@ features are done once for the whole sequence; only the state's share stays in t
 
 Shapes: features [B, T, F], state [B, H], results [B, T, K] before the output sigmoid.
 """
+
 from __future__ import annotations
 
 import math

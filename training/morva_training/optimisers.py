@@ -3,6 +3,7 @@
 The orthogonal step is scaled like a step of AdamW (Liu et al. 2025), so both share a learning rate.
 Side by side from the same start, 150 steps brought this one further than 200 of AdamW alone.
 """
+
 from __future__ import annotations
 
 import torch
@@ -27,6 +28,13 @@ class AdamWithMuon(torch.optim.AdamW):
     """AdamW whose groups marked `orthogonal` take Muon's steps instead."""
 
     MOMENTUM, SCALE = 0.95, 0.2
+
+    def stop(self) -> None:
+        """Forgets where it was heading, not how large gradients are."""
+        for state in self.state.values():
+            for name in ("momentum", "exp_avg"):
+                if name in state:
+                    state[name].zero_()
 
     @torch.no_grad()
     def step(self, closure=None):

@@ -1,4 +1,5 @@
 """Networks of another shape that start with what a trained one has learned."""
+
 from __future__ import annotations
 
 import torch
@@ -11,9 +12,9 @@ Network = LayerNormGatedNetwork | PlainGatedNetwork
 NOISE = 0.02  # of a matrix's standard deviation
 
 
-def _like(network: Network, hidden: int, outputs: int) -> Network:
+def _like(network: Network, hidden: int, outputs: int, layers: int = 0) -> Network:
     arguments = {"linear_output": network.linear_output} if isinstance(network, PlainGatedNetwork) else {}
-    return type(network)(network.features, hidden, outputs, network.layers, **arguments)
+    return type(network)(network.features, hidden, outputs, layers or network.layers, **arguments)
 
 
 def widened(network: Network, hidden: int, seed: int = 1) -> Network:
@@ -44,6 +45,26 @@ def widened(network: Network, hidden: int, seed: int = 1) -> Network:
     with torch.no_grad():
         for (name, value), target in zip(network.named_parameters(), result.parameters()):
             target.copy_(grown(name, value))
+    return result
+
+
+def deepened(network: PlainGatedNetwork, layers: int, seed: int = 1) -> PlainGatedNetwork:
+    """A network with more hidden layers before the output, which begin by handing on what they get."""
+    if layers < network.layers:
+        raise ValueError(f"cannot make {layers} layers of {network.layers}")
+    generator = torch.Generator().manual_seed(seed)
+    result = _like(network, network.hidden, network.outputs, layers)
+    with torch.no_grad():
+        known = dict(network.named_parameters())
+        for name, target in result.named_parameters():
+            if name in known:
+                target.copy_(known[name])
+            elif name.startswith("linear."):
+                target.copy_(torch.eye(network.hidden))
+            else:
+                target.zero_()
+            if name not in known and target.dim() == 2:
+                target.add_(NOISE * network.hidden**-0.5 * torch.randn(target.shape, generator=generator))
     return result
 
 

@@ -1,4 +1,5 @@
 """Scores of a detector: how well numbers separate the true from the false."""
+
 from __future__ import annotations
 
 import numpy as np

@@ -1,4 +1,5 @@
 """Writes a weight file from the last checkpoint of a noise model's run, while it goes on."""
+
 from __future__ import annotations
 
 import argparse

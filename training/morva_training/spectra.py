@@ -4,6 +4,7 @@ Everything here mirrors the engine's arithmetic, so that the network hears in tr
 hears in a call. Samples are floats on the 16-bit scale. A model frame is two hops long; frame t
 covers hops t - 1 and t, the hop before the first being silence.
 """
+
 from __future__ import annotations
 
 from dataclasses import dataclass

@@ -3,6 +3,7 @@
 Runs on a CPU or a GPU. A run that was stopped goes on from its last checkpoint when it is started
 again with the same folder.
 """
+
 from __future__ import annotations
 
 import argparse

@@ -1,4 +1,5 @@
 """A small synthetic store, so that the tests need no recordings."""
+
 from __future__ import annotations
 
 import sys

@@ -1,4 +1,5 @@
 """The built engine through its C interface, for the agreement test."""
+
 from __future__ import annotations
 
 import ctypes

@@ -1,4 +1,5 @@
 """The bench end to end on synthetic material: pairs, systems and the table."""
+
 from __future__ import annotations
 
 import json
@@ -23,7 +24,7 @@ from morva_training import mvw  # noqa: E402
 from morva_training.convert import noise_weight  # noqa: E402
 from morva_training.mixing import active_level  # noqa: E402
 from morva_training.networks import LayerNormGatedNetwork, PlainGatedNetwork  # noqa: E402
-from morva_training.spectra import SMALL_16K, SMALL_8K  # noqa: E402
+from morva_training.spectra import SMALL_16K  # noqa: E402
 from morva_training.train_voice import voice_weight  # noqa: E402
 
 
@@ -96,10 +97,17 @@ def test_onset_is_counted_from_the_words_start() -> None:
     assert voice.onset_delays(scores, voice_blocks) == [30.0, 20.0]
 
 
-def test_voice_table(pairs: Path) -> None:
+def test_voice_tables(pairs: Path, tmp_path: Path) -> None:
     torch.manual_seed(2)
     network = PlainGatedNetwork(305, 6, 1, linear_output=True)
-    weight = voice_weight(network, np.full(61, 10.0), np.full(61, 5.0), [-1.0, 0.0, 1.0])
-    text = voice.score_pairs(pairs, weight, 2)
-    assert all(f"| {ms} ms |" in text for ms in (10, 20, 30, 40))
-    assert SMALL_8K.rate == voice.RATE
+    weight = tmp_path / "voice.mvw"
+    mvw.write(weight, voice_weight(network, np.full(61, 10.0), np.full(61, 5.0), [-1.0, 0.0, 1.0]))
+    chosen = dict([voice.parse(f"ours={weight}"), voice.parse("peer=printf 'time,score\n0,0.2\n4,0.7\n'")])
+    recordings = voice.read_pairs(pairs, 2)
+    text = voice.frame_table(chosen, recordings) + voice.snr_table(chosen, recordings)
+    assert all(f"| ours | {ms} ms |" in text for ms in (10, 20, 30, 40))
+    assert all(f"| {name} | {recordings[0].snr_db:g} dB |" in text for name in chosen)
+    scores = chosen["peer"](recordings[0].noisy, recordings[0].rate, 2)
+    assert scores[0] == scores[199] == pytest.approx(0.2) and scores[200] == scores[-1] == pytest.approx(0.7)
+    with pytest.raises(SystemExit, match="neither"):
+        voice.parse("nothing")

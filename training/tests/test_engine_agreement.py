@@ -2,6 +2,7 @@
 
 Needs the engine library: build/release/libmorva.so, or the file named by MORVA_LIBRARY.
 """
+
 from __future__ import annotations
 
 from pathlib import Path

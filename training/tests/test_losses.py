@@ -1,4 +1,5 @@
 """Losses: band sums against plain bin arithmetic, and that better masks score better."""
+
 from __future__ import annotations
 
 from pathlib import Path

@@ -1,4 +1,5 @@
 """The bench's scores, where the right answer is known."""
+
 from __future__ import annotations
 
 import metrics

@@ -1,4 +1,5 @@
 """Mixtures: who may be heard, at which ratio, and that a seed says it all."""
+
 from __future__ import annotations
 
 import json
@@ -13,9 +14,7 @@ from morva_training.batches import MixtureBatches, make_item
 from morva_training.mixing import MixtureMaker, Recipe, active_level, in_dev, simulated_room, smooth_gain, whispered
 from morva_training.spectra import FULL_32K, SMALL_8K, SMALL_16K
 
-PLAIN = Recipe(
-    seconds=2.0, clean_share=0.0, noise_only_share=0.0, room_share=0.0, clip_share=0.0, band_limit_share=0.0
-)
+PLAIN = Recipe(seconds=2.0, clean_share=0.0, noise_only_share=0.0, room_share=0.0, clip_share=0.0, band_limit_share=0.0)
 
 
 def maker(store: Path, recipe: Recipe = PLAIN, seed: int = 1, **options) -> MixtureMaker:

@@ -1,4 +1,5 @@
 """The weight file format: what is written is what is read, byte for byte as described."""
+
 from __future__ import annotations
 
 import struct

@@ -1,4 +1,5 @@
 """The sequence networks against the frame-by-frame reference, and their way through weight files."""
+
 from __future__ import annotations
 
 import numpy as np
@@ -6,16 +7,10 @@ import pytest
 import torch
 
 from morva_training import mvw
-from morva_training.convert import (
-    gated_network,
-    gated_values,
-    noise_weight,
-    plain_network,
-    plain_values,
-)
+from morva_training.convert import gated_network, gated_values, noise_weight, plain_network, plain_values
 from morva_training.engine import GatedStep, PlainStep, sigmoid
 from morva_training.networks import LayerNormGatedNetwork, PlainGatedNetwork
-from morva_training.reshape import widened, with_outputs
+from morva_training.reshape import deepened, widened, with_outputs
 from morva_training.spectra import SMALL_8K
 
 
@@ -105,6 +100,19 @@ def test_a_widened_network_says_about_the_same(kind: type) -> None:
     assert (after - before).std() < 0.15 * before.std()
     with pytest.raises(ValueError, match="cannot make"):
         widened(wide, 32)
+
+
+def test_a_deepened_network_says_about_the_same() -> None:
+    shallow = shaken(PlainGatedNetwork(20, 32, 6, linear_output=True), 6)
+    deep = deepened(shallow, 5)
+    x = torch.randn(4, 40, 20)
+    with torch.no_grad():
+        before, _ = shallow(x, shallow.initial_state(4))
+        after, _ = deep(x, deep.initial_state(4))
+    assert deep.layers == 5
+    assert (after - before).std() < 0.15 * before.std()
+    with pytest.raises(ValueError, match="cannot make"):
+        deepened(deep, 3)
 
 
 @pytest.mark.parametrize("outputs", [1, 5])

@@ -2,6 +2,7 @@
 
 The real figures come from bench/quality; here only what must never break is held.
 """
+
 from __future__ import annotations
 
 import shutil

@@ -1,4 +1,5 @@
 """Frames, bands, level gain: whole-recording code against the frame-by-frame reference."""
+
 from __future__ import annotations
 
 import numpy as np

@@ -1,4 +1,5 @@
 """Whole runs on a synthetic store: they learn, they resume, and what they write can be used."""
+
 from __future__ import annotations
 
 import json
@@ -67,7 +68,7 @@ def test_voice_model(store: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatc
     out = tmp_path / "voice.mvw"
     run_main(
         train_voice, monkeypatch, "--store", store, "--run", tmp_path / "run", "--out", out,
-        "--batch", 6, "--hidden", 12, "--steps", 12, "--rate", 0.01, "--workers", 0,
+        "--batch", 6, "--hidden", 12, "--layers", 3, "--steps", 12, "--rate", 0.01, "--workers", 0,
     )  # fmt: skip
     assert entries(tmp_path / "run", "dev_auc")[-1] > 0.6
     weight = mvw.read(out)

@@ -1,4 +1,5 @@
 """Voice activity: labels, the level tracker and the features against the frame-by-frame reference."""
+
 from __future__ import annotations
 
 from pathlib import Path
