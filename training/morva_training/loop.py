@@ -19,6 +19,7 @@ import torch
 from torch import Tensor, nn
 from tqdm import tqdm
 
+from . import together
 from .optimisers import make_optimiser
 
 RUNAWAY = 3.0
@@ -70,6 +71,8 @@ class Run:
         self.extra.update(state["extra"])
 
     def save(self) -> None:
+        if together.rank() != 0:
+            return
         state = {
             "network": self.network.state_dict(),
             "averaged": self.averaged.state_dict(),
@@ -84,6 +87,8 @@ class Run:
         partial.rename(self.checkpoint)
 
     def log(self, entry: dict) -> None:
+        if together.rank() != 0:
+            return
         with (self.folder / "log.jsonl").open("a") as handle:
             handle.write(json.dumps({"step": self.step, "seconds": round(self.seconds), **entry}) + "\n")
 
@@ -113,16 +118,24 @@ class Run:
         counted = 0
         usual: float | None = None
         started, before = time.monotonic(), self.seconds
-        bar = tqdm(total=self.schedule.steps, initial=self.step, mininterval=10.0, desc=self.folder.name)
+        bar = tqdm(
+            total=self.schedule.steps,
+            initial=self.step,
+            mininterval=10.0,
+            desc=self.folder.name,
+            disable=together.rank() != 0,
+        )
         while self.step < self.schedule.steps:
             for group in self.optimiser.param_groups:
                 group["lr"] = self.schedule.rate(self.step)
             loss, parts = loss_of(self.network, next(batches))
             self.optimiser.zero_grad(set_to_none=True)
             value = loss.item()
-            if math.isfinite(value) and (usual is None or value < usual + RUNAWAY * max(0.3, abs(usual))):
+            sound = math.isfinite(value) and (usual is None or value < usual + RUNAWAY * max(0.3, abs(usual)))
+            if not together.any_of_us(not sound):
                 usual = value if usual is None else 0.9 * usual + 0.1 * value
                 loss.backward()
+                together.average_gradients(self.network.parameters())
                 norm = nn.utils.clip_grad_norm_(self.network.parameters(), 1.0)
                 if torch.isfinite(norm):
                     self.optimiser.step()
@@ -140,7 +153,11 @@ class Run:
                 self.log({name: round(value / counted, 4) for name, value in sums.items()})
                 sums, counted = {}, 0
                 self.save()
-            if validate and (self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps):
+            if (
+                validate
+                and together.rank() == 0
+                and (self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps)
+            ):
                 result = validate(self.averaged)
                 self.log({f"dev_{name}": round(value, 4) for name, value in result.items()})
         bar.close()

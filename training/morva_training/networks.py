@@ -56,6 +56,11 @@ def plain_recurrence(inputs: Tensor, state: Tensor, weights: Tensor) -> Tuple[Te
     return torch.stack(outputs), state
 
 
+def _product(x: Tensor, matrix: Tensor, kind: torch.dtype) -> Tensor:
+    """x W with factors of the given kind and the sums in single precision."""
+    return (x.to(kind) @ matrix.to(kind)).to(x.dtype)
+
+
 def _matrix(rows: int, cols: int) -> nn.Parameter:
     bound = 1.0 / math.sqrt(rows)
     return nn.Parameter(torch.empty(rows, cols).uniform_(-bound, bound))
@@ -117,7 +122,12 @@ class LayerNormGatedNetwork(nn.Module):
 
 
 class PlainGatedNetwork(nn.Module):
-    """Network of version 0.0.5; with `linear_output` that of the voice-activity model."""
+    """Network of version 0.0.5; with `linear_output` that of the voice-activity model.
+
+    The products outside of the time loop may run on bfloat16 factors while it trains.
+    """
+
+    products: torch.dtype = torch.float32
 
     def __init__(self, features: int, hidden: int, outputs: int, layers: int = 3, linear_output: bool = False) -> None:
         super().__init__()
@@ -142,11 +152,11 @@ class PlainGatedNetwork(nn.Module):
         h = self.hidden
         first = (self.update, self.rectified[0], self.linear[0])
         biases = (self.update_bias, self.rectified_bias[0], self.linear_bias[0])
-        inputs = x.transpose(0, 1) @ torch.cat([w[h:] for w in first], 1) + torch.cat(biases)
+        inputs = _product(x.transpose(0, 1), torch.cat([w[h:] for w in first], 1), self.products) + torch.cat(biases)
         y, state = plain_recurrence(inputs, state, torch.cat([w[:h] for w in first], 1))
         for i in range(1, self.layers - 1):
-            a = y @ self.rectified[i] + self.rectified_bias[i]
-            y = torch.relu(a) + y @ self.linear[i] + self.linear_bias[i]
+            both = _product(y, torch.cat([self.rectified[i], self.linear[i]], 1), self.products)
+            y = torch.relu(both[..., :h] + self.rectified_bias[i]) + both[..., h:] + self.linear_bias[i]
         return (y @ self.output + self.output_bias).transpose(0, 1), state
 
     def macs_per_frame(self) -> int:

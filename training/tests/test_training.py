@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import json
+import socket
 import sys
 from pathlib import Path
 
@@ -10,7 +11,7 @@ import numpy as np
 import pytest
 import torch
 
-from morva_training import mvw, snapshot, train_noise, train_voice
+from morva_training import mvw, snapshot, together, train_noise, train_voice
 from morva_training.engine import NoiseLevelModel, NoiseModel, VoiceModel
 from morva_training.loop import Run, Schedule
 from morva_training.optimisers import orthogonalised
@@ -112,3 +113,31 @@ def test_the_average_follows_the_network(tmp_path: Path) -> None:
     run.train(iter([{}] * 200), loss_of)
     result = run.averaged(torch.ones(1, 1)).item()
     assert abs(result - 3.0) < 0.1
+
+
+def train_with_others(number: int, port: int, folder: Path) -> None:
+    patch = pytest.MonkeyPatch()
+    for name, value in {"RANK": number, "WORLD_SIZE": 2, "MASTER_ADDR": "127.0.0.1", "MASTER_PORT": port}.items():
+        patch.setenv(name, str(value))
+    assert together.join() == number
+    torch.manual_seed(1)
+    network = torch.nn.Linear(1, 1)
+    run = Run(network, folder, Schedule(steps=300, peak=0.1, warm_up=1))
+    targets = iter([2.0 if number else float("nan"), *([2.0 if number else 4.0] * 299)])
+
+    def loss_of(model, _):
+        return (model(torch.ones(1, 1)) - next(targets)).square().sum(), {}
+
+    run.train(iter([{}] * 300), loss_of)
+    torch.save(network.state_dict(), folder / f"{number}.pt")
+
+
+def test_two_processes_train_one_network(tmp_path: Path) -> None:
+    """One is told 4, the other 2, and one of them once a loss that nobody may follow."""
+    with socket.create_server(("127.0.0.1", 0)) as free:
+        port = free.getsockname()[1]
+    torch.multiprocessing.spawn(train_with_others, (port, tmp_path), nprocs=2)
+    first, second = (torch.load(tmp_path / f"{number}.pt") for number in (0, 1))
+    assert all(torch.equal(first[name], second[name]) for name in first)
+    assert abs(first["weight"].item() + first["bias"].item() - 3.0) < 0.1
+    assert (tmp_path / "log.jsonl").read_text().count('"step": 300') == 1
