@@ -25,6 +25,7 @@ from morva_training.mixing import active_level, in_dev  # noqa: E402
 
 SNRS_DB = (-5, 0, 5, 10, 15)
 SECONDS = 8.0
+BABBLERS = 6
 
 
 def by_category(store: Store, kind: str, split: str) -> dict[str, list[Clip]]:
@@ -61,7 +62,7 @@ def noise_of(rng: np.random.Generator, store: Store, clips: list[Clip]) -> np.nd
 
 def babble_of(rng: np.random.Generator, store: Store, voices: dict[str, list[Clip]]) -> np.ndarray:
     total = np.zeros(int(SECONDS * BASE_RATE), np.float32)
-    for name in rng.choice(sorted(voices), 6, replace=False):
+    for name in rng.choice(sorted(voices), BABBLERS, replace=False):
         samples = np.concatenate([store.read(c) for c in voices[name]])
         samples = np.tile(samples, -(-len(total) // len(samples)))[: len(total)]
         total += samples / (active_level(samples) + 1e-3)

@@ -1,23 +1,27 @@
-"""Scores voice-activity models on held-out mixtures and on sounds that must not pass for a voice.
+"""Scores voice-activity models on labelled recordings and on sounds that must not pass for a voice.
 
-    python bench/quality/voice.py PAIRS --store STORE ours=models/VAD_weight.mvw "peer=some-program --flag"
+    python bench/quality/voice.py FOLDER --store STORE ours=models/VAD_weight.mvw "peer=some-program --flag"
+
+FOLDER holds pairs, `noisy/` and `clean/` (as mixtures.py makes them): labels come from the clean
+speech at 8 kHz, frames that are neither voice nor silence are left out. Or it holds recordings and
+labels of your own, `audio/NAME.wav` and `labels/NAME.txt`: a line per stretch of voice, its start
+and end in seconds (Audacity's label tracks).
 
 A peer is called as `program in.wav` and prints what `morva vad --format csv` prints: a line with
 names, then rows that begin with a frame's start in seconds and its score. Its score holds for all
 blocks that its frame covers, so a peer with longer frames may look ahead to their ends.
 
-Labels come from the clean speech at 8 kHz; frames that are neither voice nor silence are left out.
 First, for each frame length: the area under the ROC curve over all frames and over those further
 than 50 ms from where a voice starts or ends, the best F1, the F1 at score 0.5 (both over all).
 Then, for 10 ms and each signal-to-noise ratio: the area under the curve, and how long after a
 word's start the score passes 0.5 (words after at least 0.3 s of silence). Last, the share of
-frames above 0.5 in recordings without any speech, by category.
-PAIRS is a folder that mixtures.py made, or any other with `noisy/` and `clean/`.
+frames above 0.5 in recordings without any speech, by category, and in babble.
 """
 
 from __future__ import annotations
 
 import argparse
+import hashlib
 import json
 import shlex
 import subprocess
@@ -30,6 +34,7 @@ import numpy as np
 import soundfile
 
 import metrics
+import mixtures
 import systems  # noqa: F401  (makes the training package importable)
 from morva_training import mvw
 from morva_training.corpus import BASE_RATE, Store
@@ -37,6 +42,7 @@ from morva_training.engine import VoiceModel
 from morva_training.voice import BLOCK, RATE, block_labels, frame_labels
 
 FOOLING = ("music", "keyboard", "mouse_click", "human_nonspeech", "animal", "dog_bark", "vacuum", "rain", "birds")
+BABBLE_RMS = 1000.0  # of each talker
 COLLAR_BLOCKS = 5  # of 10 ms, on both sides of a start or end
 
 Scorer = Callable[[np.ndarray, int, int], np.ndarray]  # samples, rate, blocks per frame -> score per frame
@@ -55,15 +61,22 @@ def from_weight(weight: mvw.Weight) -> Scorer:
 
 
 def from_command(command: str) -> Scorer:
-    def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
+    known: dict[bytes, np.ndarray] = {}  # scores per block of recordings heard before
+
+    def block_scores(samples: np.ndarray, rate: int) -> np.ndarray:
         with tempfile.TemporaryDirectory() as folder:
             source = Path(folder) / "in.wav"
             soundfile.write(source, samples, rate, "PCM_16")
             printed = subprocess.run([*shlex.split(command), source], check=True, capture_output=True, text=True).stdout
         rows = np.array([line.split(",")[:2] for line in printed.splitlines()[1:]], float)
-        starts = np.arange(len(samples) * 100 // rate) * 0.01
-        covering = np.searchsorted(rows[:, 0], starts + 0.005, side="right") - 1
-        return frame_labels(rows[np.maximum(covering, 0), 1], blocks)
+        middles = np.arange(len(samples) * 100 // rate) * 0.01 + 0.005
+        return rows[np.maximum(np.searchsorted(rows[:, 0], middles) - 1, 0), 1]
+
+    def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
+        key = hashlib.sha256(samples.tobytes()).digest()
+        if key not in known:
+            known[key] = block_scores(samples, rate)
+        return frame_labels(known[key], blocks)
 
     return scores
 
@@ -104,16 +117,34 @@ def onset_delays(scores: np.ndarray, voice: np.ndarray) -> list[float]:
     return delays
 
 
-def read_pairs(folder: Path, limit: int) -> list[Recording]:
+def read_sound(file: Path) -> tuple[np.ndarray, int]:
+    samples, rate = soundfile.read(file, dtype="float32", always_2d=True)
+    return samples[:, 0], rate
+
+
+def labels_of_stretches(file: Path, blocks: int) -> np.ndarray:
+    voice = np.zeros(blocks, bool)
+    for line in filter(str.strip, file.read_text().splitlines()):
+        start, end = (round(float(text) * 100) for text in line.replace(",", " ").split()[:2])
+        voice[start:end] = True
+    return voice
+
+
+def read_recordings(folder: Path, limit: int) -> list[Recording]:
+    """The labelled recordings of a folder, evenly thinned out to about `limit` if that is not 0."""
+    own = (folder / "labels").is_dir()
     listing = folder / "pairs.json"
     snrs = {p["name"]: p["snr_db"] for p in json.loads(listing.read_text())} if listing.exists() else {}
-    files = sorted((folder / "noisy").glob("*.wav"))
+    files = sorted(f for f in (folder / ("audio" if own else "noisy")).iterdir() if f.is_file())
     result = []
     for file in files[:: max(1, len(files) // limit)] if limit else files:
-        noisy, rate = soundfile.read(file, dtype="float32", always_2d=True)
-        clean, clean_rate = soundfile.read(folder / "clean" / file.name, dtype="float32", always_2d=True)
-        labels = block_labels(on_model_scale(clean[:, 0], clean_rate))
-        result.append(Recording(noisy[:, 0], rate, *labels, snrs.get(file.stem)))
+        samples, rate = read_sound(file)
+        if own:
+            voice = labels_of_stretches(folder / "labels" / (file.stem + ".txt"), len(samples) * 100 // rate)
+            sure = np.ones(len(voice), np.float32)
+        else:
+            voice, sure = block_labels(on_model_scale(*read_sound(folder / "clean" / file.name)))
+        result.append(Recording(samples, rate, voice, sure, snrs.get(file.stem)))
     return result
 
 
@@ -170,35 +201,46 @@ def snr_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str:
     return "\n".join(lines)
 
 
-def false_alarms(store: Path, systems_: dict[str, Scorer], split: str) -> str:
-    noise = Store(store, "noise")
-    lines = ["| sound without speech | recordings | frames above 0.5, " + " | ".join(systems_) + " |"]
+def without_speech(store: Path, split: str) -> dict[str, list[np.ndarray]]:
+    """Sounds at the store's base rate, by kind; babble is six talkers at once."""
+    noise, speech = Store(store, "noise"), Store(store, "speech")
+    sounds = {name: [noise.read(c) for c in noise.of_split(split) if c.category == name] for name in FOOLING}
+    voices = {
+        name: clips
+        for name, clips in mixtures.by_category(speech, "speech", split).items()
+        if sum(c.length for c in clips) > 2 * BASE_RATE
+    }
+    rng = np.random.default_rng(1)
+    if len(voices) >= mixtures.BABBLERS:
+        sounds["babble"] = [mixtures.babble_of(rng, speech, voices) * BABBLE_RMS for _ in range(5)]
+    return {name: parts for name, parts in sounds.items() if parts}
+
+
+def false_alarms(sounds: dict[str, list[np.ndarray]], systems_: dict[str, Scorer]) -> str:
+    lines = ["| sound without speech | recordings | frames above 0.5: " + " | ".join(systems_) + " |"]
     lines.append("|---|---|" + "---|" * len(systems_))
-    for category in FOOLING:
-        clips = [c for c in noise.of_split(split) if c.category == category]
-        if not clips:
-            continue
+    for name, parts in sounds.items():
         shares = []
         for scorer in systems_.values():
-            scores = np.concatenate([scorer(noise.read(c) / 32768, BASE_RATE, 1) for c in clips])
+            scores = np.concatenate([scorer(part / 32768, BASE_RATE, 1) for part in parts])
             shares.append(f"{np.mean(scores > 0.5):.1%}")
-        lines.append(f"| {category} | {len(clips)} | " + " | ".join(shares) + " |")
+        lines.append(f"| {name} | {len(parts)} | " + " | ".join(shares) + " |")
     return "\n".join(lines)
 
 
 def main() -> None:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("pairs", type=Path, help="folder made by mixtures.py, or of the same form")
+    parser.add_argument("folder", type=Path, help="noisy/ and clean/, or audio/ and labels/")
     parser.add_argument("systems", nargs="+", help="NAME=model.mvw or NAME=command")
     parser.add_argument("--store", type=Path, help="decoded audio, for the sounds without speech")
     parser.add_argument("--split", default="heldout")
     parser.add_argument("--limit", type=int, default=0)
     args = parser.parse_args()
     chosen = dict(parse(text) for text in args.systems)
-    recordings = read_pairs(args.pairs, args.limit)
+    recordings = read_recordings(args.folder, args.limit)
     print(frame_table(chosen, recordings) + "\n\n" + snr_table(chosen, recordings))
     if args.store:
-        print("\n" + false_alarms(args.store, chosen, args.split))
+        print("\n" + false_alarms(without_speech(args.store, args.split), chosen))
 
 
 if __name__ == "__main__":

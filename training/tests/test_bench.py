@@ -103,7 +103,7 @@ def test_voice_tables(pairs: Path, tmp_path: Path) -> None:
     weight = tmp_path / "voice.mvw"
     mvw.write(weight, voice_weight(network, np.full(61, 10.0), np.full(61, 5.0), [-1.0, 0.0, 1.0]))
     chosen = dict([voice.parse(f"ours={weight}"), voice.parse("peer=printf 'time,score\n0,0.2\n4,0.7\n'")])
-    recordings = voice.read_pairs(pairs, 2)
+    recordings = voice.read_recordings(pairs, 2)
     text = voice.frame_table(chosen, recordings) + voice.snr_table(chosen, recordings)
     assert all(f"| ours | {ms} ms |" in text for ms in (10, 20, 30, 40))
     assert all(f"| {name} | {recordings[0].snr_db:g} dB |" in text for name in chosen)
@@ -111,3 +111,17 @@ def test_voice_tables(pairs: Path, tmp_path: Path) -> None:
     assert scores[0] == scores[199] == pytest.approx(0.2) and scores[200] == scores[-1] == pytest.approx(0.7)
     with pytest.raises(SystemExit, match="neither"):
         voice.parse("nothing")
+
+
+def test_voice_labels_of_ones_own(store: Path, tmp_path: Path) -> None:
+    (tmp_path / "audio").mkdir()
+    (tmp_path / "labels").mkdir()
+    soundfile.write(tmp_path / "audio" / "talk.flac", np.zeros((48000, 2)), 16000)
+    (tmp_path / "labels" / "talk.txt").write_text("0.500000\t1.250000\tyes\n\n2.0,2.1\n")
+    (recording,) = voice.read_recordings(tmp_path, 0)
+    assert np.flatnonzero(np.diff(recording.voice.astype(int))).tolist() == [49, 124, 199, 209]
+    told = {
+        "told": lambda samples, rate, blocks: np.repeat(recording.voice, 1)[: 300 // blocks * blocks : blocks] * 1.0
+    }
+    assert "| told | 10 ms | 1.0000 | 1.0000 | 1.0000 | 1.0000 |" in voice.frame_table(told, [recording])
+    assert "| 100.0% |" in voice.false_alarms({"click": [np.ones(32000)]}, {"always": lambda *_: np.ones(100)})
