@@ -192,14 +192,14 @@ class LevelLoss:
     """Loss of the noise-level model: error in dB of the power that the mask removes.
 
     The engine smooths the removed power over about ten hops, so powers are compared over 0.3 s.
-    Noise 45 dB below the whole piece counts as that faint, or silence would rule the loss. A share
+    Noise 50 dB below the whole piece counts as that faint, or silence would rule the loss. A share
     of the mask loss keeps the model a noise suppressor.
     """
 
     WINDOW, STRIDE = 30, 10
-    FAINTEST = 10**-4.5
+    FAINTEST = 10**-5.0
 
-    def __init__(self, layout: Layout, device: torch.device, mask_share: float = 0.3) -> None:
+    def __init__(self, layout: Layout, device: torch.device, mask_share: float = 0.15) -> None:
         self.mask_loss = MaskLoss(layout, LossWeights(loudness=0.0, ratio=0.01), device)
         self.mask_share = mask_share
 

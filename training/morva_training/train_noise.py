@@ -27,7 +27,7 @@ from .spectra import FULL_32K, SMALL_16K, SMALL_8K, Layout
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
 HIDDEN = {"32k": 304, "16k": 208, "8k": 160}
-LEVEL_RECIPE = Recipe(snr_db=(-8.0, 30.0), noise_only_share=0.2, synthetic_share=0.25)
+LEVEL_RECIPE = Recipe(snr_db=(-8.0, 40.0), noise_only_share=0.15, synthetic_share=0.25)
 SKIPPED_FRAMES = 20  # at the start of a piece, while the memory fills
 
 
