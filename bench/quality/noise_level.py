@@ -23,6 +23,7 @@ from morva_training.mixing import active_level
 RATE = 16000
 SECONDS = 6
 LEVELS_DB = (20.0, 35.0, 50.0, 62.0)  # mean power on the 16-bit scale
+SPEECH_DB = 62.0
 
 
 def coloured(rng: np.random.Generator, slope: float) -> np.ndarray:
@@ -69,20 +70,24 @@ def main() -> None:
     args = parser.parse_args()
     weight = mvw.read(args.weight)
     speech = speech_of(args.store, args.split)
-    speech *= 10 ** (62.0 / 20) / active_level(speech, RATE // 50)
-    alone: list[float] = []
-    spoken: list[float] = []
-    print("| noise | error alone, dB | error under speech (SNR 0 to 27 dB), dB |\n|---|---|---|")
+    speech *= 10 ** (SPEECH_DB / 20) / active_level(speech, RATE // 50)
+    errors: dict[str, list[float]] = {}
+    print("| noise | error alone, dB | error under speech (SNR 27, 12, 0 dB), dB |\n|---|---|---|")
     for name, noise in steady_noises(args.store, args.split).items():
         unit = noise / np.sqrt(np.mean(np.square(noise)))
-        first = [reported(weight, np.clip(unit * 10 ** (db / 20), -32768, 32767)) - db for db in LEVELS_DB]
-        second = [reported(weight, np.clip(unit * 10 ** (db / 20) + speech, -32768, 32767)) - db for db in (35, 50, 62)]
-        alone += first
-        spoken += second
-        print(f"| {name} | {', '.join(f'{e:+.1f}' for e in first)} | {', '.join(f'{e:+.1f}' for e in second)} |")
-    for title, errors in (("alone", alone), ("under speech", spoken)):
-        absolute = np.abs(errors)
-        print(f"\n{title}: mean absolute error {absolute.mean():.2f} dB, within 2 dB {np.mean(absolute <= 2):.0%}")
+        row: dict[str, list[float]] = {"alone": [], "spoken": []}
+        for db in LEVELS_DB:
+            alone = unit * 10 ** (db / 20)
+            row["alone"].append(reported(weight, np.clip(alone, -32768, 32767)) - db)
+            if db >= 35:
+                row["spoken"].append(reported(weight, np.clip(alone + speech, -32768, 32767)) - db)
+                errors.setdefault(f"under speech, SNR {SPEECH_DB - db:.0f} dB", []).append(row["spoken"][-1])
+        errors.setdefault("alone", []).extend(row["alone"])
+        print(f"| {name} | " + " | ".join(", ".join(f"{e:+.1f}" for e in part) for part in row.values()) + " |")
+    print("\n| | mean absolute error | within 2 dB |\n|---|---|---|")
+    for title, values in sorted(errors.items()):
+        absolute = np.abs(values)
+        print(f"| {title} | {absolute.mean():.2f} dB | {np.mean(absolute <= 2):.0%} |")
 
 
 if __name__ == "__main__":

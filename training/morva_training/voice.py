@@ -39,6 +39,9 @@ VOICE_RECIPE = Recipe(
     babble_share=0.12,
     speed_share=0.6,
     speed=(0.85, 1.18),
+    noise_speed_share=0.7,
+    noise_speed=(0.65, 1.5),
+    second_noise_share=0.45,
     room_share=0.35,
     boosted=("music", "keyboard", "mouse_click", "human_nonspeech", "baby_cry", "animal", "dog_bark", "cat", "birds"),
 )
