@@ -94,13 +94,16 @@ def test_cost(stem: str) -> None:
 
 
 @pytest.mark.parametrize("level_db", [25.0, 45.0, 65.0])
-@pytest.mark.parametrize("colour", ["white", "pink"])
-def test_noise_level(level_db: float, colour: str) -> None:
+@pytest.mark.parametrize("colour", ["white", "pink", "pink under speech"])
+def test_noise_level(level_db: float, colour: str, speech: np.ndarray) -> None:
     weight = weight_of("noise_level_16k")
-    noise = pink(64000) if colour == "pink" else np.random.default_rng(3).standard_normal(64000)
+    noise = np.random.default_rng(3).standard_normal(64000) if colour == "white" else pink(64000)
     noise = (noise * 10 ** (level_db / 20)).astype(np.float32)
+    if "speech" in colour:
+        clean = np.resize(at(speech, 16000), 64000)
+        noise = noise + clean / np.sqrt(np.mean(clean**2)) * 10 ** (min(level_db + 20, 70) / 20)
     model = NoiseLevelModel(weight)
-    levels = [model.level(noise[i : i + 160]) for i in range(0, 64000, 160)]
+    levels = [model.level(noise[i : i + 160].astype(np.float32)) for i in range(0, 64000, 160)]
     assert abs(np.median(levels[200:]) - level_db) < 2
 
 
