@@ -52,18 +52,29 @@ def on_model_scale(samples: np.ndarray, rate: int) -> np.ndarray:
     return np.clip(np.rint(metrics.at_rate(samples, rate, RATE) * 32768), -32768, 32767).astype(np.float32)
 
 
+def remembered(scorer: Scorer) -> Scorer:
+    """Every table asks for the same recordings; they are scored once."""
+    known: dict[tuple[bytes, int], np.ndarray] = {}
+
+    def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
+        key = hashlib.sha256(samples.tobytes()).digest(), blocks
+        if key not in known:
+            known[key] = scorer(samples, rate, blocks)
+        return known[key]
+
+    return scores
+
+
 def from_weight(weight: mvw.Weight) -> Scorer:
     def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
         model, x, frame = VoiceModel(weight), on_model_scale(samples, rate), blocks * BLOCK
         return np.array([model.score(x[at : at + frame]) for at in range(0, len(x) - frame + 1, frame)])
 
-    return scores
+    return remembered(scores)
 
 
 def from_command(command: str) -> Scorer:
-    known: dict[bytes, np.ndarray] = {}  # scores per block of recordings heard before
-
-    def block_scores(samples: np.ndarray, rate: int) -> np.ndarray:
+    def of_blocks(samples: np.ndarray, rate: int, _blocks: int) -> np.ndarray:
         with tempfile.TemporaryDirectory() as folder:
             source = Path(folder) / "in.wav"
             soundfile.write(source, samples, rate, "PCM_16")
@@ -72,13 +83,8 @@ def from_command(command: str) -> Scorer:
         middles = np.arange(len(samples) * 100 // rate) * 0.01 + 0.005
         return rows[np.maximum(np.searchsorted(rows[:, 0], middles) - 1, 0), 1]
 
-    def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
-        key = hashlib.sha256(samples.tobytes()).digest()
-        if key not in known:
-            known[key] = block_scores(samples, rate)
-        return frame_labels(known[key], blocks)
-
-    return scores
+    once = remembered(of_blocks)
+    return lambda samples, rate, blocks: frame_labels(once(samples, rate, 1), blocks)
 
 
 def parse(text: str) -> tuple[str, Scorer]:
