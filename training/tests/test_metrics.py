@@ -6,6 +6,8 @@ import metrics
 import numpy as np
 import pytest
 
+from morva_training.scoring import quick_threshold
+
 
 def tone(seconds: float = 1.0, rate: int = 16000) -> np.ndarray:
     rng = np.random.default_rng(3)
@@ -53,6 +55,8 @@ def test_separable_labels() -> None:
     assert metrics.roc_auc(-np.arange(100.0), labels) == 0.0
     assert metrics.roc_auc(np.zeros(100), labels) == 0.5
     assert metrics.best_f1(np.arange(100.0), labels) == (1.0, 50.0)
+    assert quick_threshold(np.arange(100.0), labels, 0.0) == 50.0
+    assert quick_threshold(np.arange(100.0), labels, 0.02) == 48.0  # 2 of 52 wrong: F1 0.98
 
 
 def test_identical_speech_is_perfect() -> None:
