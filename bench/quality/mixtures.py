@@ -37,6 +37,12 @@ def by_category(store: Store, kind: str, split: str) -> dict[str, list[Clip]]:
     return groups
 
 
+def talkers(store: Store, split: str) -> dict[str, list[Clip]]:
+    """Speakers with more than two seconds of speech."""
+    voices = by_category(store, "speech", split)
+    return {name: clips for name, clips in voices.items() if sum(c.length for c in clips) > 2 * BASE_RATE}
+
+
 def sentences(rng: np.random.Generator, store: Store, clips: list[Clip]) -> np.ndarray:
     """One speaker's recordings with pauses; the recordings' own edges are kept."""
     out = np.zeros(int(SECONDS * BASE_RATE), np.float32)
@@ -72,8 +78,7 @@ def babble_of(rng: np.random.Generator, store: Store, voices: dict[str, list[Cli
 def make(store: Path, out: Path, count: int, clean_count: int, seed: int, split: str) -> None:
     rng = np.random.default_rng(seed)
     speech, noise = Store(store, "speech"), Store(store, "noise")
-    voices, noises = by_category(speech, "speech", split), by_category(noise, "noise", split)
-    voices = {k: v for k, v in voices.items() if sum(c.length for c in v) > 2 * BASE_RATE}
+    voices, noises = talkers(speech, split), by_category(noise, "noise", split)
     names, kinds = sorted(voices), sorted(noises) + ["babble"]
     listing = []
     for folder in ("noisy", "clean"):

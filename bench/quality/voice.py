@@ -211,11 +211,7 @@ def without_speech(store: Path, split: str) -> dict[str, list[np.ndarray]]:
     """Sounds at the store's base rate, by kind; babble is six talkers at once."""
     noise, speech = Store(store, "noise"), Store(store, "speech")
     sounds = {name: [noise.read(c) for c in noise.of_split(split) if c.category == name] for name in FOOLING}
-    voices = {
-        name: clips
-        for name, clips in mixtures.by_category(speech, "speech", split).items()
-        if sum(c.length for c in clips) > 2 * BASE_RATE
-    }
+    voices = mixtures.talkers(speech, split)
     rng = np.random.default_rng(1)
     if len(voices) >= mixtures.BABBLERS:
         sounds["babble"] = [mixtures.babble_of(rng, speech, voices) * BABBLE_RMS for _ in range(5)]

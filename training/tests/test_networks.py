@@ -2,6 +2,8 @@
 
 from __future__ import annotations
 
+from typing import Callable
+
 import numpy as np
 import pytest
 import torch
@@ -87,32 +89,26 @@ def test_voice_weight_round_trip() -> None:
         assert torch.equal(restored.state_dict()[name], value), name
 
 
-@pytest.mark.parametrize("kind", [LayerNormGatedNetwork, PlainGatedNetwork])
-def test_a_widened_network_says_about_the_same(kind: type) -> None:
+@pytest.mark.parametrize(
+    ("kind", "grow", "size", "name"),
+    [
+        (LayerNormGatedNetwork, widened, 80, "hidden"),
+        (PlainGatedNetwork, widened, 80, "hidden"),
+        (PlainGatedNetwork, deepened, 5, "layers"),
+    ],
+)
+def test_a_grown_network_says_about_the_same(kind: type, grow: Callable, size: int, name: str) -> None:
     torch.manual_seed(5)
-    narrow = kind(20, 32, 6)
-    wide = widened(narrow, 80)
+    small = kind(20, 32, 6)
+    large = grow(small, size)
     x = torch.randn(4, 40, 20)
     with torch.no_grad():
-        before, _ = narrow(x, narrow.initial_state(4))
-        after, _ = wide(x, wide.initial_state(4))
-    assert wide.hidden == 80
+        before, _ = small(x, small.initial_state(4))
+        after, _ = large(x, large.initial_state(4))
+    assert getattr(large, name) == size
     assert (after - before).std() < 0.15 * before.std()
     with pytest.raises(ValueError, match="cannot make"):
-        widened(wide, 32)
-
-
-def test_a_deepened_network_says_about_the_same() -> None:
-    shallow = shaken(PlainGatedNetwork(20, 32, 6, linear_output=True), 6)
-    deep = deepened(shallow, 5)
-    x = torch.randn(4, 40, 20)
-    with torch.no_grad():
-        before, _ = shallow(x, shallow.initial_state(4))
-        after, _ = deep(x, deep.initial_state(4))
-    assert deep.layers == 5
-    assert (after - before).std() < 0.15 * before.std()
-    with pytest.raises(ValueError, match="cannot make"):
-        deepened(deep, 3)
+        grow(large, getattr(small, name))
 
 
 @pytest.mark.parametrize("outputs", [1, 5])
