@@ -106,7 +106,7 @@ BENCHMARK(transformPair);
 
 void analysis(benchmark::State& state) {
     Full full;
-    NOISE_CANCELLER::SpectralCleaner cleaner(*full.params, full.environment->second,
+    NOISE_CANCELLER::SpectralCleaner cleaner(*full.params, *full.params, full.environment->second,
                                              NOISE_CANCELLER::generation(6),
                                              NOISE_CANCELLER::Synthesis::FromKept);
     std::vector<float> x;
@@ -156,7 +156,7 @@ BENCHMARK(overlapAdd);
 
 void synthesis(benchmark::State& state) {
     Full full;
-    NOISE_CANCELLER::SpectralCleaner cleaner(*full.params, full.environment->second,
+    NOISE_CANCELLER::SpectralCleaner cleaner(*full.params, *full.params, full.environment->second,
                                              NOISE_CANCELLER::generation(6),
                                              NOISE_CANCELLER::Synthesis::FromKept);
     std::vector<float> x;

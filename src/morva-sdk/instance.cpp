@@ -14,7 +14,8 @@ constexpr char const* kUnit = "src/morva-sdk/instance";
 // Sessions without sound of their own are built for this output rate.
 constexpr MorvaSamplingRate kValueSessionRate = MORVA_RATE_16000;
 
-// What audio threads read; the holder inside Instance owns it.
+// What audio threads read; the holder inside Instance owns it. It also says whether there is an
+// instance: at process exit the holder may be gone before the last caller.
 std::atomic<MorvaInstanceT*> current{nullptr};
 
 }  // namespace
@@ -31,7 +32,7 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
         }
         case MODE::create: {
             std::lock_guard const lock(mutexForInputs_);
-            if (holder) {
+            if (current.load(std::memory_order_relaxed) != nullptr) {
                 UTILS::raise("DOUBLE INITIALIZATION WITHOUT DESTROYING", kUnit, "Instance");
             }
             holder = std::make_unique<MorvaInstanceT>(path != nullptr ? path : L"");
@@ -40,9 +41,10 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
         }
         case MODE::destroy: {
             std::lock_guard const lock(mutexForInputs_);
-            if (!holder) UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
-            current.store(nullptr, std::memory_order_release);
-            auto const dying = std::move(holder);
+            if (current.load(std::memory_order_relaxed) == nullptr) {
+                UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
+            }
+            holder.reset();
             return nullptr;
         }
     }
@@ -52,6 +54,7 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
 MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : workingPath_(path) {}
 
 MorvaInstanceT::~MorvaInstanceT() {
+    current.store(nullptr, std::memory_order_release);
     clearAll();
 }
 

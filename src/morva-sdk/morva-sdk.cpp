@@ -9,6 +9,7 @@
 #include "morva-sdk/cpu_support.h"
 #include "morva-sdk/error_funnel.h"
 #include "morva-sdk/instance.h"
+#include "morva-sdk/last_error.h"
 #include "utils/math_setup.h"
 
 namespace {
@@ -113,8 +114,11 @@ extern "C" {
 int Morva_SDK_GlobalInit(wchar_t const* workingPath, unsigned int threads) {
     // Before anything that may run newer instructions, and with nothing but the C library.
     if (char const* const missing = missingProcessorFeature()) {
-        std::fprintf(stderr, "The processor does not support %s, which this engine needs\n",
-                     missing);
+        char text[128];
+        std::snprintf(text, sizeof text,
+                      "The processor does not support %s, which this engine needs", missing);
+        rememberError(text);
+        std::fprintf(stderr, "%s\n", text);
         std::fflush(stderr);
         return kIntFailures.engine;
     }

@@ -26,7 +26,8 @@
  *      1  the operation ran and reported failure (frame size or pointer wrong for the session)
  *      2  a null argument, a model that could not be registered, or a wrong session handle
  *     -1  an exception of unknown type; -2 a standard exception; -3 an engine exception
- *   and print a line on standard error that says what happened.
+ *   and print a line on standard error that says what happened (a model that could not be
+ *   registered, and a null argument there, on standard output).
  *
  * Frames
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
@@ -99,9 +100,9 @@ MORVA_API int Morva_NC_CloseSession(void* session);
 MORVA_API int Morva_VAD_CloseSession(void* session);
 MORVA_API int Morva_NoiseDB_CloseSession(void* session);
 
-/* [audio thread] Brings a noise-level session back to its start: the same input then gives
- * bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle. Rebuilds the
- * resamplers, so it does allocate. */
+/* [the session's thread, between frames] Brings a noise-level session back to its start: the same
+ * input then gives bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle.
+ * Rebuilds the energy statistics, so it does allocate. */
 MORVA_API int Morva_NoiseDB_ResetSession(void* session);
 
 /* [audio thread] Clean one frame. `inputSize` is the frame size at the input rate, `outputSize` at

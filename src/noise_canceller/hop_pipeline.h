@@ -36,8 +36,6 @@ public:
     // Empties both queues and fills them with their initial silence.
     void reset();
 
-    std::size_t delay() const { return delay_; }
-
     // `model(float const* in, std::vector<float>& out)` reads two hops and leaves two windowed
     // hops. `observe(CompletedHop)` is called after each of them. `frame` holds one session frame;
     // it is replaced by as many delayed output samples.

@@ -8,6 +8,7 @@
 #include <cmath>
 #include <vector>
 
+#include "noise_canceller/feature_statistics.h"
 #include "noise_canceller/hop_pipeline.h"
 #include "noise_canceller/networks.h"
 #include "noise_canceller/noise_level_meter.h"
@@ -20,10 +21,14 @@ template <class NetworkWeights>
 class MaskModel {
 public:
     // The values that the model reads; its checks make every frame call safe.
-    struct Params : SpectralParams, NetworkWeights {
+    struct Params : FeatureStatistics, NetworkWeights, SpectralParams {
         Params(SpectralParams::Environment& environment, std::size_t frameMs,
                Generation const& generation)
-            : SpectralParams(environment, frameMs, generation), NetworkWeights(*environment.first) {
+            : FeatureStatistics(*environment.first),
+              NetworkWeights(*environment.first),
+              SpectralParams(environment, frameMs, generation) {
+            if (mu.empty() || sd.empty()) refuseWeight("MU or SD is empty");
+            if (std::ranges::count(sd, 0.0f) > 0) refuseWeight("SD holds a zero");
             NetworkWeights::check(featureWidth(), bands.bands());
             std::size_t const layers = NetworkWeights::weightNonLinear.size();
             NetworkWeights::packed =
@@ -36,7 +41,7 @@ public:
     MaskModel(Params const& params, CONTAINERS::AnyMap& environment, Generation const& generation,
               Synthesis synthesis = Synthesis::FromKept)
         : params_(params),
-          spectral_(params, environment, generation, synthesis),
+          spectral_(params, params, environment, generation, synthesis),
           pipeline_(params.pipelineShape()),
           state_(params.stateWidth()) {
         std::size_t const widest = params.widest(params.stateWidth() + params.featureWidth());

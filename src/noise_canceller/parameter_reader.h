@@ -4,7 +4,6 @@
 // output. [control thread]
 #pragma once
 
-#include <optional>
 #include <string>
 
 #include "weights/any_map.h"

@@ -34,9 +34,11 @@ std::size_t contextCapacity(SpectralParams const& params) {
 
 }  // namespace
 
-SpectralCleaner::SpectralCleaner(SpectralParams const& params, CONTAINERS::AnyMap& environment,
-                                 Generation const& generation, Synthesis synthesis)
+SpectralCleaner::SpectralCleaner(SpectralParams const& params, FeatureStatistics const& statistics,
+                                 CONTAINERS::AnyMap& environment, Generation const& generation,
+                                 Synthesis synthesis)
     : params_(params),
+      statistics_(statistics),
       level_(generation.level),
       direction_(synthesis),
       transform_(sharedTransform(environment, params.frameLength)),
@@ -93,7 +95,7 @@ void SpectralCleaner::analyse(float const* in, std::vector<float>& x) {
         noiseMean_->calculateNoise();
         for (std::size_t k = 0; k < features_.size(); ++k) features_[k] -= noiseMean_->mean[k];
     }
-    context_.push(features_, params_.mu, params_.sd, x);
+    context_.push(features_, statistics_.mu, statistics_.sd, x);
 }
 
 void SpectralCleaner::synthesise(std::vector<float> const& mask, float floor) {

@@ -1,13 +1,11 @@
 // One model frame from samples to features and, with the network's mask, back to samples. The
 // network runs between the two halves and belongs to the model class:
 //
-//   analyse(in, x)      window, FFT, level reference, band powers, compression, log features,
-//   context
+//   analyse(in, x)  window, FFT, level reference, band powers, log features, context
 //   ... network: x from features to compressed mask ...
-//   applyMask(x)        mask shaping, energy gate, inverse FFT, output gain; leaves the frame in
-//   frame()
+//   applyMask(x)    mask shaping, energy gate, inverse FFT, output gain: then there is a frame()
 //   ... stages that work on the cleaned frame ...
-//   finish(out)         synthesis window, peak limiter
+//   finish(out)     synthesis window, peak limiter
 //
 // Samples are on the 16-bit scale. One thread at a time; windows and transform are shared and only
 // read.
@@ -18,6 +16,7 @@
 #include <vector>
 
 #include "noise_canceller/feature_context.h"
+#include "noise_canceller/feature_statistics.h"
 #include "noise_canceller/mask_shaper.h"
 #include "noise_canceller/shared_objects.h"
 #include "noise_canceller/spectral_params.h"
@@ -34,9 +33,10 @@ enum class Synthesis { FromKept, FromRemoved };
 
 class SpectralCleaner {
 public:
-    // `params` must outlive this object.
-    SpectralCleaner(SpectralParams const& params, CONTAINERS::AnyMap& environment,
-                    Generation const& generation, Synthesis synthesis);
+    // `params` and `statistics` (indexed modulo their length) must outlive this object.
+    SpectralCleaner(SpectralParams const& params, FeatureStatistics const& statistics,
+                    CONTAINERS::AnyMap& environment, Generation const& generation,
+                    Synthesis synthesis);
 
     // Back to the state after construction.
     void reset();
@@ -59,6 +59,7 @@ private:
     float levelGain(float const* in);
 
     SpectralParams const& params_;
+    FeatureStatistics const& statistics_;
     LevelReference level_;
     Synthesis direction_;
     SharedWindow analysis_;

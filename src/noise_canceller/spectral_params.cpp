@@ -1,6 +1,5 @@
 #include "noise_canceller/spectral_params.h"
 
-#include <algorithm>
 #include <iostream>
 #include <string>
 
@@ -25,10 +24,7 @@ std::size_t positive(WEIGHTS::Weight const& weight, char const* name) {
 
 SpectralParams::SpectralParams(Environment& environment, std::size_t frameMs,
                                Generation const& generation)
-    : mu(environment.first->getReference<std::vector<float>>("MU")),
-      sd(environment.first->getReference<std::vector<float>>("SD")),
-      sessionFrameMs(frameMs),
-      bands(0, 0) {
+    : sessionFrameMs(frameMs), bands(0, 0) {
     readStructure(*environment.first);
     readTunables(ParameterReader(environment, generation.suffix), generation);
 }
@@ -57,14 +53,14 @@ void SpectralParams::readStructure(WEIGHTS::Weight const& weight) {
         refuse("CoefficientNumber is " + std::to_string(coefficientNumber) + ", must be " +
                std::to_string(frameLength / 2 + 1));
     }
-    if (begin < 0 || begin >= end || static_cast<std::size_t>(end) > coefficientNumber) {
+    if (begin == end)
+        refuse("the band " + std::to_string(begin) + ".." + std::to_string(end) + " is empty");
+    if (begin < 0 || begin > end || static_cast<std::size_t>(end) > coefficientNumber) {
         refuse("the band " + std::to_string(begin) + ".." + std::to_string(end) +
                " does not lie in the spectrum of " + std::to_string(coefficientNumber) + " bins");
     }
     filtrBegin = static_cast<std::size_t>(begin);
     filtrEnd = static_cast<std::size_t>(end);
-    if (mu.empty() || sd.empty()) refuse("MU or SD is empty");
-    if (std::ranges::count(sd, 0.0f) > 0) refuse("SD holds a zero");
 }
 
 void SpectralParams::readTunables(ParameterReader const& reader, Generation const& generation) {

@@ -3,7 +3,6 @@
 #pragma once
 
 #include <cstddef>
-#include <vector>
 
 #include "noise_canceller/band_layout.h"
 #include "noise_canceller/hop_pipeline.h"
@@ -35,9 +34,6 @@ struct SpectralParams {
 
     // Throws MORVA_Exception for missing values and for a structure that the pipeline cannot run.
     SpectralParams(Environment& environment, std::size_t frameMs, Generation const& generation);
-
-    std::vector<float> const& mu;  // feature means, indexed modulo their length
-    std::vector<float> const& sd;  // feature deviations, likewise
 
     std::size_t sampleRate;  // Hz
     std::size_t step;        // hop, samples

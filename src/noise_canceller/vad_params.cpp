@@ -54,9 +54,6 @@ float Calibration::apply(float raw) const {
     return score;
 }
 
-FeatureStatistics::FeatureStatistics(WEIGHTS::Weight const& weight)
-    : mu(weight.getReference<Values>("MU")), sd(weight.getReference<Values>("SD")) {}
-
 VadParams::VadParams(Environment& environment)
     : FeatureStatistics(*environment.first),
       GatedWeights(*environment.first),

@@ -5,6 +5,7 @@
 #include <optional>
 #include <vector>
 
+#include "noise_canceller/feature_statistics.h"
 #include "noise_canceller/network_weights.h"
 #include "noise_canceller/shared_objects.h"
 #include "weights/model_environment.h"
@@ -19,14 +20,6 @@ struct Calibration {
 
     // The score of a raw output, limited to 0.00001..0.99999.
     float apply(float raw) const;
-};
-
-// Read before the network, so that a weight without anything is missed by its first value.
-struct FeatureStatistics {
-    explicit FeatureStatistics(WEIGHTS::Weight const& weight);
-
-    std::vector<float> const& mu;
-    std::vector<float> const& sd;  // a variance
 };
 
 struct VadParams : FeatureStatistics, GatedWeights {

@@ -1,4 +1,5 @@
-// The one affine product of all layers, over the math library's BLAS.
+// The affine product of a layer over the math library's BLAS: the plain form, for matrices that
+// nobody packed (sessions run on packed_matrix.h).
 //
 // Shapes: W has `rows` x `cols` elements, row-major. x * W + b takes rows inputs and gives cols
 // outputs; W * x + b the reverse. Lengths of x and b are the caller's promise (checked once, where

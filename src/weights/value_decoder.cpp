@@ -39,13 +39,20 @@ void decode(BoundedReader& reader, Matrix& value) {
     UTILS::readMatrix(reader, value);
 }
 
-// The list grows with the elements that really arrive: an empty element takes more memory than its
-// four or eight bytes of file, so that the stored count alone must not decide how much is
-// allocated.
+// What an element without values takes in the file: its count, or its two.
+template <class Element>
+constexpr std::uint64_t emptySize = sizeof(std::uint32_t);
+template <>
+constexpr std::uint64_t emptySize<Matrix> = 2 * sizeof(std::uint32_t);
+
+// A count that the bytes left cannot hold cuts the record before anything is allocated. Below that
+// the list grows with the elements that really arrive: in memory an empty one takes more than in
+// the file.
 template <class Element>
 void decode(BoundedReader& reader, std::vector<Element>& value) {
     std::uint32_t count = 0;
-    reader.readNumber(count);
+    if (!reader.readNumber(count)) return;
+    if (count > reader.bytesLeft() / emptySize<Element>) reader.endData();
     for (std::uint32_t i = 0; i < count && reader.good(); ++i) {
         decode(reader, value.emplace_back());
     }

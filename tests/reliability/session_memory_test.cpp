@@ -37,7 +37,7 @@ TEST(SessionMemory, LoudnessIsForgottenAfterThreeSeconds) {
     test_support::RandomValues random(3);
     auto const sound = random.vector(320, -3000.0F, 3000.0F);
     auto const featuresAfter = [&](float gain, std::size_t hops) {
-        NOISE_CANCELLER::SpectralCleaner cleaner(params, environment->second,
+        NOISE_CANCELLER::SpectralCleaner cleaner(params, params, environment->second,
                                                  NOISE_CANCELLER::generation(6),
                                                  NOISE_CANCELLER::Synthesis::FromKept);
         std::vector<float> x;
