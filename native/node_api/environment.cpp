@@ -75,11 +75,11 @@ std::size_t Environment::LiveCount() {
     return gLiveEnvironments.load();
 }
 
-void Environment::ThrowText(const std::string& text) const {
+void Environment::ThrowText(const char* text) const noexcept {
     if (!Usable()) return;
     bool pending = false;
     if (napi_is_exception_pending(env(), &pending) != napi_ok || pending) return;
-    napi_throw_error(env(), nullptr, text.c_str());
+    napi_throw_error(env(), nullptr, text);
 }
 
 void Environment::ThrowLastError() {

@@ -28,7 +28,8 @@ namespace quorral::node_api {
 class Environment : public std::enable_shared_from_this<Environment> {
 public:
     // [owner thread] Makes the record of this thread's environment current and registers its
-    // teardown. Throws std::runtime_error when the runtime has no event loop to offer.
+    // teardown. Throws std::runtime_error when the runtime refuses what it needs: an event
+    // loop, a place for the record, a hook.
     static void Initialize(napi_env env);
     // [owner thread] Cleanup hook: drops pending work, deletes the references still held, frees the
     // record unless a foreign thread still holds on to it.
@@ -44,7 +45,12 @@ public:
     // [owner thread] Throws a script Error unless one is already pending: the first one wins.
     template <class... Args>
     static void Throw(const Args&... args) {
-        if (const Environment* current = Current()) current->ThrowText(FormatString(args...));
+        if (const Environment* current = Current())
+            current->ThrowText(FormatString(args...).c_str());
+    }
+    // The same for a finished text; takes no memory of its own.
+    static void Throw(const char* text) noexcept {
+        if (const Environment* current = Current()) current->ThrowText(text);
     }
     // [owner thread] Throws the runtime's own text for the last failed interface call.
     static void ThrowLastError();
@@ -97,7 +103,7 @@ public:
 
 private:
     bool IsOwnerThread() const { return pthread_equal(owner_, pthread_self()) != 0; }
-    void ThrowText(const std::string& text) const;
+    void ThrowText(const char* text) const noexcept;
 
     std::atomic<napi_env> env_;
     std::unique_ptr<uv::Executor> executor_;

@@ -75,20 +75,6 @@ Object::Object(napi_value value) : Value(value) {
     if (Type() != napi_object) Clear();
 }
 
-bool Object::Has(const char* name) const {
-    bool has = false;
-    if (!IsEmpty() && Usable()) napi_has_named_property(env(), get(), name, &has);
-    return has;
-}
-
-Value Object::Get(const char* name) const {
-    napi_value value = nullptr;
-    if (!IsEmpty() && Usable() && napi_get_named_property(env(), get(), name, &value) != napi_ok) {
-        value = nullptr;
-    }
-    return Value(value);
-}
-
 void Object::Set(const char* name, const Value& value) const {
     if (IsEmpty() || value.IsEmpty() || !Usable()) return;
     napi_set_named_property(env(), get(), name, value.get());

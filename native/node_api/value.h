@@ -45,8 +45,6 @@ public:
     Object() = default;
     explicit Object(napi_value value);
 
-    bool Has(const char* name) const;
-    Value Get(const char* name) const;
     // Does nothing for an empty object or an empty value.
     void Set(const char* name, const Value& value) const;
 };

@@ -15,13 +15,13 @@ export type ValtoErrorCode =
   | 'ERR_VALTO_LOAD'
   /** The processor lacks SSE 4.1 or AVX2. */
   | 'ERR_VALTO_CPU'
-  /** The engine could not be created. */
+  /** The engine could not be created, or the processor lacks FMA or BMI2. */
   | 'ERR_VALTO_ENGINE'
   /** The install path holds a character that the engine cannot open files under. */
   | 'ERR_VALTO_PATH'
   /** A weight file is not beside the native module. */
   | 'ERR_VALTO_WEIGHT_MISSING'
-  /** A weight file is damaged. */
+  /** A weight file is there but cannot be read. */
   | 'ERR_VALTO_WEIGHT_INVALID'
   /** A session was opened before `initialize()`. */
   | 'ERR_VALTO_NOT_INITIALIZED'
@@ -35,7 +35,7 @@ export type ValtoErrorCode =
   | 'ERR_VALTO_FRAME_DURATION'
   /** A frame does not hold `frameSize` samples. */
   | 'ERR_VALTO_FRAME_SIZE'
-  /** The engine refused to open the session. */
+  /** The engine refused to open the session, for example since its weight file is damaged. */
   | 'ERR_VALTO_SESSION'
   /** The engine failed on a frame. */
   | 'ERR_VALTO_PROCESS'
@@ -141,3 +141,6 @@ export interface RawModule {
 }
 
 export declare const raw: RawModule;
+
+// Only what is marked above is exported.
+export {};

@@ -52,6 +52,7 @@ export class Connection {
   }
 
   close() {
+    if (this.#socket.isPaused) this.#socket.resume(); // or the page's answer would never be read
     this.#socket.close(CLOSE.goingAway, 'the server ends');
   }
 

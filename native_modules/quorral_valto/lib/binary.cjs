@@ -1,6 +1,6 @@
 'use strict';
-// Finds and loads the native module. Its weight files and its resampling library lie beside it, so it
-// is always loaded from where it is installed, never from a copy.
+// Finds and loads the native module. Its weight files lie beside it, so it is always loaded from where
+// it is installed, never from a copy.
 
 const fs = require('node:fs');
 const path = require('node:path');
@@ -14,9 +14,10 @@ const outsideArchive = (file) => file.replace(/\.asar(?=[\\/])/g, '.asar.unpacke
 
 function candidates() {
   const root = path.join(__dirname, '..');
-  const packaged = path.join(root, 'prebuilds', target, FILE);
+  // Inside an archive it is not looked for: Electron would load a copy, far from the weight files.
+  const packaged = outsideArchive(path.join(root, 'prebuilds', target, FILE));
   const built = path.join(root, '..', '..', 'build', 'release', 'quorral_valto', FILE);
-  return [...new Set([outsideArchive(packaged), packaged, built])];
+  return [packaged, built];
 }
 
 function isMusl() {

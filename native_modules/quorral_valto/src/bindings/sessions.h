@@ -5,8 +5,9 @@
 // property `sessions` holding an object; the module then fills that object instead:
 //   initialize(): number                        start-up code; an engine that is already up answers
 //                                               with the code of its own start-up
-//   openNc(rateHz, frameMs, model | null)       a session, or a number (1 not initialised, 2
-//   unknown openVad(rateHz, frameMs, model | null)      model, 3 refused by the engine)
+//   openNc(rateHz, frameMs, model | null)       a session, or 1 (not initialised), 2 (unknown
+//                                               model), 3 (refused by the engine)
+//   openVad(rateHz, frameMs, model | null)      the same
 //   processNc(session, input, output): number   the engine's code; Int16Array in and out
 //   processVad(session, input): number          the voice score, negative on failure
 //   latency(session): number                    delay of a noise-cancellation session, in samples

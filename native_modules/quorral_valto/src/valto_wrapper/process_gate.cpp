@@ -33,7 +33,7 @@ ProcessGate::Pass::~Pass() {
 }
 
 void ProcessGate::Close() {
-    gClosed.store(true);
+    if (gClosed.exchange(true)) return;  // waited for already
     const auto deadline = std::chrono::steady_clock::now() + kLongestWait;
     while (gInFlight.load() != 0 && std::chrono::steady_clock::now() < deadline) {
         std::this_thread::sleep_for(kPoll);

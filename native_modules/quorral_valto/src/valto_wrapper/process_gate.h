@@ -2,7 +2,7 @@
 //
 // A host's audio thread may still push frames while the process's exit handlers destroy the engine
 // and the caches under it. No object of this module is destroyed before the gate is closed and the
-// calls inside have come back (exit_order.cpp).
+// calls inside have come back, or two seconds have passed (exit_order.cpp).
 // Thread rule: any thread. Pass: two atomic operations, no lock. Close: waits.
 #pragma once
 
@@ -24,7 +24,7 @@ public:
         bool entered_;
     };
 
-    // Closes the gate for good and waits for the calls inside.
+    // Closes the gate for good; the first call waits for the calls inside, two seconds at most.
     static void Close();
 };
 

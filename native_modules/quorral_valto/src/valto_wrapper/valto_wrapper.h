@@ -8,8 +8,8 @@
 namespace quorral {
 
 // 0 on success; -1 no SSE 4.1, -2 no AVX2, -4 the engine cannot be created (or exists already),
-// -5 to -8 the first to fourth weight file cannot be registered. Each failure prints one line on
-// standard output. What was registered before a failure stays.
+// -5 to -8 the first to fourth weight file cannot be registered. Each failure but a lack of memory
+// prints one line on standard output. What was registered before a failure stays.
 int ValtoInitialize();
 int ValtoInitialize(CpuFeatureQuery query);
 

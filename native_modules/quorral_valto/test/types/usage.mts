@@ -56,5 +56,8 @@ new NoiseCanceller({ sampleRate: 48000, frameMs: 15 });
 new NoiseCanceller({ sampleRate: 48000, frameMs: 10 }).process(new Float32Array(480));
 // @ts-expect-error voice activity has no automatic choice
 setVadModel(null);
+// @ts-expect-error the common base is no export
+import { Session } from 'quorral_valto';
+
 // @ts-expect-error read only
 new VoiceActivityDetector({ sampleRate: 8000, frameMs: 10 }).frameSize = 3;
