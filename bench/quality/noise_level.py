@@ -2,8 +2,8 @@
 
     python bench/quality/noise_level.py --store STORE models/noise_level_16k.mvw
 
-Steady noises are white, pink and brown noise and the held-out recordings whose level varies by
-less than 3 dB; each is scaled to several true levels. The value compared is the median of the
+Steady noises are white, pink and brown noise and the held-out recordings whose level
+(100 ms blocks) deviates by less than 1 dB and spans less than 6 dB; each is scaled to several true levels. The value compared is the median of the
 reported levels after two seconds (16-bit scale, dB).
 """
 
@@ -55,7 +55,7 @@ def reported(weight: mvw.Weight, samples: np.ndarray) -> float:
 
 
 def speech_of(store: Path, split: str) -> np.ndarray:
-    """Six seconds of one held-out speaker."""
+    """Six seconds of one held-out speaker, the one with the longest recording."""
     voices = Store(store, "speech", RATE)
     clips = sorted(voices.of_split(split), key=lambda clip: -clip.length)
     speech = np.concatenate([voices.read(c) for c in clips if c.category == clips[0].category])

@@ -14,7 +14,8 @@ blocks that its frame covers, so a peer with longer frames may look ahead to the
 First, for each frame length: the area under the ROC curve over all frames and over those further
 than 50 ms from where a voice starts or ends, the best F1, the F1 at score 0.5 (both over all).
 Then, for 10 ms and each signal-to-noise ratio: the area under the curve, and how long after a
-word's start the score passes 0.5 (words after at least 0.3 s of silence). Last, the share of
+word's start the score passes 0.5 (words after at least 0.3 s of silence whose score is not above it
+beforehand). Last, the share of
 frames above 0.5 in recordings without any speech, by category, and in babble.
 """
 
@@ -41,7 +42,10 @@ from morva_training.corpus import BASE_RATE, Store
 from morva_training.engine import VoiceModel
 from morva_training.voice import BLOCK, RATE, block_labels, frame_labels
 
-FOOLING = ("music", "keyboard", "mouse_click", "human_nonspeech", "animal", "dog_bark", "vacuum", "rain", "birds")
+FOOLING = (
+    "music", "keyboard", "mouse_click", "human_nonspeech", "snoring", "baby_cry", "animal", "cat", "dog_bark",
+    "vacuum", "rain", "birds",
+)  # fmt: skip
 BABBLE_RMS = 1000.0  # of each talker
 COLLAR_BLOCKS = 5  # of 10 ms, on both sides of a start or end
 

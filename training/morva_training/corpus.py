@@ -42,6 +42,10 @@ def read_manifest(table: Path) -> list[dict[str, str]]:
     """Rows of a tab-separated manifest with a header line, without the excluded speakers."""
     with table.open(newline="", encoding="utf-8") as handle:
         rows = list(csv.DictReader(handle, delimiter="\t"))
+    return without_excluded(rows)
+
+
+def without_excluded(rows: list[dict[str, str]]) -> list[dict[str, str]]:
     return [row for row in rows if not row.get("speaker", "").endswith(EXCLUDED_SPEAKERS)]
 
 
@@ -49,7 +53,8 @@ def rows_of_folder(folder: Path, kind: str) -> list[dict[str, str]]:
     """Manifest rows for a bare folder: everything is training material, a folder is a category."""
     files = sorted(p for p in folder.rglob("*") if p.suffix.lower() in AUDIO_SUFFIXES)
     column = "speaker" if kind == "speech" else "category"
-    return [{"path": str(p.relative_to(folder.parent)), column: p.parent.name, "split": "train"} for p in files]
+    rows = [{"path": str(p.relative_to(folder.parent)), column: p.parent.name, "split": "train"} for p in files]
+    return without_excluded(rows)
 
 
 def read_audio(path: Path, rate: int) -> np.ndarray:

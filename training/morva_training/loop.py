@@ -114,8 +114,8 @@ class Run:
         the network goes back to its averaged weights: a gated layer without normalisation can run
         away, and no step taken from there leads back.
         """
-        sums: dict[str, float] = {}
-        counted = 0
+        parts_seen: dict[str, list[float]] = {}
+        ran_away = 0
         usual: float | None = None
         started, before = time.monotonic(), self.seconds
         bar = tqdm(
@@ -141,17 +141,18 @@ class Run:
                     self.optimiser.step()
                     self._update_average()
             else:
-                parts = {"ran_away": 1.0}
+                parts = {}
+                ran_away += 1
                 self._back_to_average()
             self.step += 1
-            counted += 1
             self.seconds = before + time.monotonic() - started
             for name, value in parts.items():
-                sums[name] = sums.get(name, 0.0) + value
+                parts_seen.setdefault(name, []).append(value)
             bar.update()
             if self.step % self.schedule.checkpoint_every == 0 or self.step == self.schedule.steps:
-                self.log({name: round(value / counted, 4) for name, value in sums.items()})
-                sums, counted = {}, 0
+                means = {name: round(sum(values) / len(values), 4) for name, values in parts_seen.items()}
+                self.log({**means, **({"ran_away": ran_away} if ran_away else {})})
+                parts_seen, ran_away = {}, 0
                 self.save()
             if (
                 validate

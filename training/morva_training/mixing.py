@@ -55,6 +55,7 @@ class Recipe:
     noise_speed: tuple[float, float] = (0.75, 1.35)
     whisper_share: float = 0.04
     full_band_share: float = 0.35
+    equaliser_db: float = 3.0  # deviation from one point of the equaliser to the next
     boosted: tuple[str, ...] = IMPULSIVE  # noise categories drawn three times as often
 
 
@@ -151,12 +152,37 @@ def coloured_noise(rng: np.random.Generator, count: int, rate: int) -> np.ndarra
     return noise.astype(np.float32)
 
 
-def smooth_gain(rng: np.random.Generator, bins: int, deviation_db: float) -> np.ndarray:
-    """A smooth random equaliser over the bins: six points, evenly spaced in octaves."""
+def resampled(samples: np.ndarray, ratio: float) -> np.ndarray:
+    """Band-limited, about `ratio` times as long (as the transform finds convenient)."""
+    size = sfft.next_fast_len(len(samples), real=True)
+    target = sfft.next_fast_len(max(1, round(size * ratio)), real=True)
+    spectrum = sfft.rfft(samples, size)[: target // 2 + 1]
+    out = sfft.irfft(spectrum, target) * np.float32(target / size)
+    return out[: round(len(samples) * target / size)]
+
+
+def smooth_gain(rng: np.random.Generator, bins: int, rate: int, deviation_db: float) -> np.ndarray:
+    """A smooth random equaliser over the bins up to rate / 2: six points, evenly spaced in octaves."""
     points = np.cumsum(rng.normal(0.0, deviation_db, 6)) * 0.6
-    position = np.log2(1 + np.arange(bins) / 4.0) / np.log2(1 + bins / 4.0) * 5
+    frequency = np.linspace(0.0, rate / 2, bins)
+    position = np.log2(1 + frequency / 200.0) / np.log2(1 + rate / 400.0) * 5
     curve = np.interp(position, np.arange(6), points - points.mean())
     return (10 ** (curve / 20)).astype(np.float32)
+
+
+class Warped:
+    """Recordings faster and higher, or slower and lower. They come from the store of twice the rate
+    where there is one, so that slower ones lose no treble."""
+
+    def __init__(self, store: Path, kind: str, rate: int) -> None:
+        self.ratio = 2 if rate < BASE_RATE else 1
+        self.fine = Store(store, kind, rate * self.ratio)
+        self.clips = {clip.path: clip for clip in self.fine.clips}
+
+    def read(self, clip: Clip, offset: int, length: int, factor: float) -> np.ndarray:
+        """About `length` samples, or what there is, of a clip of the plain store from its `offset` on."""
+        piece = self.fine.read(self.clips[clip.path], offset * self.ratio, int(length * self.ratio * factor))
+        return resampled(piece, 1.0 / (self.ratio * factor)) if len(piece) else piece
 
 
 @dataclass
@@ -173,6 +199,8 @@ class MixtureMaker:
         self.rng = np.random.default_rng(self.seed)
         self.speech = Store(self.store, "speech", self.rate)
         self.noise = Store(self.store, "noise", self.rate)
+        self.warped_speech = Warped(self.store, "speech", self.rate)
+        self.warped_noise = Warped(self.store, "noise", self.rate)
         self.block = self.rate // 50
         self.count = int(self.recipe.seconds * self.rate) // self.block * self.block
         rooms = load_rooms(self.store, "heldout" if self.split == "heldout" else "train")
@@ -219,21 +247,18 @@ class MixtureMaker:
         while position < self.count:
             clip = clips[self.rng.integers(len(clips))]
             offset = int(self.rng.integers(max(1, clip.length - self.rate))) if self.rng.random() < 0.4 else 0
-            piece = self.speech.read(clip, offset, self.count)
             if self.rng.random() < self.recipe.speed_share:
-                piece = self._speed(piece, *self.recipe.speed)
+                piece = self.warped_speech.read(
+                    clip, offset, self.count - position, self.rng.uniform(*self.recipe.speed)
+                )
+            else:
+                piece = self.speech.read(clip, offset, self.count)
             piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
             if pauses and self.rng.random() < self.recipe.pause_share:
                 position += int(self.rng.exponential(self.recipe.pause_seconds) * self.rate)
         return out
-
-    def _speed(self, piece: np.ndarray, slowest: float, fastest: float) -> np.ndarray:
-        """Faster and higher, or slower and lower (linear interpolation)."""
-        factor = self.rng.uniform(slowest, fastest)
-        points = np.arange(0, len(piece) - 1, factor)
-        return np.interp(points, np.arange(len(piece)), piece).astype(np.float32)
 
     def babble(self) -> np.ndarray:
         """Many talkers at similar levels, most of them in the same room."""
@@ -265,9 +290,12 @@ class MixtureMaker:
         position = 0
         warped = self.rng.random() < self.recipe.noise_speed_share
         while position < self.count:
-            piece = self.noise.read(clip, offset, self.count)
             if warped:
-                piece = self._speed(piece, *self.recipe.noise_speed)
+                piece = self.warped_noise.read(
+                    clip, offset, self.count - position, self.rng.uniform(*self.recipe.noise_speed)
+                )
+            else:
+                piece = self.noise.read(clip, offset, self.count)
             piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
@@ -314,12 +342,12 @@ class MixtureMaker:
 
     def equalisers(self, bins: int) -> tuple[np.ndarray, np.ndarray]:
         """Gains over the bins for the speech and for what disturbs it; both share the microphone's."""
-        gain = smooth_gain(self.rng, bins, 3.0)
+        gain = smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)
         if self.rng.random() < self.recipe.band_limit_share:
             edge = self.rng.uniform(3300, 12000) / (self.rate / 2)
             steepness = np.clip((np.arange(bins) / bins - edge) * 200, -40, 40)
             gain = (gain / (1 + np.exp(steepness))).astype(np.float32)
-        return gain, gain * smooth_gain(self.rng, bins, 3.0)
+        return gain, gain * smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)
 
     def draw(self) -> Mixture:
         """One piece as spectra; equalisation and band limits are done on these. Needs the base rate."""

@@ -27,6 +27,13 @@ def rank() -> int:
     return distributed.get_rank() if distributed.is_initialized() else 0
 
 
+def from_the_first(values: Tensor) -> Tensor:
+    """What the first process has; all of them must ask."""
+    if distributed.is_initialized():
+        distributed.broadcast(values, 0)
+    return values
+
+
 def any_of_us(flag: bool) -> bool:
     if not distributed.is_initialized():
         return flag

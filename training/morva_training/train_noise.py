@@ -96,7 +96,11 @@ def main() -> None:
         torch.set_num_threads(1)
     recipe = replace(LEVEL_RECIPE if args.level else Recipe(), seconds=args.seconds)
     # A resumed run must not hear the same mixtures again: the seed moves with the step.
-    done = torch.load(args.run / "checkpoint.pt")["step"] if (args.run / "checkpoint.pt").exists() else 0
+    done = (
+        torch.load(args.run / "checkpoint.pt", map_location="cpu")["step"]
+        if (args.run / "checkpoint.pt").exists()
+        else 0
+    )
     source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done, args.reuse)
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     network, mean, deviation = start(args, layout, loader)

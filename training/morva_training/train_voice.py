@@ -28,7 +28,7 @@ from .mvw import Weight
 from .networks import PlainGatedNetwork
 from .reshape import deepened, widened, with_outputs
 from .scoring import best_f1, quick_threshold, roc_auc
-from .voice import CONTEXT, FEATURES, FRAME, RATE, VOICE_RECIPE, VoiceBatches, network_input
+from .voice import CONTEXT, DEV_RECIPE, FEATURES, FRAME, RATE, VOICE_RECIPE, VoiceBatches, network_input
 
 SKIPPED_FRAMES = 5
 F1_SLACK = 0.003
@@ -77,7 +77,11 @@ def main() -> None:
     torch.manual_seed(args.seed)
     if device.type == "cpu":
         torch.set_num_threads(1)
-    done = torch.load(args.run / "checkpoint.pt")["step"] if (args.run / "checkpoint.pt").exists() else 0
+    done = (
+        torch.load(args.run / "checkpoint.pt", map_location="cpu")["step"]
+        if (args.run / "checkpoint.pt").exists()
+        else 0
+    )
     source = VoiceBatches(args.store, args.batch, args.seed + 7919 * done + 104729 * together.join())
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     if args.start:
@@ -86,7 +90,8 @@ def main() -> None:
         network = deepened(widened(network, args.hidden), args.layers)
     else:
         some = torch.cat([next(loader)["features"].flatten(0, 1) for _ in range(4)])
-        mean, variance = some.mean(0).numpy(), some.var(0).clamp_min(1e-2).numpy()
+        mean = together.from_the_first(some.mean(0)).numpy()
+        variance = together.from_the_first(some.var(0).clamp_min(1e-2)).numpy()
         network = PlainGatedNetwork(CONTEXT * FEATURES, args.hidden, 1, args.layers, linear_output=True)
     network = with_outputs(network, 1 + FEATURES)
     if args.bfloat16:
@@ -117,7 +122,7 @@ def main() -> None:
         voice = torch.cat([b["voice"][:, SKIPPED_FRAMES:].flatten() for b in batches]) > 0.5
         return scores[sure].numpy(), voice[sure].numpy()
 
-    dev = held_out(5, VOICE_RECIPE)
+    dev = held_out(5, DEV_RECIPE)
 
     def validate(model: nn.Module) -> dict[str, float]:
         scores, voice = scored(model, dev)

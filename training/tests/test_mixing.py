@@ -11,7 +11,16 @@ import pytest
 
 from morva_training import corpus
 from morva_training.batches import MixtureBatches, make_item
-from morva_training.mixing import MixtureMaker, Recipe, active_level, in_dev, simulated_room, smooth_gain, whispered
+from morva_training.mixing import (
+    MixtureMaker,
+    Recipe,
+    Warped,
+    active_level,
+    in_dev,
+    simulated_room,
+    smooth_gain,
+    whispered,
+)
 from morva_training.spectra import FULL_32K, SMALL_8K, SMALL_16K
 
 PLAIN = Recipe(seconds=2.0, clean_share=0.0, noise_only_share=0.0, room_share=0.0, clip_share=0.0, band_limit_share=0.0)
@@ -114,8 +123,31 @@ def test_rooms_and_equalisers_keep_their_scale() -> None:
     for _ in range(20):
         room = simulated_room(rng, 32000)
         assert room[0] == 1.0 and np.isfinite(room).all() and np.sum(room**2) < 3.0
-        gain = smooth_gain(rng, 321, 3.0)
+        gain = smooth_gain(rng, 321, 32000, 3.0)
         assert (gain > 0).all() and np.abs(np.diff(20 * np.log10(gain))).max() < 6.0
+
+
+def test_equalisers_have_the_same_shape_for_any_number_of_bins() -> None:
+    fine, coarse = (20 * np.log10(smooth_gain(np.random.default_rng(7), bins, 8000, 4.5)) for bins in (20001, 81))
+    assert np.abs(fine[::250] - coarse).max() < 0.01
+    assert np.ptp(fine[1000:19000]) > 3.0, "200 to 3800 Hz are what it is for"
+
+
+@pytest.mark.parametrize("factor", [0.7, 1.4])
+def test_a_warped_recording_keeps_its_level_and_has_no_images(store: Path, factor: float) -> None:
+    """A tone at a third of the rate moves by the factor, alone; above the highest frequency it is gone."""
+    rate = 8000
+    warped = Warped(store, "speech", rate)
+    tone = 1000 * np.sin(2 * np.pi * 2700.0 / 16000 * np.arange(32000)).astype(np.float32)
+    warped.fine.read = lambda clip, offset, length: tone[:length]
+    piece = warped.read(warped.fine.clips[0], 0, 8000, factor)
+    assert abs(len(piece) - 8000) < 100
+    spectrum = np.abs(np.fft.rfft(piece[500:7500] * np.hanning(7000))) / 7000 * 4
+    peak = np.argmax(spectrum) * rate / 7000
+    assert peak == pytest.approx(2700 * factor, rel=0.02)
+    assert np.sqrt(2 * np.mean(np.square(piece[500:-500]))) == pytest.approx(1000, rel=0.02)
+    away = np.abs(np.arange(len(spectrum)) * rate / 7000 - peak) > 60
+    assert spectrum[away].max() < 3.0
 
 
 @pytest.mark.parametrize("layout", [FULL_32K, SMALL_16K, SMALL_8K], ids=lambda layout: str(layout.rate))

@@ -38,6 +38,16 @@ def test_labels_close_gaps_and_drop_islands() -> None:
     assert weight[10] == 2.0 and weight[0] == 1.0
 
 
+def test_rumble_is_no_voice() -> None:
+    """A hum below all voices, as loud as the words: before them there is nothing."""
+    words = bursts(np.random.default_rng(2), [0] * 60 + [1] * 30 + [0] * 60)
+    hum = 3000 * np.sin(2 * np.pi * 30 / 8000 * np.arange(len(words)))
+    quiet, _ = block_labels(words)
+    humming, weight = block_labels(words + hum.astype(np.float32))
+    assert not humming[:59].any() and (humming != quiet).sum() <= 2
+    assert weight[1:50].min() == 1.0
+
+
 def test_no_speech_has_no_voice() -> None:
     voice, weight = block_labels(np.zeros(8000, np.float32))
     assert not voice.any() and (weight == 1).all()
