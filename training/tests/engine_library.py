@@ -15,6 +15,23 @@ def library_path() -> Path:
     return Path(os.environ.get("MORVA_LIBRARY", ROOT / "build" / "release" / "libmorva.so"))
 
 
+def network_masks(weight: bytes, samples: np.ndarray, bands: int) -> np.ndarray:
+    """The engine's network output, [frames, bands], for a recording at the model's rate on the 16-bit scale."""
+    probe = ctypes.CDLL(str(library_path().parent / "tests" / "noise_canceller" / "libmorva_mask_probe.so")).mask_probe
+    probe.restype = ctypes.c_size_t
+    probe.argtypes = [
+        ctypes.c_char_p,
+        ctypes.c_size_t,
+        ctypes.c_void_p,
+        ctypes.c_size_t,
+        ctypes.c_void_p,
+        ctypes.c_size_t,
+    ]
+    source, masks = np.ascontiguousarray(samples, np.float32), np.empty(len(samples) * bands, np.float32)
+    count = probe(weight, len(weight), source.ctypes.data, len(source), masks.ctypes.data, len(masks))
+    return masks[:count].reshape(-1, bands)
+
+
 class Engine:
     """One initialised engine. Models are registered from bytes; streams run frame by frame."""
 

@@ -12,10 +12,11 @@ import numpy as np
 import pytest
 import torch
 from conftest import voice_like
-from engine_library import ROOT, Engine, library_path
+from engine_library import ROOT, Engine, library_path, network_masks
 
 from morva_training import mvw
 from morva_training.convert import layout_of, noise_weight
+from morva_training.corpus import read_audio
 from morva_training.engine import NoiseLevelModel, NoiseModel, VoiceModel
 from morva_training.networks import LayerNormGatedNetwork, PlainGatedNetwork
 from morva_training.spectra import FULL_32K, SMALL_8K, SMALL_16K, Layout
@@ -44,6 +45,12 @@ def recording(rate: int, seconds: float = 2.5, seed: int = 5) -> np.ndarray:
     return np.clip(samples, -32768, 32767).astype(np.float32)
 
 
+def bundled_recording(rate: int) -> np.ndarray:
+    """Real speech in noise, likewise."""
+    samples = read_audio(ROOT / "examples" / "audio" / "noisy.flac", rate)[: 3 * rate]
+    return np.clip(np.rint(samples * 32768.0), -32768, 32767).astype(np.float32)
+
+
 def random_weight(kind: type, layout: Layout, seed: int, controls: dict | None = None) -> mvw.Weight:
     torch.manual_seed(seed)
     network = kind(layout.preview * layout.bands, 24, layout.bands)
@@ -62,9 +69,27 @@ def reference_output(weight: mvw.Weight, samples: np.ndarray, frame_ms: int) -> 
     return np.clip(np.concatenate(frames), -32768, 32767)
 
 
-def assert_same_audio(engine: Engine, weight: mvw.Weight, frame_ms: int, seed: int = 5) -> None:
+def assert_same_masks(weight: mvw.Weight, samples: np.ndarray) -> None:
+    model = NoiseModel(weight)
+    step, expected = model.step, []
+
+    def noted(x: np.ndarray) -> np.ndarray:
+        expected.append(step(x))
+        return expected[-1]
+
+    model.step = noted
+    layout = model.layout
+    for at in range(0, len(samples) - layout.frame + 1, layout.hop):
+        model.hop(samples[at : at + layout.frame])
+    masks = network_masks(mvw.encode(weight), samples, layout.bands)
+    assert masks.shape == (len(expected), layout.bands)
+    assert np.ptp(masks) > 0.01
+    assert np.abs(masks - np.array(expected)).max() < 1e-3
+
+
+def assert_same_audio(engine: Engine, weight: mvw.Weight, frame_ms: int, samples: np.ndarray) -> None:
     rate = layout_of(weight).rate
-    samples = recording(rate, seed=seed)
+    assert_same_masks(weight, samples)
     expected = reference_output(weight, samples, frame_ms)
     result = engine.clean(engine.register(mvw.encode(weight)), samples / 32768.0, rate, frame_ms) * 32768.0
     assert np.abs(expected).max() > 100, "the comparison must not be of silence"
@@ -76,7 +101,8 @@ def assert_same_audio(engine: Engine, weight: mvw.Weight, frame_ms: int, seed: i
 @pytest.mark.parametrize("layout", [FULL_32K, SMALL_16K, SMALL_8K], ids=lambda layout: str(layout.rate))
 @pytest.mark.parametrize("kind", [LayerNormGatedNetwork, PlainGatedNetwork])
 def test_random_noise_model(engine: Engine, kind: type, layout: Layout, frame_ms: int) -> None:
-    assert_same_audio(engine, random_weight(kind, layout, layout.rate + frame_ms), frame_ms, seed=frame_ms)
+    weight = random_weight(kind, layout, layout.rate + frame_ms)
+    assert_same_audio(engine, weight, frame_ms, recording(layout.rate, seed=frame_ms))
 
 
 @pytest.mark.parametrize(
@@ -92,18 +118,18 @@ def test_random_noise_model(engine: Engine, kind: type, layout: Layout, frame_ms
 )
 def test_tunable_parameters(engine: Engine, controls: dict) -> None:
     seed = 100 + sum(map(len, controls))
-    assert_same_audio(engine, random_weight(LayerNormGatedNetwork, SMALL_16K, seed, controls), 10)
+    weight = random_weight(LayerNormGatedNetwork, SMALL_16K, seed, controls)
+    assert_same_audio(engine, weight, 10, recording(16000))
 
 
 def test_random_noise_level(engine: Engine) -> None:
     weight = random_weight(PlainGatedNetwork, SMALL_16K, 9)
-    assert_same_levels(engine, weight, 10)
-    assert_same_levels(engine, weight, 30)
+    assert_same_levels(engine, weight, 10, recording(16000))
+    assert_same_levels(engine, weight, 30, recording(16000))
 
 
-def assert_same_levels(engine: Engine, weight: mvw.Weight, frame_ms: int) -> None:
+def assert_same_levels(engine: Engine, weight: mvw.Weight, frame_ms: int, samples: np.ndarray) -> None:
     rate = layout_of(weight).rate
-    samples = recording(rate)
     size = rate * frame_ms // 1000
     model = NoiseLevelModel(weight, frame_ms)
     expected = [model.level(samples[at : at + size]) for at in range(0, len(samples) // size * size, size)]
@@ -111,8 +137,7 @@ def assert_same_levels(engine: Engine, weight: mvw.Weight, frame_ms: int) -> Non
     assert np.abs(levels - expected).max() < 0.05
 
 
-def assert_same_scores(engine: Engine, weight: mvw.Weight, frame_ms: int) -> None:
-    samples = recording(8000)
+def assert_same_scores(engine: Engine, weight: mvw.Weight, frame_ms: int, samples: np.ndarray) -> None:
     size = 8 * frame_ms
     model = VoiceModel(weight)
     expected = np.array([model.score(samples[at : at + size]) for at in range(0, len(samples) // size * size, size)])
@@ -128,7 +153,7 @@ def test_random_voice_model(engine: Engine, frame_ms: int) -> None:
     rng = np.random.default_rng(frame_ms)
     weight = voice_weight(network, rng.uniform(8, 12, 61), rng.uniform(4, 9, 61), [-3.0, 0.1, 4.0])
     weight["ModelName"] = f"random voice {frame_ms}".encode()
-    assert_same_scores(engine, weight, frame_ms)
+    assert_same_scores(engine, weight, frame_ms, recording(8000))
 
 
 @pytest.mark.parametrize("frame_ms", [10, 40])
@@ -136,9 +161,10 @@ def test_random_voice_model(engine: Engine, frame_ms: int) -> None:
 def test_shipped_weight(engine: Engine, path: Path, frame_ms: int) -> None:
     weight = mvw.read(path)
     version = bytes(weight["Version"])
+    samples = bundled_recording(int(weight["SampleRate"]))
     if b"VAD" in version:
-        assert_same_scores(engine, weight, frame_ms)
+        assert_same_scores(engine, weight, frame_ms, samples)
         return
-    assert_same_audio(engine, weight, frame_ms)
+    assert_same_audio(engine, weight, frame_ms, samples)
     if version == b"0.0.5":
-        assert_same_levels(engine, weight, frame_ms)
+        assert_same_levels(engine, weight, frame_ms, samples)
