@@ -142,5 +142,6 @@ export interface RawModule {
 
 export declare const raw: RawModule;
 
-// Only what is marked above is exported.
+// In a declaration file this is what keeps unmarked names (Session) from being exported, too.
+// biome-ignore lint/complexity/noUselessEmptyExport: see above
 export {};

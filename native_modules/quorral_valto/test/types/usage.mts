@@ -57,7 +57,6 @@ new NoiseCanceller({ sampleRate: 48000, frameMs: 10 }).process(new Float32Array(
 // @ts-expect-error voice activity has no automatic choice
 setVadModel(null);
 // @ts-expect-error the common base is no export
-import { Session } from 'quorral_valto';
-
+export type Base = import('quorral_valto').Session;
 // @ts-expect-error read only
 new VoiceActivityDetector({ sampleRate: 8000, frameMs: 10 }).frameSize = 3;
