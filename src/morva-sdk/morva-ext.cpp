@@ -7,6 +7,7 @@
 
 #include "morva-sdk/cpu_support.h"
 #include "morva-sdk/error_funnel.h"
+#include "morva-sdk/handles.h"
 #include "morva-sdk/instance.h"
 #include "morva-sdk/last_error.h"
 #include "morva-sdk/model_facts.h"
@@ -15,25 +16,13 @@ namespace {
 
 using namespace MORVA::MORVA_SDK;
 
-constexpr char const* kWrongSession =
-    "The Session pointer is wrong insert existing session pointer";
-
-MorvaInstanceT& engine() {
-    return *MorvaInstanceT::Instance(MorvaInstanceT::MODE::get, nullptr);
-}
-
-constexpr auto kAnyType = MorvaSessionType::Unknown;
-
 // Runs `body` on the live session of that type behind a handle; 2 with the usual line when there is
 // none.
 template <class Body>
 int withSession(void* handle, MorvaSessionType type, Body&& body) {
     return funnel(kIntFailures, [&] {
-        auto const& instance = engine();
-        auto* const session = static_cast<MorvaSessionT*>(handle);
-        bool const known = instance.isSessionTrue(session) &&
-                           (type == kAnyType || instance.getSessionType(session) == type);
-        if (!known) {
+        auto* const session = sessionOf(handle, type);
+        if (session == nullptr) {
             printError(kWrongSession);
             return 2;
         }

@@ -8,6 +8,7 @@
 
 #include "morva-sdk/cpu_support.h"
 #include "morva-sdk/error_funnel.h"
+#include "morva-sdk/handles.h"
 #include "morva-sdk/instance.h"
 #include "morva-sdk/last_error.h"
 #include "utils/math_setup.h"
@@ -18,26 +19,11 @@ using namespace MORVA::MORVA_SDK;
 using MODE = MorvaInstanceT::MODE;
 
 constexpr char const* kUnit = "src/morva-sdk/morva-sdk";
-constexpr char const* kWrongSession =
-    "The Session pointer is wrong insert existing session pointer";
-
-MorvaInstanceT& engine() {
-    return *MorvaInstanceT::Instance(MODE::get, nullptr);
-}
 
 bool isSupported(MorvaSamplingRate rate) {
     constexpr int kRates[] = {8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
     return std::find(std::begin(kRates), std::end(kRates), static_cast<int>(rate)) !=
            std::end(kRates);
-}
-
-// The live session of that type behind a handle, or null.
-MorvaSessionT* sessionOf(void* handle, MorvaSessionType type) {
-    auto const& instance = engine();
-    auto* const session = static_cast<MorvaSessionT*>(handle);
-    bool const matches =
-        instance.isSessionTrue(session) && instance.getSessionType(session) == type;
-    return matches ? session : nullptr;
 }
 
 template <class Register>

@@ -34,7 +34,8 @@ public:
 
     MorvaSessionType getType() const { return type_; }
 
-    // Cleans one frame; false, with a line on standard error, for wrong sizes or null pointers.
+    // Cleans one frame of a noise-cancellation session; false, with a line on standard error, for
+    // wrong sizes or null pointers.
     bool cleanNoise(short const* input, std::size_t inputSize, short* output,
                     std::size_t outputSize);
     bool cleanNoise(float const* input, std::size_t inputSize, float* output,

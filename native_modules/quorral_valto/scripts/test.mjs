@@ -8,7 +8,6 @@
 import { execFileSync, spawnSync } from 'node:child_process';
 import {
   cpSync,
-  existsSync,
   mkdirSync,
   mkdtempSync,
   readdirSync,
@@ -61,15 +60,6 @@ function install(tarball, folder) {
   }
 }
 
-// A tree whose voice-activity model is still to be trained is tested with a random one.
-async function completeWeights(folder) {
-  const file = path.join(folder, 'node_modules/quorral_valto/prebuilds/linux-x64/VAD_weight.mvw');
-  if (existsSync(file)) return;
-  say('no voice-activity weight was built: testing with a random one');
-  const { writeRandomVadWeight } = await import('../test/support/random-vad-weight.mjs');
-  writeRandomVadWeight(file);
-}
-
 function sanitizerEnvironment() {
   const library = (name) =>
     execFileSync('gcc', [`-print-file-name=${name}`], { encoding: 'utf8' }).trim();
@@ -109,6 +99,5 @@ if (!options.sanitizer) {
   say('types');
   run(bin('tsc'), ['--project', path.join(app, 'test/types')]);
 }
-await completeWeights(app);
 say('suite');
 process.exitCode = suite(app).status ?? 1;

@@ -159,3 +159,9 @@ test('inside an archive the unpacked copy is loaded', async (t) => {
   );
   assert.equal(stdout, '3\n');
 });
+
+test('a native file that stayed inside an archive is not loaded from there', async (t) => {
+  const message = await loadFailure(copyPackage(t, 'app.asar/node_modules'));
+  for (const part of ['app.asar.unpacked', 'keep the folder "prebuilds"'])
+    assert.ok(message.includes(part), message);
+});
