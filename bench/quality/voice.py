@@ -13,9 +13,9 @@ blocks that its frame covers, so a peer with longer frames may look ahead to the
 
 First, for each frame length: the area under the ROC curve over all frames and over those further
 than 50 ms from where a voice starts or ends, the best F1, the F1 at score 0.5 (both over all).
-Then, for 10 ms and each signal-to-noise ratio: the area under the curve, and how long after a
-word's start the score passes 0.5 (words after at least 0.3 s of silence whose score is not above it
-beforehand). Last, the share of
+Then, for 10 ms and each signal-to-noise ratio: the area under the curve, how many words raise the
+score by 0.05 within 30 ms of their start, and how long after it the score passes 0.5 (words after
+at least 0.3 s of silence whose score is not above 0.5 beforehand). Last, the share of
 frames above 0.5 in recordings without any speech, by category, and in babble.
 """
 
@@ -47,6 +47,7 @@ FOOLING = (
     "vacuum", "rain", "birds",
 )  # fmt: skip
 BABBLE_RMS = 1000.0  # of each talker
+RISE = 0.05
 COLLAR_BLOCKS = 5  # of 10 ms, on both sides of a start or end
 
 Scorer = Callable[[np.ndarray, int, int], np.ndarray]  # samples, rate, blocks per frame -> score per frame
@@ -116,15 +117,22 @@ def near_an_edge(voice: np.ndarray) -> np.ndarray:
     return near
 
 
+def word_starts(scores: np.ndarray, voice: np.ndarray) -> list[int]:
+    """First blocks of words after 0.3 s of silence in whose last block the score is not above 0.5."""
+    starts = np.flatnonzero(np.diff(voice.astype(int)) == 1) + 1
+    return [s for s in starts if s >= 30 and not voice[s - 30 : s].any() and scores[s - 1] <= 0.5]
+
+
 def onset_delays(scores: np.ndarray, voice: np.ndarray) -> list[float]:
-    """Milliseconds from a word's start, after 0.3 s of silence, to the end of the first frame above 0.5."""
-    delays = []
-    for start in np.flatnonzero(np.diff(voice.astype(int)) == 1) + 1:
-        if start < 30 or voice[start - 30 : start].any() or scores[start - 1] > 0.5:
-            continue
-        above = np.flatnonzero(scores[start : start + 50] > 0.5)
-        delays.append(10.0 * (above[0] + 1) if len(above) else 500.0)
-    return delays
+    """Milliseconds from a word's start to the end of the first frame above 0.5; 500 for later ones."""
+    above = [np.flatnonzero(scores[start : start + 50] > 0.5) for start in word_starts(scores, voice)]
+    return [10.0 * (found[0] + 1) if len(found) else 500.0 for found in above]
+
+
+def rises(scores: np.ndarray, voice: np.ndarray) -> list[bool]:
+    """Whether the score is RISE above its mean of the 0.2 s before within the word's first 30 ms."""
+    starts = word_starts(scores, voice)
+    return [scores[start : start + 3].max() > scores[start - 20 : start].mean() + RISE for start in starts]
 
 
 def read_sound(file: Path) -> tuple[np.ndarray, int]:
@@ -196,15 +204,22 @@ def frame_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str
 
 
 def snr_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str:
-    lines = ["| system | SNR | ROC-AUC | words | median onset | within 30 ms |", "|---|---|---|---|---|---|"]
+    lines = ["| system | SNR | ROC-AUC | words | rise within 30 ms | median onset | within 30 ms |"]
+    lines.append("|---|---|---|---|---|---|---|")
     snrs = sorted({r.snr_db for r in recordings}, key=lambda snr: np.inf if snr is None else snr)
     for name, scorer in systems_.items():
         for snr in snrs:
             some = [r for r in recordings if r.snr_db == snr]
             scores = [scorer(r.noisy, r.rate, 1) for r in some]
             all_ = together([judged(s, r, 1) for s, r in zip(scores, some)])
-            delays = np.array([d for s, r in zip(scores, some) for d in onset_delays(s, r.voice[: len(s)])])
-            onset = f"{np.median(delays):.0f} ms | {np.mean(delays <= 30):.0%}" if len(delays) else " | "
+            heard = [(s, r.voice[: len(s)]) for s, r in zip(scores, some)]
+            delays = np.array([delay for pair in heard for delay in onset_delays(*pair)])
+            risen = np.array([rise for pair in heard for rise in rises(*pair)])
+            onset = (
+                f"{risen.mean():.0%} | {np.median(delays):.0f} ms | {np.mean(delays <= 30):.0%}"
+                if len(delays)
+                else "||"
+            )
             label = "clean" if snr is None else f"{snr:g} dB"
             area = metrics.roc_auc(all_.scores, all_.voice)
             lines.append(f"| {name} | {label} | {area:.4f} | {len(delays)} | {onset} |")

@@ -91,10 +91,11 @@ def test_a_mask_of_one_removes_nothing() -> None:
 
 def test_onset_is_counted_from_the_words_start() -> None:
     voice_blocks = np.zeros(200, bool)
-    voice_blocks[[*range(50, 70), *range(75, 90), *range(130, 160)]] = True
+    voice_blocks[[*range(50, 70), *range(75, 90), *range(130, 160), *range(195, 200)]] = True
     scores = np.zeros(200)
     scores[52:70] = scores[131:160] = 0.9
-    assert voice.onset_delays(scores, voice_blocks) == [30.0, 20.0]
+    assert voice.onset_delays(scores, voice_blocks) == [30.0, 20.0, 500.0]
+    assert voice.rises(scores, voice_blocks) == [True, True, False]
 
 
 def test_voice_tables(pairs: Path, tmp_path: Path) -> None:
