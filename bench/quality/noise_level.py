@@ -2,9 +2,9 @@
 
     python bench/quality/noise_level.py --store STORE models/noise_level_16k.mvw
 
-Steady noises are white, pink and brown noise and the held-out recordings whose level
-(100 ms blocks) deviates by less than 1 dB and spans less than 6 dB; each is scaled to several true levels. The value compared is the median of the
-reported levels after two seconds (16-bit scale, dB).
+Steady noises are white, pink and brown noise and the held-out recordings whose level (in blocks of
+100 ms) deviates by less than 1 dB and spans less than 6 dB; each is scaled to several true levels.
+The value compared is the median of the reported levels after two seconds (16-bit scale, dB).
 """
 
 from __future__ import annotations

@@ -53,11 +53,11 @@ void SpectralParams::readStructure(WEIGHTS::Weight const& weight) {
         refuse("CoefficientNumber is " + std::to_string(coefficientNumber) + ", must be " +
                std::to_string(frameLength / 2 + 1));
     }
-    if (begin == end)
-        refuse("the band " + std::to_string(begin) + ".." + std::to_string(end) + " is empty");
+    auto const band = "the band " + std::to_string(begin) + ".." + std::to_string(end);
+    if (begin == end) refuse(band + " is empty");
     if (begin < 0 || begin > end || static_cast<std::size_t>(end) > coefficientNumber) {
-        refuse("the band " + std::to_string(begin) + ".." + std::to_string(end) +
-               " does not lie in the spectrum of " + std::to_string(coefficientNumber) + " bins");
+        refuse(band + " does not lie in the spectrum of " + std::to_string(coefficientNumber) +
+               " bins");
     }
     filtrBegin = static_cast<std::size_t>(begin);
     filtrEnd = static_cast<std::size_t>(end);

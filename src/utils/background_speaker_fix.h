@@ -17,9 +17,8 @@ public:
     // smallest number of frames averaged. utteranceLen: time constant of the reference in seconds.
     // varWindMode: the averaging length adapts. frameLengthMs: model frame, two hops.
     // window: the synthesis window.
-    // Throws MORVA_Exception for a run frame count outside 1 .. 100000, equal or
-    // infinite cut levels, an utterance length that is not positive and finite, or a window without
-    // energy.
+    // Throws MORVA_Exception for a run frame count outside 1 .. 100000, equal or infinite cut
+    // levels, an utterance length that is not positive and finite, or a window without energy.
     BackgroundSpeakerFix(float cutStartDb, float cutEndDb, unsigned long runFrameCount,
                          unsigned long runMinLen, float utteranceLen, bool varWindMode,
                          unsigned long frameLengthMs, std::vector<float> const& window);

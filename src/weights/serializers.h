@@ -30,6 +30,7 @@ public:
     BoundedReader& reader() { return reader_; }
     // The stream behind write mode; closed in read mode.
     std::ofstream& output() { return output_; }
+    SerializeMode mode() const { return mode_; }
 
 private:
     SerializeMode mode_;

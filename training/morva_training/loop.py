@@ -42,6 +42,12 @@ class Schedule:
         return self.peak * (0.5 - 0.5 * math.cos(math.pi * min(1.0, max(0.0, left))))
 
 
+def steps_done(folder: Path) -> int:
+    """How far the run in a folder has come."""
+    checkpoint = folder / "checkpoint.pt"
+    return torch.load(checkpoint, map_location="cpu")["step"] if checkpoint.exists() else 0
+
+
 class Run:
     """State of one training run in a folder: `checkpoint.pt`, `log.jsonl`."""
 

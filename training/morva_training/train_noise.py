@@ -18,7 +18,7 @@ from torch.utils.data import DataLoader
 from . import mvw
 from .batches import Batch, MixtureBatches
 from .convert import gated_network, half_precision, noise_weight, plain_network
-from .loop import Run, Schedule
+from .loop import Run, Schedule, steps_done
 from .losses import LevelLoss, LossWeights, MaskLoss
 from .mixing import Recipe
 from .networks import LayerNormGatedNetwork, PlainGatedNetwork
@@ -96,11 +96,7 @@ def main() -> None:
         torch.set_num_threads(1)
     recipe = replace(LEVEL_RECIPE if args.level else Recipe(), seconds=args.seconds)
     # A resumed run must not hear the same mixtures again: the seed moves with the step.
-    done = (
-        torch.load(args.run / "checkpoint.pt", map_location="cpu")["step"]
-        if (args.run / "checkpoint.pt").exists()
-        else 0
-    )
+    done = steps_done(args.run)
     source = MixtureBatches(args.store, layout, recipe, args.batch, args.seed + 7919 * done, args.reuse)
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     network, mean, deviation = start(args, layout, loader)

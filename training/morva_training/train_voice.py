@@ -22,7 +22,7 @@ from torch.utils.data import DataLoader
 
 from . import mvw, together
 from .convert import half_precision, plain_network, plain_values, timestamp
-from .loop import Run, Schedule
+from .loop import Run, Schedule, steps_done
 from .mixing import Recipe
 from .mvw import Weight
 from .networks import PlainGatedNetwork
@@ -77,11 +77,7 @@ def main() -> None:
     torch.manual_seed(args.seed)
     if device.type == "cpu":
         torch.set_num_threads(1)
-    done = (
-        torch.load(args.run / "checkpoint.pt", map_location="cpu")["step"]
-        if (args.run / "checkpoint.pt").exists()
-        else 0
-    )
+    done = steps_done(args.run)
     source = VoiceBatches(args.store, args.batch, args.seed + 7919 * done + 104729 * together.join())
     loader = iter(DataLoader(source, batch_size=None, num_workers=args.workers))
     if args.start:

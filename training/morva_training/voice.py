@@ -2,7 +2,8 @@
 
 Labels come from the clean speech alone. A 10 ms block is voice when its power is within 30 dB of
 the speaker's loud blocks, and so is its power above 80 Hz (what lies below is the rumble of desks
-and traffic); gaps below 80 ms are closed, islands below 30 ms dropped, edges stay where they are. Blocks between 30 and 42 dB do not count, they are neither.
+and traffic); gaps below 80 ms are closed, islands below 30 ms dropped, edges stay where they are.
+Blocks between 30 and 42 dB do not count, they are neither.
 """
 
 from __future__ import annotations
