@@ -14,14 +14,13 @@ constexpr char const* kUnit = "src/morva-sdk/instance";
 // Sessions without sound of their own are built for this output rate.
 constexpr MorvaSamplingRate kValueSessionRate = MORVA_RATE_16000;
 
-// What audio threads read; the holder inside Instance owns it. It also says whether there is an
-// instance: at process exit the holder may be gone before the last caller.
+// Owns the instance, and is what audio threads read. A plain pointer on purpose: process exit, which
+// an audio thread may meet inside a frame, destroys nothing.
 std::atomic<MorvaInstanceT*> current{nullptr};
 
 }  // namespace
 
 MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
-    static std::unique_ptr<MorvaInstanceT> holder;
     switch (mode) {
         case MODE::get: {
             auto* const instance = current.load(std::memory_order_acquire);
@@ -35,16 +34,14 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
             if (current.load(std::memory_order_relaxed) != nullptr) {
                 UTILS::raise("DOUBLE INITIALIZATION WITHOUT DESTROYING", kUnit, "Instance");
             }
-            holder = std::make_unique<MorvaInstanceT>(path != nullptr ? path : L"");
-            current.store(holder.get(), std::memory_order_release);
-            return holder.get();
+            auto fresh = std::make_unique<MorvaInstanceT>(path != nullptr ? path : L"");
+            current.store(fresh.get(), std::memory_order_release);
+            return fresh.release();
         }
         case MODE::destroy: {
             std::lock_guard const lock(mutexForInputs_);
-            if (current.load(std::memory_order_relaxed) == nullptr) {
-                UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
-            }
-            holder.reset();
+            std::unique_ptr<MorvaInstanceT> const last(current.exchange(nullptr));
+            if (!last) UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
             return nullptr;
         }
     }
@@ -54,7 +51,6 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
 MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : workingPath_(path) {}
 
 MorvaInstanceT::~MorvaInstanceT() {
-    current.store(nullptr, std::memory_order_release);
     clearAll();
 }
 

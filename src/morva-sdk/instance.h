@@ -3,6 +3,9 @@
 // One lock serialises creation and destruction of the instance, registration, and opening and
 // closing of sessions. Getting the instance and asking about a session take no lock: audio threads
 // do both while a control thread works on other sessions.
+//
+// Only MODE::destroy ends it. At process exit it is left as it is, sessions and all, since audio
+// threads may still be inside a frame.
 #pragma once
 
 #include <cstddef>
