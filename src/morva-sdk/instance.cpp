@@ -14,8 +14,8 @@ constexpr char const* kUnit = "src/morva-sdk/instance";
 // Sessions without sound of their own are built for this output rate.
 constexpr MorvaSamplingRate kValueSessionRate = MORVA_RATE_16000;
 
-// Owns the instance, and is what audio threads read. A plain pointer on purpose: process exit, which
-// an audio thread may meet inside a frame, destroys nothing.
+// Owns the instance, and is what audio threads read. A plain pointer on purpose: process exit,
+// which an audio thread may meet inside a frame, destroys nothing.
 std::atomic<MorvaInstanceT*> current{nullptr};
 
 }  // namespace

@@ -20,7 +20,7 @@
 #include "morva-sdk/morva-sdk.h"
 #include "morva-sdk/session.h"
 #include "morva-sdk/session_directory.h"
-#include "morva-sdk/session_type.h"
+#include "morva-sdk/vocabulary.h"
 #include "utils/non_copyable.h"
 #include "utils/path.h"
 #include "weights/model_environment.h"

@@ -2,7 +2,6 @@
 
 #include <algorithm>
 #include <cmath>
-#include <memory>
 #include <mutex>
 
 #include "morva-sdk/cpu_support.h"
@@ -92,14 +91,10 @@ int MorvaExt_NC_SetBackgroundSpeaker(void* handle, int on) {
     });
 }
 
-int MorvaExt_NC_EnableVoice(void* handle, MorvaSamplingRate inputRate, MorvaFrameDuration duration,
-                            char const* vadModel) {
+int MorvaExt_NC_EnableVoice(void* handle, char const* vadModel) {
     return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
         std::lock_guard const lock(MorvaInstanceT::mutexForInputs_);
-        auto voice = std::make_unique<MorvaSessionT>(inputRate, MORVA_RATE_16000, duration,
-                                                     vadModel, MorvaSessionType::VoiceActivity);
-        if (voice->inputFrameSize() != session.inputFrameSize()) return kCannot;
-        session.judgeVoiceWith(std::move(voice));
+        session.enableVoice(vadModel);
         return kDone;
     });
 }

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cstdio>
 #include <iostream>
-#include <iterator>
 #include <mutex>
 
 #include "morva-sdk/cpu_support.h"
@@ -11,6 +10,7 @@
 #include "morva-sdk/handles.h"
 #include "morva-sdk/instance.h"
 #include "morva-sdk/last_error.h"
+#include "morva-sdk/vocabulary.h"
 #include "utils/math_setup.h"
 
 namespace {
@@ -19,12 +19,6 @@ using namespace MORVA::MORVA_SDK;
 using MODE = MorvaInstanceT::MODE;
 
 constexpr char const* kUnit = "src/morva-sdk/morva-sdk";
-
-bool isSupported(MorvaSamplingRate rate) {
-    constexpr int kRates[] = {8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
-    return std::find(std::begin(kRates), std::end(kRates), static_cast<int>(rate)) !=
-           std::end(kRates);
-}
 
 template <class Register>
 int registerModel(bool hasInput, char const* nullWarning, Register&& add) {
@@ -42,7 +36,7 @@ int registerModel(bool hasInput, char const* nullWarning, Register&& add) {
 template <class Create>
 void* createSession(std::initializer_list<MorvaSamplingRate> rates, Create&& create) {
     return funnel(kHandleFailures, [&]() -> void* {
-        if (!std::all_of(rates.begin(), rates.end(), isSupported)) {
+        if (!std::ranges::all_of(rates, isSamplingRate)) {
             printError("Unsupported Sampling rates!");
             return nullptr;
         }

@@ -41,11 +41,6 @@ struct FloatSamples {
     }
 };
 
-constexpr bool isSessionDuration(MorvaFrameDuration duration) {
-    int const ms = duration;
-    return ms == 10 || ms == 20 || ms == 30 || ms == 40;
-}
-
 // What a voice-activity session answers frames with has no samples.
 std::size_t outputSamples(MorvaFrameDuration duration, MorvaSamplingRate rate,
                           MorvaSessionType type) {
@@ -60,19 +55,16 @@ void printSizeError(char const* error, std::size_t inputSize, std::string const&
 
 }  // namespace
 
-std::size_t getSampleCount(MorvaFrameDuration duration, MorvaSamplingRate rate) {
-    double const samples = static_cast<double>(rate) * static_cast<double>(duration) / 1000.0;
-    return samples > 0.0 ? static_cast<std::size_t>(samples) : 0;
-}
-
 MorvaSessionT::MorvaSessionT(MorvaSamplingRate inputRate, MorvaSamplingRate outputRate,
                              MorvaFrameDuration duration, char const* modelName,
                              MorvaSessionType type)
-    : type_(type),
+    : inputRate_(inputRate),
+      duration_(duration),
+      type_(type),
       cleaner_(NOISE_CANCELLER::NoiseCleaner::create(inputRate, duration, modelName, type)) {
     // After the model, so that a missing model is what the caller hears about first; before the
     // resamplers, which cannot be built for every duration.
-    if (!isSessionDuration(duration)) {
+    if (!isFrameDuration(duration)) {
         UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
     }
     auto const modelRate = cleaner_->environment()->first->getWeightInfo().first;
@@ -102,6 +94,20 @@ void MorvaSessionT::prepareSoundPath(MorvaFrameDuration duration) {
     bypass_ = std::make_unique<Bypass>(inputFrameSize_, outputFrameSize_,
                                        static_cast<std::size_t>(std::lround(latency_)));
     maskControls_ = dynamic_cast<NOISE_CANCELLER::MaskControls*>(cleaner_.get());
+}
+
+void MorvaSessionT::enableVoice(char const* vadModel) {
+    auto voice = std::make_unique<MorvaSessionT>(inputRate_, MORVA_RATE_16000, duration_, vadModel,
+                                                 MorvaSessionType::VoiceActivity);
+    voice->warmUp();
+    voice_ = std::move(voice);
+}
+
+// Takes the memory that first frames take, and forgets the frame.
+void MorvaSessionT::warmUp() {
+    frame_.assign(inputFrameSize_, 0.0f);
+    modelValue();
+    resetNoiseDBSession();
 }
 
 void MorvaSessionT::through(UTILS::Resampler& resampler) {

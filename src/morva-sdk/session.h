@@ -14,16 +14,13 @@
 
 #include "morva-sdk/bypass.h"
 #include "morva-sdk/morva-sdk.h"
-#include "morva-sdk/session_type.h"
+#include "morva-sdk/vocabulary.h"
 #include "noise_canceller/mask_controls.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "utils/non_copyable.h"
 #include "utils/resampler.h"
 
 namespace MORVA::MORVA_SDK {
-
-// rate * duration / 1000, truncated; 0 for a negative duration.
-std::size_t getSampleCount(MorvaFrameDuration duration, MorvaSamplingRate rate);
 
 class MorvaSessionT : public UTILS::NonCopyMovable {
 public:
@@ -60,9 +57,9 @@ public:
     NOISE_CANCELLER::MaskControls* maskControls() { return maskControls_; }
     Bypass* bypass() { return bypass_.get(); }
 
-    // Lets a voice-activity session of the same input judge every frame that this one cleans. The
-    // session has the same input rate and duration. [the session's thread, between frames]
-    void judgeVoiceWith(std::unique_ptr<MorvaSessionT> voice) { voice_ = std::move(voice); }
+    // Lets a voice-activity session on that model judge every frame that this one cleans. Its
+    // frames are ready at once. Throws like the constructor. [the session's thread, between frames]
+    void enableVoice(char const* vadModel);
     // Its score of the last frame; NaN without one.
     float lastVoice() const { return lastVoice_; }
 
@@ -82,8 +79,11 @@ private:
     void through(UTILS::Resampler& resampler);
 
     void prepareSoundPath(MorvaFrameDuration duration);
+    void warmUp();
 
     // Declared so that the cleaner goes first when the session ends.
+    MorvaSamplingRate inputRate_;
+    MorvaFrameDuration duration_;
     std::size_t inputFrameSize_ = 0;
     std::size_t outputFrameSize_ = 0;
     std::size_t modelFrameSize_ = 0;

@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "morva-sdk/morva-sdk.h"
-#include "morva-sdk/session_type.h"
+#include "morva-sdk/vocabulary.h"
 #include "utils/non_copyable.h"
 #include "weights/model_environment.h"
 
