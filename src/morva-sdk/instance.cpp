@@ -48,7 +48,7 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
     UTILS::raise("Incorrect instance access mode...", kUnit, "Instance");
 }
 
-MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : workingPath_(path) {}
+MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : registry_(path) {}
 
 MorvaInstanceT::~MorvaInstanceT() {
     clearAll();
@@ -98,11 +98,19 @@ MorvaSessionType MorvaInstanceT::getSessionType(MorvaSessionT* session) const {
 
 bool MorvaInstanceT::destroySession(MorvaSessionT* session) {
     std::lock_guard const lock(mutexForInputs_);
+    if (remove(session)) return true;
+    std::cout << "WARNING SESSION ISN'T FOUND" << std::endl;
+    return false;
+}
+
+bool MorvaInstanceT::closeSession(MorvaSessionT* session, MorvaSessionType type) {
+    std::lock_guard const lock(mutexForInputs_);
+    return getSessionType(session) == type && remove(session);
+}
+
+bool MorvaInstanceT::remove(MorvaSessionT const* session) {
     auto const found = std::ranges::find(sessions_, session, &std::unique_ptr<MorvaSessionT>::get);
-    if (found == sessions_.end()) {
-        std::cout << "WARNING SESSION ISN'T FOUND" << std::endl;
-        return false;
-    }
+    if (found == sessions_.end()) return false;
     directory_.remove(session);
     sessions_.erase(found);
     return true;
@@ -111,10 +119,7 @@ bool MorvaInstanceT::destroySession(MorvaSessionT* session) {
 bool MorvaInstanceT::clearAll() {
     for (auto const& session : sessions_) directory_.remove(session.get());
     sessions_.clear();
-    while (!modelEnvironments_.empty()) modelEnvironments_.pop_back();
-    modelNames_.clear();
-    weightIdentities_.clear();
-    workingPath_ = UTILS::Path(L"");
+    registry_.clear();
     return true;
 }
 

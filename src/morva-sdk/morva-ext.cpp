@@ -119,14 +119,14 @@ int MorvaExt_NoiseDB_FrameFloat(void* handle, float const* input, unsigned int i
 
 int MorvaExt_ListModels(MorvaExtModelInfo* models, int capacity) {
     return funnel(kIntFailures, [&] {
-        auto const& instance = engine();
+        auto const& registry = engine().registry();
         std::lock_guard const lock(MorvaInstanceT::mutexForInputs_);
         int written = 0;
-        for (auto const& [name, index] : instance.modelNames()) {
+        for (auto const& [name, index] : registry.names()) {
             if (models == nullptr || written >= capacity) break;
-            models[written++] = describe(name, *instance.modelEnvironments()[index]->first);
+            models[written++] = describe(name, *registry.environments()[index]->first);
         }
-        return static_cast<int>(instance.modelNames().size());
+        return static_cast<int>(registry.names().size());
     });
 }
 

@@ -46,14 +46,12 @@ void* createSession(std::initializer_list<MorvaSamplingRate> rates, Create&& cre
 
 int closeSession(void* handle, MorvaSessionType type) {
     return funnel(kIntFailures, [&] {
-        auto& instance = engine();
-        auto* const session = static_cast<MorvaSessionT*>(handle);
-        if (instance.getSessionType(session) != type) {
+        if (!engine().closeSession(static_cast<MorvaSessionT*>(handle), type)) {
             MORVA::UTILS::raise(
                 "Trying to close a non-existant session or session of incompatible type", kUnit,
                 "closeSession");
         }
-        return instance.destroySession(session) ? 0 : 1;
+        return 0;
     });
 }
 

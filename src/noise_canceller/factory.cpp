@@ -1,11 +1,11 @@
 // Builds the cleaner class that matches a weight's version string and the session's type.
-#include "morva-sdk/instance.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "noise_canceller/noise_cleaner_generations.h"
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
 #include "noise_canceller/noise_db_cleaner_v0_0_1.h"
 #include "noise_canceller/vad_cleaner_v0_0_1.h"
 #include "utils/exception.h"
+#include "weights/model_registry.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {
@@ -47,16 +47,17 @@ constexpr Row kCleaners[] = {
     {MorvaSessionType::NoiseLevel, "0.0.5", build<NoiseDBCleaner_v0_0_1>},
 };
 
-ModelEnvironment findEnvironment(MORVA_SDK::MorvaInstanceT const& instance, MorvaSamplingRate rate,
-                                 char const* modelName, MorvaSessionType type) {
+ModelEnvironment findEnvironment(MorvaSamplingRate rate, char const* modelName,
+                                 MorvaSessionType type) {
+    auto const& registry = WEIGHTS::ModelRegistry::current();
     if (modelName == nullptr) {
-        return NoiseCleaner::selectModel(instance.modelEnvironments(), rate, type);
+        return NoiseCleaner::selectModel(registry.environments(), rate, type);
     }
-    auto const found = instance.modelNames().find(modelName);
-    if (found == instance.modelNames().end()) {
+    auto const found = registry.names().find(modelName);
+    if (found == registry.names().end()) {
         fail("Weight with this name isn't found", kLineNameNotFound);
     }
-    return instance.modelEnvironments()[found->second];
+    return registry.environments()[found->second];
 }
 
 }  // namespace
@@ -64,9 +65,7 @@ ModelEnvironment findEnvironment(MORVA_SDK::MorvaInstanceT const& instance, Morv
 std::unique_ptr<NoiseCleaner> NoiseCleaner::create(MorvaSamplingRate rate,
                                                    MorvaFrameDuration frameMs,
                                                    char const* modelName, MorvaSessionType type) {
-    using MORVA_SDK::MorvaInstanceT;
-    auto const* instance = MorvaInstanceT::Instance(MorvaInstanceT::MODE::get, nullptr);
-    auto environment = findEnvironment(*instance, rate, modelName, type);
+    auto environment = findEnvironment(rate, modelName, type);
     if (!environment) fail("Weight not found ", kLineNoWeight);
     auto const version = environment->first->getWeightVersion();
     for (auto const& row : kCleaners) {
