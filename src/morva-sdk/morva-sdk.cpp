@@ -59,7 +59,7 @@ template <class Sample>
 int cleanFrame(void* handle, Sample const* input, unsigned inputSize, Sample* output,
                unsigned outputSize) {
     return funnel(kIntFailures, [&] {
-        auto* const session = sessionOf(handle, MorvaSessionType::NoiseCancellation);
+        auto* const session = liveSession(handle, MorvaSessionType::NoiseCancellation);
         if (session == nullptr) {
             printError(kWrongSession);
             return 2;
@@ -75,7 +75,7 @@ enum class Range { any, unit };
 template <class Frame>
 float frameValue(void* handle, MorvaSessionType type, Range range, Frame&& frame) {
     return funnel(kFloatFailures, [&] {
-        if (auto* const session = sessionOf(handle, type)) {
+        if (auto* const session = liveSession(handle, type)) {
             float const value = frame(*session);
             if (range == Range::any || (value >= 0.0f && value <= 1.0f)) return value;
             std::cerr << "THE CLEANING ERROR OUTPUT result " << value << std::endl;
@@ -160,7 +160,7 @@ int Morva_NoiseDB_CloseSession(void* session) {
 
 int Morva_NoiseDB_ResetSession(void* handle) {
     return funnel(kIntFailures, [&] {
-        auto* const session = sessionOf(handle, MorvaSessionType::NoiseLevel);
+        auto* const session = liveSession(handle, MorvaSessionType::NoiseLevel);
         if (session == nullptr) {
             MORVA::UTILS::raise(
                 "Trying to reset a non-existant session or session of incompatible type", kUnit,

@@ -52,4 +52,17 @@ private:
     ModelEnvironment environment_;
 };
 
+class MaskControls;
+
+// A noise cleaner with what its session may change and read beside its frames.
+struct NoiseModel {
+    std::unique_ptr<NoiseCleaner> cleaner;
+    MaskControls& controls;  // of the cleaner
+    std::size_t delay;       // from sound in to sound out, in samples at the model's rate
+};
+
+// NoiseCleaner::create for noise-cancellation sessions.
+NoiseModel createNoiseModel(MorvaSamplingRate rate, MorvaFrameDuration frameMs,
+                            char const* modelName);
+
 }  // namespace MORVA::NOISE_CANCELLER
