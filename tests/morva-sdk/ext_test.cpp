@@ -58,27 +58,10 @@ protected:
     Engine engine_;
 };
 
-std::vector<float> sine(int hz, double frequency, float amplitude, double seconds) {
-    std::vector<float> sound(static_cast<std::size_t>(hz * seconds));
-    for (std::size_t i = 0; i < sound.size(); ++i) {
-        double const angle = 2.0 * std::numbers::pi * frequency * static_cast<double>(i) / hz;
-        sound[i] = amplitude * static_cast<float>(std::sin(angle));
-    }
-    return sound;
-}
-
 std::vector<float> whiteNoise(std::size_t n, std::uint64_t seed) {
     auto noise = Random(seed).normal(n, 0.1F);
     for (float& v : noise) v = std::clamp(v, -0.6F, 0.6F);
     return noise;
-}
-
-float largestStep(std::vector<float> const& sound) {
-    float largest = 0.0F;
-    for (std::size_t i = 1; i < sound.size(); ++i) {
-        largest = std::max(largest, std::abs(sound[i] - sound[i - 1]));
-    }
-    return largest;
 }
 
 // Cleans `sound` and calls `before(k)` ahead of frame k.
@@ -96,28 +79,6 @@ std::vector<float> cleanWith(void* session, std::vector<float> const& sound,
         all.insert(all.end(), out.begin(), out.end());
     }
     return all;
-}
-
-// Mean power of frames of 256 samples at every fourth bin, Hann window.
-std::vector<double> meanSpectrum(std::span<float const> sound) {
-    constexpr std::size_t n = 256;
-    std::vector<double> power(n / 8 + 1);
-    for (std::size_t at = 0; at + n <= sound.size(); at += n / 2) {
-        for (std::size_t k = 0; k < power.size(); ++k) {
-            double re = 0.0;
-            double im = 0.0;
-            for (std::size_t i = 0; i < n; ++i) {
-                double const angle = 2.0 * std::numbers::pi * static_cast<double>(4 * k * i % n) /
-                                     static_cast<double>(n);
-                double const hann =
-                    0.5 - 0.5 * std::cos(2.0 * std::numbers::pi * static_cast<double>(i) / n);
-                re += hann * sound[at + i] * std::cos(angle);
-                im -= hann * sound[at + i] * std::sin(angle);
-            }
-            power[k] += re * re + im * im;
-        }
-    }
-    return power;
 }
 
 }  // namespace
@@ -141,63 +102,16 @@ TEST_F(Extension, TheLimitMixesInTheDelayedInput) {
     for (float const limitDb : {0.5F, 12.0F, 40.0F}) check(20, "closed", limitDb);
 }
 
-TEST_F(Extension, NoBinFallsBelowTheLimit) {
-    ASSERT_EQ(Engine::addShipped(MORVA_TEST_MODELS "NC_small_16k.mvw", "shipped"), 0);
-    constexpr float limitDb = 12.0F;
-    for (char const* const model : {"shipped", "random", "closed"}) {
-        auto* const limited = open(16000, 10, model);
-        ASSERT_EQ(MorvaExt_NC_SetAttenuationLimit(limited, limitDb), 0);
-        auto const latency = static_cast<std::size_t>(MorvaExt_SessionLatencySamples(limited));
-        auto const sound = whiteNoise(3 * 16000, 3);
-        auto const cleaned = cleanAll(limited, sound);
-        constexpr std::size_t settled = 16000;
-        auto const in = meanSpectrum(std::span(sound).subspan(settled, 32000 - latency));
-        auto const out = meanSpectrum(std::span(cleaned).subspan(settled + latency));
-        double lowest = 0.0;
-        for (std::size_t k = 0; k < in.size(); ++k) {
-            lowest = std::min(lowest, 10.0 * std::log10(out[k] / in[k]));
-        }
-        EXPECT_GE(lowest, -limitDb - 0.05) << model;
-        if (std::string(model) != "random") {
-            EXPECT_LE(lowest, -limitDb + 0.5) << model;
-        }
-    }
-}
-
 TEST_F(Extension, RefusedLimitsChangeNothing) {
     auto* const session = open(16000, 10, "closed");
     EXPECT_EQ(MorvaExt_NC_SetAttenuationLimit(session, 0.0F), 0);
     for (float const wrong : {-1.0F, -INFINITY, NAN}) {
         EXPECT_EQ(MorvaExt_NC_SetAttenuationLimit(session, wrong), 1);
     }
-    auto const open = cleanAll(session, sine(16000, 440.0, 0.5F, 0.2));
-    EXPECT_GT(std::ranges::max(open), 0.49F);
+    EXPECT_GT(std::ranges::max(cleanAll(session, whiteNoise(3200, 2))), 0.2F);
     EXPECT_EQ(MorvaExt_NC_SetAttenuationLimit(session, INFINITY), 0);
-    auto const shut = cleanAll(session, sine(16000, 440.0, 0.5F, 0.2));
+    auto const shut = cleanAll(session, whiteNoise(3200, 2));
     EXPECT_LT(std::ranges::max(std::span(shut).subspan(1600)), kOneStep);
-}
-
-TEST_F(Extension, ChangesDoNotClick) {
-    constexpr float amplitude = 0.5F;
-    auto const sound = sine(16000, 100.0, amplitude, 2.0);
-    float const ownStep = largestStep(sound);
-    // Steepest slope of a fade over a hop of 160 samples with a power-complementary window.
-    float const fade = amplitude * 3.0F / 160.0F;
-    Random random(4);
-    TRACE_SEED(random);
-    for (bool const limits : {true, false}) {
-        auto* const session = open(16000, 10, "closed");
-        auto const out = cleanWith(session, sound, [&](std::size_t k) {
-            if (!limits) {
-                MorvaExt_NC_SetBypass(session, random.chance(0.3));
-            } else if (k % 3 == 0) {
-                float const db = random.chance(0.5) ? 0.0F : random.uniform(0.0F, 60.0F);
-                MorvaExt_NC_SetAttenuationLimit(session, db);
-            }
-        });
-        EXPECT_LE(largestStep(out), ownStep + fade) << (limits ? "limit" : "bypass");
-        EXPECT_GT(largestStep(out), ownStep * 0.9F);
-    }
 }
 
 // ---- bypass ----
@@ -223,22 +137,6 @@ TEST_F(Extension, BypassIsTheInputAtTheReportedLatency) {
                 std::span(sound).subspan(from - static_cast<std::size_t>(latency), got.size())));
             EXPECT_EQ(Morva_NC_CloseSession(session), 0);
         }
-    }
-}
-
-// Between different rates the two ways may differ by rounding to a sample, but not by more.
-TEST_F(Extension, BypassBetweenRatesKeepsItsPlace) {
-    for (auto const& [in, out] : {std::pair{48000, 16000}, {16000, 48000}, {44100, 8000}}) {
-        auto const sound = sine(in, 300.0, 0.5F, 0.5);
-        auto* const cleaned = openNc(in, out, 10, "narrow");
-        auto* const bypassed = openNc(in, out, 10, "narrow");
-        ASSERT_EQ(MorvaExt_NC_SetBypass(bypassed, 1), 0);
-        auto const a = cleanAll(cleaned, sound);
-        auto const b = cleanAll(bypassed, sound);
-        ASSERT_EQ(a.size(), b.size());
-        double const slope = 2.0 * std::numbers::pi * 300.0 / out * 0.5;
-        ErrorBound bound(std::to_string(in) + " -> " + std::to_string(out) + ", samples", 1.1);
-        for (std::size_t i = a.size() / 2; i < a.size(); ++i) bound.add(a[i], b[i], slope);
     }
 }
 
@@ -359,6 +257,19 @@ TEST_F(Extension, VoiceIsNotANumberUntilItIsEnabled) {
     EXPECT_THAT(score(), ::testing::AllOf(::testing::Ge(0.0F), ::testing::Le(1.0F)));
 }
 
+// Far below the smallest integer sample as well.
+TEST_F(Extension, FloatLevelsFollowTheSound) {
+    auto const sound = whiteNoise(16000, 8);
+    auto const levelAt = [&](float gain) {
+        auto* const session = Morva_NoiseDB_CreateSession(rate(16000), duration(10), "level");
+        auto quiet = sound;
+        for (float& sample : quiet) sample *= gain;
+        return valuesOf(quiet, 160, [&](auto const& f) { return level(session, f); }).back();
+    };
+    EXPECT_NEAR(levelAt(1e-4F), levelAt(1e-2F) - 40.0F, 3.0F);
+    EXPECT_NEAR(levelAt(1e-5F), levelAt(1e-4F) - 20.0F, 3.0F);
+}
+
 TEST_F(Extension, FloatLevelIsTheIntegerLevel) {
     auto* const integers = Morva_NoiseDB_CreateSession(rate(16000), duration(10), "level");
     auto* const floats = Morva_NoiseDB_CreateSession(rate(16000), duration(10), "level");
@@ -419,26 +330,4 @@ TEST_F(Extension, LastErrorIsPerThread) {
 TEST(ExtensionWithoutEngine, VersionAndFeatures) {
     EXPECT_THAT(MorvaExt_Version(), ::testing::MatchesRegex("[0-9]+\\.[0-9]+\\.[0-9]+"));
     EXPECT_THAT(MorvaExt_ProcessorFeatures(), ::testing::HasSubstr("avx2"));
-}
-
-TEST_F(Extension, WrongHandlesAreRefused) {
-    auto* const vadSession = Morva_VAD_CreateSession(rate(16000), duration(10), "vad");
-    int nothing = 0;
-    float const frame[160] = {};
-    float value = 0.0F;
-    for (void* const handle :
-         {vadSession, static_cast<void*>(&nothing), static_cast<void*>(nullptr)}) {
-        auto const wrong = observe([&] {
-            return std::vector<int>{MorvaExt_NC_SetAttenuationLimit(handle, 0.0F),
-                                    MorvaExt_NC_SetBypass(handle, 1),
-                                    MorvaExt_NC_SetBackgroundSpeaker(handle, 1),
-                                    MorvaExt_NC_EnableVoice(handle, "vad"),
-                                    MorvaExt_NC_FrameMeters(handle, &value, &value),
-                                    MorvaExt_NoiseDB_FrameFloat(handle, frame, 160, &value)};
-        });
-        EXPECT_THAT(wrong.result, ::testing::Each(2));
-        EXPECT_EQ(observe([&] { return MorvaExt_SessionLatencySamples(handle); }).result, -2);
-    }
-    EXPECT_EQ(
-        observe([&] { return MorvaExt_SessionFrameSizes(&nothing, nullptr, nullptr); }).result, 2);
 }
