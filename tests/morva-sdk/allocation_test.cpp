@@ -3,17 +3,15 @@
 #include <gtest/gtest.h>
 
 #include <cstdio>
-#include <cstdlib>
-#include <memory>
-#include <type_traits>
+#include <functional>
 
 #include "engine.h"
 #include "support/allocation_counter.h"
 
 using namespace sdk_test;
+using test_support::failingAllocation;
 using test_support::randomNcWeight;
 using test_support::randomVadWeight;
-using test_support::TempDir;
 
 // What a session holds beside the weights and tables that it shares with the first one.
 TEST(SessionMemory, IsSmallBesideTheModel) {
@@ -28,48 +26,35 @@ TEST(SessionMemory, IsSmallBesideTheModel) {
     EXPECT_GT(held, std::size_t{16} << 10);
     for (int i = 0; i < 1000; ++i) sessions.push_back(openNc(48000, 48000, 10, "c6"));
     auto const sound = voice(48000, 0.05, 1);
-    auto const wanted = cleanAll(sessions.front(), sound);
-    EXPECT_EQ(cleanAll(sessions.back(), sound), wanted);
-    for (void* session : sessions) EXPECT_EQ(Morva_NC_CloseSession(session), 0);
+    EXPECT_EQ(cleanAll(sessions.back(), sound), cleanAll(sessions.front(), sound));
 }
 
 namespace {
 
-using test_support::failingAllocation;
-
 // Calls `call` with its first, second, ... allocation failing until one call meets no failure any
-// more. A failed call must leave no memory behind; a successful one is given to `undo`.
-template <class Call, class Undo>
-void failEachAllocation(char const* what, Call call, Undo undo) {
+// more. A failed call must leave no memory behind; a successful one is followed by `undo`.
+void failEachAllocation(char const* what, std::function<int()> const& call,
+                        std::function<void()> const& undo) {
     std::size_t n = 0;
     for (bool fired = true; fired;) {
-        std::ptrdiff_t kept = 0;
-        auto const result = observe([&] {
-                                auto const live =
-                                    test_support::allocations - test_support::releases;
-                                failingAllocation = ++n;
-                                auto const code = call();
-                                fired = failingAllocation == 0;
-                                failingAllocation = 0;
-                                kept = static_cast<std::ptrdiff_t>(test_support::allocations -
-                                                                   test_support::releases - live);
-                                return code;
-                            }).result;
-        bool succeeded = false;
-        if constexpr (std::is_pointer_v<decltype(call())>) {
-            succeeded = result != nullptr;
-        } else {
-            succeeded = result == 0;
-            // A stream may take a failure for bad data.
-            EXPECT_TRUE(succeeded || result == -2 || result == 2)
-                << what << " " << n << ": " << result;
+        std::size_t kept = 0;
+        int const result = observe([&] {
+                               auto const live = test_support::allocations - test_support::releases;
+                               failingAllocation = ++n;
+                               int const code = call();
+                               fired = failingAllocation == 0;
+                               failingAllocation = 0;
+                               kept = test_support::allocations - test_support::releases - live;
+                               return code;
+                           }).result;
+        if (result == 0) {
+            observe([&] { return undo(), 0; });
+            continue;
         }
-        if (succeeded) {
-            undo(result);
-        } else {
-            EXPECT_TRUE(fired) << what << " fails although allocation " << n << " is not reached";
-            EXPECT_EQ(kept, 0) << what << " keeps memory when allocation " << n << " fails";
-        }
+        // A stream may take a failure for bad data.
+        EXPECT_TRUE(result == -2 || result == 2) << what << " " << n << ": " << result;
+        EXPECT_TRUE(fired) << what << " fails although allocation " << n << " is not reached";
+        EXPECT_EQ(kept, 0U) << what << " keeps memory when allocation " << n << " fails";
     }
     std::printf("[ failures ] %s: %zu allocations\n", what, n - 1);
     EXPECT_GT(n, 2U) << what;
@@ -78,84 +63,76 @@ void failEachAllocation(char const* what, Call call, Undo undo) {
 }  // namespace
 
 TEST(AllocationFailure, IsReportedLeaksNothingAndTheEngineGoesOn) {
-    TempDir dir;
+    test_support::TempDir dir;
     dir.write("a.mvw", randomNcWeight({}));
     dir.write("a.cfg", "WEIGHT a.mvw\nMORVA_SMOOT_COEF_v0_0_6 0.5\n");
     auto const folder = dir.path().wstring();
     failEachAllocation(
-        "init", [&] { return Morva_SDK_GlobalInit(folder.c_str(), 0); },
-        [](int) { EXPECT_EQ(Morva_SDK_GlobalDestroy(), 0); });
+        "init", [&] { return Morva_SDK_GlobalInit(folder.c_str(), 0); }, Morva_SDK_GlobalDestroy);
 
     Engine engine(folder.c_str());
-    auto const sound = voice(16000, 0.1, 1);
-    ASSERT_EQ(Engine::add("nc", randomNcWeight({.timeStamp = "x"})), 0);
-    auto const wanted = cleanAll(openNc(16000, 16000, 10, "nc"), sound);
     auto const blob = randomNcWeight({.timeStamp = "x"});
-    std::string name;
-    int taken = 0;
-    auto const nextName = [&] { return (name = "n" + std::to_string(++taken)).c_str(); };
-    nextName();
-    failEachAllocation(
-        // What is registered in spite of a failure must be whole.
-        "memory",
+    auto const sound = voice(16000, 0.1, 1);
+    ASSERT_EQ(Engine::add("nc", blob), 0);
+    ASSERT_EQ(Engine::add("vad", randomVadWeight({})), 0);
+    ASSERT_EQ(Engine::add("db", randomNcWeight({.version = "0.0.5"})), 0);
+    auto const cleaned = [&](std::string const& model) {
+        return cleanAll(openNc(16000, 16000, 10, model.c_str()), sound);
+    };
+    auto const wanted = cleaned("nc");
 
+    // What is registered in spite of a failure must be whole.
+    std::string name = "n";
+    auto const whole = [&](std::string const& like) {
+        return [&, like] {
+            EXPECT_EQ(cleaned(name), cleaned(like));
+            name += "+";
+        };
+    };
+    ASSERT_EQ(Engine::addShipped("a.cfg", "file"), 0);
+    failEachAllocation(
+        "memory",
         [&] {
             return Morva_SDK_SetModel_Blob(blob.data(), static_cast<unsigned>(blob.size()),
                                            name.c_str());
         },
-        [&](int) {
-            auto* const session =
-                observe([&] { return openNc(16000, 16000, 10, name.c_str()); }).result;
-            ASSERT_NE(session, nullptr);
-            EXPECT_EQ(cleanAll(session, sound), wanted);
-            nextName();
-        });
-    for (wchar_t const* file : {L"a.mvw", L"a.cfg"}) {
-        nextName();
-        failEachAllocation(
-            file == std::wstring(L"a.mvw") ? "weight file" : "control file",
-            [&] { return Morva_SDK_SetModel(file, name.c_str()); },
-            [&](int) {
-                EXPECT_NE(observe([&] { return openNc(16000, 16000, 10, name.c_str()); }).result,
-                          nullptr);
-                nextName();
-            });
-    }
-
-    ASSERT_EQ(Engine::add("vad", randomVadWeight({})), 0);
-    ASSERT_EQ(Engine::add("db", randomNcWeight({.version = "0.0.5"})), 0);
-    auto const vadOpen = [] { return Morva_VAD_CreateSession(rate(44100), duration(10), "vad"); };
-    auto const dbOpen = [] { return Morva_NoiseDB_CreateSession(rate(44100), duration(10), "db"); };
-    Morva_VAD_CloseSession(vadOpen());  // makes what the model's sessions share
-    Morva_NoiseDB_CloseSession(dbOpen());
+        whole("nc"));
     failEachAllocation(
-        "noise session", [] { return openNc(44100, 48000, 10, "nc"); },
-        [](void* s) { EXPECT_EQ(Morva_NC_CloseSession(s), 0); });
-    failEachAllocation("voice session", vadOpen,
-                       [](void* s) { EXPECT_EQ(Morva_VAD_CloseSession(s), 0); });
-    failEachAllocation("level session", dbOpen,
-                       [](void* s) { EXPECT_EQ(Morva_NoiseDB_CloseSession(s), 0); });
-    EXPECT_EQ(cleanAll(openNc(16000, 16000, 10, "nc"), sound), wanted);
+        "control file", [&] { return Morva_SDK_SetModel(L"a.cfg", name.c_str()); }, whole("file"));
+
+    void* session = nullptr;
+    auto const tryOpening = [&](auto open) {
+        return [&session, open] { return (session = open()) != nullptr ? 0 : -2; };
+    };
+    auto const openVad = [] { return Morva_VAD_CreateSession(rate(44100), duration(10), "vad"); };
+    auto const openDb = [] { return Morva_NoiseDB_CreateSession(rate(44100), duration(10), "db"); };
+    Morva_VAD_CloseSession(openVad());  // makes what the model's sessions share
+    Morva_NoiseDB_CloseSession(openDb());
+    failEachAllocation("noise session", tryOpening([] { return openNc(44100, 48000, 10, "nc"); }),
+                       [&] { EXPECT_EQ(Morva_NC_CloseSession(session), 0); });
+    failEachAllocation("voice session", tryOpening(openVad),
+                       [&] { EXPECT_EQ(Morva_VAD_CloseSession(session), 0); });
+    failEachAllocation("level session", tryOpening(openDb),
+                       [&] { EXPECT_EQ(Morva_NoiseDB_CloseSession(session), 0); });
+    EXPECT_EQ(cleaned("nc"), wanted);
 }
 
 // The first session of a model makes the objects that all of them share.
 TEST(AllocationFailure, OfAFirstSessionIsMadeUpForByTheNext) {
     auto const sound = voice(16000, 0.1, 1);
     std::vector<float> wanted;
-    for (std::size_t n = 0;; ++n) {
+    bool fired = true;
+    for (std::size_t n = 0; n == 0 || fired; ++n) {
         Engine engine;
         ASSERT_EQ(Engine::add("nc", randomNcWeight({})), 0);
-        bool fired = false;
         observe([&] {
             failingAllocation = n;
             openNc(48000, 44100, 10, "nc");
             fired = failingAllocation == 0;
-            failingAllocation = 0;
-            return 0;
+            return failingAllocation = 0;
         });
         auto const got = cleanAll(openNc(16000, 16000, 10, "nc"), sound);
         if (n == 0) wanted = got;
         ASSERT_EQ(got, wanted) << n;
-        if (!fired) break;
     }
 }
