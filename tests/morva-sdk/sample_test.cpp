@@ -58,11 +58,13 @@ double snrDb(std::span<float const> wanted, std::span<float const> got) {
 }
 
 // The values of a new session of a model that answers with one.
-Frame scores(int hz, int ms, Frame const& sound) {
+template <class Sample>
+Frame scores(int hz, int ms, std::vector<Sample> const& sound) {
     auto* const session = Morva_VAD_CreateSession(rate(hz), duration(ms), "vad");
     return valuesOf(sound, samples(hz, ms), [&](auto const& f) { return vad(session, f); });
 }
-Frame levels(int hz, int ms, Frame const& sound) {
+template <class Sample>
+Frame levels(int hz, int ms, std::vector<Sample> const& sound) {
     auto* const session = Morva_NoiseDB_CreateSession(rate(hz), duration(ms), "db");
     return valuesOf(sound, samples(hz, ms), [&](auto const& f) { return level(session, f); });
 }
@@ -138,6 +140,8 @@ TEST_F(Samples, Int16IsTheTruncatedFloat) {
             truncated.push_back(static_cast<short>(v * 32768.0F));
         }
         EXPECT_EQ(cleanAll(openNc(in, out, 20, "NC_small_16k"), pcm), truncated);
+        EXPECT_EQ(scores(in, 20, pcm), scores(in, 20, unit));
+        EXPECT_EQ(levels(in, 20, pcm), levels(in, 20, unit));
     }
 }
 

@@ -2,7 +2,7 @@
 // registration says and does: see the tests of the C interface.)
 #include <gmock/gmock.h>
 
-#include <climits>
+#include <sstream>
 #include <tuple>
 
 #include "support/temp_dir.h"
@@ -27,20 +27,17 @@ std::string identify(WeightWriter const& writer, std::string const& expectedOutp
 }
 
 TEST(Identifier, JoinsItsFiveParts) {
-    for (auto const& [rate, length, expected] :
-         std::initializer_list<std::tuple<int, int, std::string>>{
-             {16000, 175, "0.0.61016nc210301"},
-             {44100, 441, "0.0.61044nc210301"},
-             {1000, -5, "0.0.6-51nc210301"},
-             {8000, -7, "0.0.608nc210301"},
-             {1999, INT_MIN, "0.0.6-21474836481nc210301"},
-             {INT_MAX, INT_MAX, "0.0.610002147483nc210301"},
-             {999, 160, ""},
-             {INT_MIN, INT_MIN, ""}}) {
+    std::istringstream rows(
+        "16000 175 0.0.61016nc210301  44100 441 0.0.61044nc210301  1000 -5 0.0.6-51nc210301 "
+        "8000 -7 0.0.608nc210301  1999 -2147483648 0.0.6-21474836481nc210301  999 160 none "
+        "2147483647 2147483647 0.0.610002147483nc210301  -2147483648 -2147483648 none");
+    std::string expected;
+    for (int rate = 0, length = 0; rows >> rate >> length >> expected;) {
         WeightWriter writer;
         writer.add("Version", "0.0.6").add("SampleRate", rate).add("FrameLength", length);
         writer.add("ModelName", "nc").add("TimeStamp", "210301");
-        EXPECT_EQ(identify(writer, expected.empty() ? "ERROR INVALID WEIGHT\n" : ""), expected);
+        bool const none = expected == "none";
+        EXPECT_EQ(identify(writer, none ? "ERROR INVALID WEIGHT\n" : ""), none ? "" : expected);
     }
     WeightWriter writer;  // texts may be empty or hold any byte
     writer.add("Version", "").add("SampleRate", 8000).add("FrameLength", 80);
