@@ -152,32 +152,40 @@ inline std::vector<short> toPcm(std::vector<float> const& sound) {
     return pcm;
 }
 
-// Cleans a sound frame by frame; only whole frames are taken.
-template <class Sample>
-std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound) {
+// The whole frames of a sound, one after the other.
+template <class Sample, class Body>
+void forEachFrame(std::vector<Sample> const& sound, std::size_t size, Body body) {
+    for (std::size_t k = 0; (k + 1) * size <= sound.size(); ++k) {
+        auto const first = sound.begin() + static_cast<std::ptrdiff_t>(k * size);
+        body(k, std::vector<Sample>(first, first + static_cast<std::ptrdiff_t>(size)));
+    }
+}
+
+// Cleans a sound frame by frame, with `before(k)` ahead of frame k.
+template <class Sample, class Before>
+std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound, Before before) {
     unsigned inSize = 0;
     unsigned outSize = 0;
     EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &inSize, &outSize), 0);
     std::vector<Sample> all;
     std::vector<Sample> out(outSize);
-    for (std::size_t at = 0; at + inSize <= sound.size(); at += inSize) {
-        std::vector<Sample> const frame(sound.begin() + static_cast<long>(at),
-                                        sound.begin() + static_cast<long>(at + inSize));
+    forEachFrame(sound, inSize, [&](std::size_t k, std::vector<Sample> const& frame) {
+        before(k);
         EXPECT_EQ(clean(session, frame, out), 0);
         all.insert(all.end(), out.begin(), out.end());
-    }
+    });
     return all;
+}
+template <class Sample>
+std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound) {
+    return cleanAll(session, sound, [](std::size_t) {});
 }
 
 // The values of a model that answers with one per frame.
 template <class Sample, class Frame>
 std::vector<float> valuesOf(std::vector<Sample> const& sound, unsigned frameSize, Frame frame) {
     std::vector<float> values;
-    for (std::size_t at = 0; at + frameSize <= sound.size(); at += frameSize) {
-        values.push_back(
-            frame(std::vector<Sample>(sound.begin() + static_cast<long>(at),
-                                      sound.begin() + static_cast<long>(at + frameSize))));
-    }
+    forEachFrame(sound, frameSize, [&](std::size_t, auto const& f) { values.push_back(frame(f)); });
     return values;
 }
 
