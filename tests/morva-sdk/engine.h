@@ -189,4 +189,49 @@ std::vector<float> valuesOf(std::vector<Sample> const& sound, unsigned frameSize
     return values;
 }
 
+// A session of any kind, 10 ms, driven through one call.
+enum class Kind { noise, voice, level };
+
+class Stream {
+public:
+    Stream(Kind kind, std::string const& model, int in, int out)
+        : kind_(kind),
+          inSize_(samples(in, 10)),
+          outSize_(kind == Kind::noise ? samples(out, 10) : 1) {
+        auto const* const name = model.c_str();
+        handle_ = kind == Kind::noise   ? openNc(in, out, 10, name)
+                  : kind == Kind::voice ? Morva_VAD_CreateSession(rate(in), duration(10), name)
+                                        : Morva_NoiseDB_CreateSession(rate(in), duration(10), name);
+        EXPECT_NE(handle_, nullptr) << model;
+    }
+    Stream(Stream const&) = delete;
+    Stream& operator=(Stream const&) = delete;
+    ~Stream() {
+        auto* const close = kind_ == Kind::noise   ? Morva_NC_CloseSession
+                            : kind_ == Kind::voice ? Morva_VAD_CloseSession
+                                                   : Morva_NoiseDB_CloseSession;
+        EXPECT_EQ(close(handle_), 0);
+    }
+
+    void* handle() const { return handle_; }
+    std::size_t inSize() const { return inSize_; }
+    std::size_t outSize() const { return outSize_; }
+
+    template <class Sample>
+    void frame(std::vector<Sample> const& in, std::vector<Sample>& out) const {
+        if (kind_ == Kind::noise) {
+            clean(handle_, in, out);
+        } else {
+            out[0] =
+                static_cast<Sample>(kind_ == Kind::voice ? vad(handle_, in) : level(handle_, in));
+        }
+    }
+
+private:
+    Kind kind_;
+    std::size_t inSize_;
+    std::size_t outSize_;
+    void* handle_ = nullptr;
+};
+
 }  // namespace sdk_test

@@ -63,21 +63,17 @@ TEST_F(Registration, WeightFiles) {
 }
 
 TEST_F(Registration, NamesOutsideAscii) {
-    std::wstring const wide = L"/m\u00f6d\u00e9l \u6a21\u578b \U0001F3A4.mvw";
-    std::string const bytes =
-        "/m\xc3\xb6"
-        "d\xc3\xa9l \xe6\xa8\xa1\xe5\x9e\x8b \xf0\x9f\x8e\xa4.mvw";
-    test_support::writeFile(dir_.path().string() + bytes, randomNcWeight({}));
-    auto const path = dir_.path().wstring() + wide;
+    std::string const name = "m\u00f6d\u00e9l \u6a21\u578b \U0001F3A4.mvw";
+    dir_.write(name, randomNcWeight({}));
+    auto const path = dir_.path().wstring() + L"/m\u00f6d\u00e9l \u6a21\u578b \U0001F3A4.mvw";
     EXPECT_THAT(observe([&] { return Morva_SDK_SetModel(path.c_str(), "wide"); }),
-                gives(0, "", "WEIGHT " + dir_.path().string() + bytes + "\n"));
-    dir_.write("w.cfg", "WEIGHT ." + bytes + "\n");
+                gives(0, "", "WEIGHT " + at(name) + "\n"));
+    dir_.write("w.cfg", "WEIGHT ./" + name + "\n");
     EXPECT_EQ(add("w.cfg", "by control").result, 0);
     // What has no UTF-8 form, and what is none.
     EXPECT_EQ(observe([] { return Morva_SDK_SetModel(L"/\x110000.mvw", "s"); }).result, -2);
     dir_.write("bad.cfg", "WEIGHT \xff\xfe.mvw\n");
     EXPECT_EQ(add("bad.cfg", "s").result, -2);
-    EXPECT_EQ(openNamed("s").result, nullptr);
     EXPECT_NE(openNamed("wide").result, nullptr);
 }
 

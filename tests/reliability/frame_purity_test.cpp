@@ -112,53 +112,40 @@ int systemCallOf(std::function<void()> const& work) {
     return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
 }
 
-// A session of any kind and its frames: loud, quiet, silent, denormal and broken ones in turn.
+// A warm stream and its frames: loud, quiet, silent, denormal and broken ones in turn.
 template <class Sample>
-class Stream {
+class Watched {
 public:
-    Stream(int kind, std::string const& model, int hz)
-        : kind_(kind), in_(samples(hz, 10)), out_(samples(hz == 44100 ? 48000 : hz, 10)) {
-        auto const* const name = model.c_str();
-        session_ = kind == 1   ? openNc(hz, hz == 44100 ? 48000 : hz, 10, name)
-                   : kind == 2 ? Morva_VAD_CreateSession(rate(hz), duration(10), name)
-                               : Morva_NoiseDB_CreateSession(rate(hz), duration(10), name);
-        EXPECT_NE(session_, nullptr) << model;
+    Watched(Kind kind, std::string const& model, int hz)
+        : stream_(kind, model, hz, hz == 44100 ? 48000 : hz), out_(stream_.outSize()) {
+        bool const isFloat = std::is_same_v<Sample, float>;
         for (float const gain : {1.0F, 0.01F, 0.0F, 1e-38F, 30.0F, NAN}) {
             auto sound = voice(hz, 0.01, 1, 0.3F);
-            for (float& sample : sound) sample *= gain;
-            if constexpr (std::is_same_v<Sample, float>) {
-                frames_.push_back(sound);
-            } else {
-                for (float& s : sound) s = std::isnan(s) ? -1.0F : std::clamp(s, -1.0F, 1.0F);
-                frames_.push_back(toPcm(sound));
+            for (float& s : sound) {
+                s = isFloat ? s * gain
+                            : 32767.0F * std::clamp(s * std::min(gain, 30.0F), -1.0F, 1.0F);
             }
+            frames_.emplace_back(sound.begin(), sound.end());
         }
-        for (int i = 0; i < 100; ++i) frame(in_);
-        EXPECT_EQ(kind == 1 ? MorvaExt_NC_EnableVoice(session_, "VAD_weight.mvw") : 0, 0);
+        std::vector<Sample> const silence(stream_.inSize());
+        for (int i = 0; i < 100; ++i) stream_.frame(silence, out_);
+        hears_ = MorvaExt_NC_EnableVoice(stream_.handle(), "VAD_weight.mvw") == 0;
+        EXPECT_EQ(hears_, kind == Kind::noise);
     }
 
     // With the bypass on for a while, never before the warm-up ends.
     void run(int count) {
         for (int i = 0; i < count; ++i) {
-            if (kind_ == 1) MorvaExt_NC_SetBypass(session_, i / 5 % 2);
-            frame(frames_[static_cast<std::size_t>(i) % frames_.size()]);
+            if (hears_) MorvaExt_NC_SetBypass(stream_.handle(), i / 5 % 2);
+            stream_.frame(frames_[static_cast<std::size_t>(i) % frames_.size()], out_);
         }
     }
 
 private:
-    void frame(std::vector<Sample> const& in) {
-        if (kind_ == 1) {
-            clean(session_, in, out_);
-        } else {
-            kind_ == 2 ? vad(session_, in) : level(session_, in);
-        }
-    }
-
-    int kind_;
-    void* session_ = nullptr;
-    std::vector<Sample> in_;
+    Stream stream_;
     std::vector<Sample> out_;
     std::vector<std::vector<Sample>> frames_;
+    bool hears_ = false;
 };
 
 // CONTROL_ entries that switch every stage of a version on.
@@ -186,15 +173,19 @@ struct Report {
 TEST(FramePurity, NoAllocationNoLockNoSystemCall) {
     Engine engine;
     std::optional<test_support::CapturedOutput> quiet(1);
-    std::vector<std::pair<int, std::string>> models;
+    std::optional<test_support::CapturedOutput> silent(2);
+    std::vector<std::pair<Kind, std::string>> models;
     for (std::string const file : {"NC_small_8k.mvw", "NC_small_16k.mvw", "c6.xs.f.ca03f4.mvw",
                                    "VAD_weight.mvw", "noise_level_16k.mvw"}) {
         ASSERT_EQ(Engine::addShipped(MORVA_TEST_MODELS + file, file.c_str()), 0);
-        models.emplace_back(file[0] == 'V' ? 2 : file[0] == 'n' ? 3 : 1, file);
+        models.emplace_back(file[0] == 'V'   ? Kind::voice
+                            : file[0] == 'n' ? Kind::level
+                                             : Kind::noise,
+                            file);
     }
     for (std::string const version : {"0.0.1", "0.0.2", "0.0.3", "0.0.4", "0.0.5", "0.0.6"}) {
         ASSERT_EQ(Engine::add(version.c_str(), withEveryStage(version)), 0);
-        models.emplace_back(1, version);
+        models.emplace_back(Kind::noise, version);
     }
     int const count = std::getenv("MORVA_TEST_FULL") != nullptr ? 100000 : 100;
     std::vector<std::string> names;
@@ -202,8 +193,8 @@ TEST(FramePurity, NoAllocationNoLockNoSystemCall) {
     for (int const hz : kRates) {
         for (auto const& [kind, model] : models) {
             names.push_back(model + " at " + std::to_string(hz));
-            auto const floats = std::make_shared<Stream<float>>(kind, model, hz);
-            auto const whole = std::make_shared<Stream<short>>(kind, model, hz);
+            auto const floats = std::make_shared<Watched<float>>(kind, model, hz);
+            auto const whole = std::make_shared<Watched<short>>(kind, model, hz);
             streams.emplace_back([=] {
                 floats->run(count);
                 whole->run(count);
@@ -211,6 +202,7 @@ TEST(FramePurity, NoAllocationNoLockNoSystemCall) {
         }
     }
     quiet.reset();
+    silent.reset();
     auto* const report = static_cast<Report*>(
         mmap(nullptr, sizeof(Report), PROT_READ | PROT_WRITE, MAP_SHARED | MAP_ANONYMOUS, -1, 0));
     auto const work = [&] {

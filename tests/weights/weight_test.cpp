@@ -5,8 +5,7 @@
 #include <gtest/gtest.h>
 #include <sys/stat.h>
 
-#include <bit>
-#include <functional>
+#include <cmath>
 #include <random>
 #include <sstream>
 #include <thread>
@@ -48,59 +47,35 @@ void expectModestAndEqualToReference(std::string const& bytes) {
     EXPECT_EQ(weight.message(), "");
 }
 
-// Records of every type in random order, sizes 0 and 1 included.
-WeightWriter randomRecords(unsigned seed, int count) {
-    std::mt19937 engine(seed);
-    RandomValues random(seed);
-    auto const upTo = [&engine](int limit) {
-        return std::uniform_int_distribution(0, limit)(engine);
-    };
-    auto const floats = [&] { return random.vector(upTo(9), -1e6F, 1e6F); };
-    auto const matrix = [&] {
-        auto const rows = upTo(5);
-        return random.matrix(rows, upTo(5));
-    };
-    auto const text = [&] {
-        std::string bytes(static_cast<std::size_t>(upTo(12)), '\0');
-        for (auto& byte : bytes) byte = static_cast<char>(upTo(255));
-        return bytes;
-    };
-    auto const list = [&](auto const& make) {
-        std::vector<decltype(make())> values(static_cast<std::size_t>(upTo(4)));
-        for (auto& value : values) value = make();
-        return values;
-    };
+// Records of every type, empty and equal ones included.
+std::string everyType() {
+    CONTAINERS::Matrix const matrix{{1, 2, 3, 4, 5, 6}, 2, 3};
     WeightWriter writer;
-    auto const add = [&](auto const& value) { writer.add(text(), value); };
-    std::function<void()> const kinds[] = {
-        [&] { add(std::bit_cast<float>(static_cast<std::uint32_t>(engine()))); },
-        [&] { add(static_cast<int>(engine())); },
-        [&] { add(text()); },
-        [&] { add(floats()); },
-        [&] { add(matrix()); },
-        [&] { add(list(floats)); },
-        [&] { add(list(matrix)); },
-    };
-    for (int i = 0; i < count; ++i) kinds[upTo(6)]();
-    return writer;
+    writer.add("Version", "0.0.6").add("", "a\xff").add("rate", INT32_MIN).add("gain", NAN);
+    writer.add("MU", std::vector{1.0F, 1e-40F}).add("none", WeightWriter::Vector{});
+    writer.add("W", matrix)
+        .add("W", 3)
+        .add("rows", WeightWriter::Vectors{{1.0F}, {}, {2.0F, 3.0F}});
+    writer.add("layers", WeightWriter::Matrices{matrix, {{}, 0, 4}, {{7}, 1, 1}});
+    writer.header("wide", 4).number(3'000'000'000U).number(0);
+    return writer.bytes();
 }
 
 TEST(Weight, EveryTypeComesBackBitForBit) {
     TempDir const dir;
-    for (unsigned seed = 1; seed <= 20; ++seed) {
-        auto const bytes = randomRecords(seed, 30).bytes();
+    for (auto const& bytes : {everyType(), randomNcWeight({}), randomVadWeight({})}) {
         auto const expected = ReferenceReader(bytes).read();
-        ASSERT_GT(expected.size(), 10U);
-        EXPECT_EQ(writeBack(fromBlob(bytes).values()), expected) << seed;
+        ASSERT_GT(expected.size(), 8U);
+        EXPECT_EQ(writeBack(fromBlob(bytes).values()), expected);
         Weight fromFile;
         EXPECT_TRUE(fromFile.read(UTILS::Path(dir.write("w.mvw", bytes).wstring().c_str())));
-        EXPECT_EQ(writeBack(fromFile.values()), expected) << seed;
+        EXPECT_EQ(writeBack(fromFile.values()), expected);
     }
 }
 
 TEST(Weight, CutAtEveryByteKeepsTheWholeRecordsBeforeTheCut) {
     TempDir const dir;
-    auto const bytes = randomRecords(1, 12).bytes();
+    auto const bytes = everyType();
     for (std::size_t size = 0; size <= bytes.size(); ++size) {
         SCOPED_TRACE(size);
         auto const cut = bytes.substr(0, size);
@@ -115,7 +90,7 @@ TEST(Weight, CutAtEveryByteKeepsTheWholeRecordsBeforeTheCut) {
 }
 
 TEST(Weight, ChangedAndRandomBytesAgreeWithTheReference) {
-    auto const clean = randomRecords(2, 12).bytes();
+    auto const clean = everyType();
     for (unsigned seed = 1; seed <= 2000; ++seed) {
         std::mt19937 engine(seed);
         auto flipped = clean;
