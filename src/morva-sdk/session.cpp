@@ -8,7 +8,7 @@
 #include "morva-sdk/error_funnel.h"
 #include "noise_canceller/hop_pipeline.h"
 #include "utils/exception.h"
-#include "utils/flush_to_zero.h"
+#include "utils/float_control.h"
 #include "utils/pcm.h"
 
 namespace MORVA::MORVA_SDK {
@@ -127,7 +127,7 @@ bool MorvaSessionT::cleanSamples(Sample const* input, std::size_t inputSize, Sam
         printSizeError(Format::sizeError, inputFrameSize_, std::to_string(outputFrameSize_));
         return false;
     }
-    UTILS::ScopedFlushToZero const fast;
+    UTILS::ScopedFloatControl const fast(UTILS::Denormals::asZero);
     if (voice_) lastVoice_ = voice_->frameVad(input, inputSize);
     frame_.resize(inputSize);
     Format::read({input, inputSize}, frame_);
@@ -159,7 +159,7 @@ bool MorvaSessionT::takeFrame(Sample const* input, std::size_t inputSize) {
 }
 
 float MorvaSessionT::modelValue() {
-    UTILS::ScopedFlushToZero const fast;
+    UTILS::ScopedFloatControl const fast(UTILS::Denormals::asZero);
     through(*inputResampler_);
     UTILS::clipToPcm16(frame_);
     cleaner_->cleanNoise(frame_);
