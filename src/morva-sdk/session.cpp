@@ -7,7 +7,7 @@
 #include "morva-sdk/error_funnel.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "utils/exception.h"
-#include "utils/flush_to_zero.h"
+#include "utils/float_control.h"
 #include "utils/pcm.h"
 
 namespace MORVA::MORVA_SDK {
@@ -96,7 +96,7 @@ bool MorvaSessionT::cleanSamples(std::span<Sample const> input, std::span<Sample
         printSizeError(Format::sizeError, inputFrameSize_, std::to_string(outputFrameSize_));
         return false;
     }
-    UTILS::ScopedFlushToZero const fast;
+    UTILS::ScopedFloatControl const mode(UTILS::Denormals::asZero);
     frame_.resize(input.size());
     Format::read(input, frame_);
     sound().clean(frame_);
@@ -120,7 +120,7 @@ std::optional<float> MorvaSessionT::valueOf(std::span<Sample const> input) {
         printSizeError(Format::sizeError, inputFrameSize_, "");
         return std::nullopt;
     }
-    UTILS::ScopedFlushToZero const fast;
+    UTILS::ScopedFloatControl const mode(UTILS::Denormals::asZero);
     frame_.resize(input.size());
     Format::read(input, frame_);
     std::get<ModelStage>(path_).run(frame_);

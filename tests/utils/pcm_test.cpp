@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "support/random.h"
-#include "utils/flush_to_zero.h"
+#include "utils/float_control.h"
 
 using namespace MORVA::UTILS;
 using test_support::Random;
@@ -80,15 +80,18 @@ TEST(Pcm, ConversionTruncatesAndSaturates) {
     }
 }
 
-TEST(FlushToZero, HoldsForItsScopeOnly) {
+TEST(FloatControl, HoldsForItsScopeOnly) {
     float volatile tiny = 1e-39f;
     auto const denormalSurvives = [&] { return tiny * 1.0f != 0.0f; };
-    ASSERT_TRUE(denormalSurvives());
+    unsigned const before = _mm_getcsr();
     {
-        ScopedFlushToZero const outer;
+        ScopedFloatControl const outer(Denormals::asZero);
         EXPECT_FALSE(denormalSurvives());
-        { ScopedFlushToZero const inner; }
+        {
+            ScopedFloatControl const inner(Denormals::kept);
+            EXPECT_TRUE(denormalSurvives());
+        }
         EXPECT_FALSE(denormalSurvives());
     }
-    EXPECT_TRUE(denormalSurvives());
+    EXPECT_EQ(_mm_getcsr(), before);
 }
