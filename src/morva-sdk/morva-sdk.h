@@ -7,6 +7,8 @@
  *   2. Morva_SDK_SetModel / Morva_SDK_SetModel_Blob for each model;
  *   3. create a session per audio stream, push frames through it, close it;
  *   4. Morva_SDK_GlobalDestroy, which also frees every session that is still open.
+ *   A process may end without the last step, in the middle of a frame call too: its exit destroys
+ *   nothing of the engine.
  *
  * Threads
  *   [control thread]  takes the engine's lock, allocates, prints; never call it from an audio
@@ -15,6 +17,8 @@
  *   a time per session; different sessions may run on different threads at the same time.
  *   Do not close a session while a frame call on it runs, nor destroy the engine while any call
  *   runs.
+ *   The caller's floating-point control word is set aside for the length of every call: rounding
+ *   modes and traps of the thread change no result.
  *
  * Processor
  *   The engine needs an x86-64 processor with AVX2, FMA and BMI2; on any other Morva_SDK_GlobalInit
@@ -33,8 +37,8 @@
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
  *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and
  *   are limited to that range (float output lies in -1..0.999969482421875). A sample that is no
- *   sound (a NaN, an infinity, a magnitude above 1e6) counts as 0, so that a bad frame is like a
- *   frame of silence: nothing of it stays in the session. Input and output may be the same buffer.
+ *   sound (a NaN, an infinity) counts as 0, so that a bad frame is like a frame of silence: nothing
+ *   of it stays in the session. Input and output may be the same buffer.
  */
 #ifndef MORVA_SDK_H
 #define MORVA_SDK_H
