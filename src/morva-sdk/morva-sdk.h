@@ -33,8 +33,8 @@
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
  *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and
  *   are limited to that range (float output lies in -1..0.999969482421875). A sample that is no
- *   sound (a NaN, an infinity, a magnitude above 1e6) counts as 0, so that a bad frame is like a
- *   frame of silence: nothing of it stays in the session. Input and output may be the same buffer.
+ *   sound (a NaN, an infinity) counts as 0, so that a bad frame is like a frame of silence: nothing
+ *   of it stays in the session. Input and output may be the same buffer.
  */
 #ifndef MORVA_SDK_H
 #define MORVA_SDK_H
