@@ -19,7 +19,7 @@ constexpr std::int64_t wing = gridPoints * crossings;
 constexpr double cutoff = 0.9;
 constexpr double kaiserBeta = 6.0;
 constexpr std::size_t vectorLanes = 8;
-constexpr std::size_t maxCoefficients = std::size_t{1} << 22;
+constexpr std::size_t maxCoefficients = std::size_t{1} << 22;  // 16 MiB
 
 // The zeroth modified Bessel function, by its power series.
 double besselI0(double x) {
@@ -82,7 +82,7 @@ InterpolationFilter::InterpolationFilter(std::uint64_t inStep, std::uint64_t out
       scale_(std::min(1.0, static_cast<double>(outStep) / static_cast<double>(inStep))),
       reach_(static_cast<std::ptrdiff_t>(crossings / scale_)),
       taps_(roundUp(2 * static_cast<std::size_t>(reach_) + 2)) {
-    if (outStep > maxCoefficients / taps_) {
+    if (outStep > maxCoefficients / (kRowsPerPhase * taps_)) {
         raise("The resampler's filter for these rates would be too large",
               "src/utils/interpolation_filter", "InterpolationFilter");
     }
