@@ -4,6 +4,7 @@ import itertools
 import os
 import pathlib
 import re
+import resource
 
 import numpy as np
 import pytest
@@ -166,6 +167,20 @@ def test_control_file_over_a_weight(morva, model, recording, tmp_path):
     morva("denoise", source, tmp_path / "out.wav", "--model", model(constant_mask(16000)), "--control", control)
     after, _ = soundfile.read(tmp_path / "out.wav")
     assert np.abs(after - 2 * before[:, 0]).max() < 1e-5
+
+
+def test_nothing_is_left_when_the_disk_is_full(morva, model, recording, tmp_path):
+    """Neither the control file laid over a weight, which is written to a temporary one, nor half a result."""
+    source, weight = recording(np.zeros(16000), 16000), model(constant_mask(16000))
+    control = tmp_path / "louder.cfg"
+    control.write_text("MORVA_VOLUME_UP_v0_0_6 TRUE\n")
+    there = set(tmp_path.iterdir())
+    for more in (["--control", control], []):
+        done = morva("denoise", source, tmp_path / "out.wav", "--model", weight, *more, fails=True,
+                     env=os.environ | {"TMPDIR": str(tmp_path)}, restore_signals=False,
+                     preexec_fn=lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (0, 0)))
+        print(done.stderr)
+        assert set(tmp_path.iterdir()) == there
 
 
 @pytest.mark.parametrize("option", ["--model", "--control"])

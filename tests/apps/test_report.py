@@ -149,6 +149,7 @@ def test_hardly_any_sound(browser, morva, model, recording, tmp_path, samples):
 def test_the_page_is_self_contained_and_holds_the_sound(morva, model, recording, tmp_path):
     import base64
     import io
+    import json
     import re
 
     sound = speechlike(16000, 0.5, seed=1)[:, 0]
@@ -164,8 +165,9 @@ def test_the_page_is_self_contained_and_holds_the_sound(morva, model, recording,
     page = (tmp_path / "page.html").read_text()
     assert not re.search(r"""(?:src|href)=["'](?!data:)""", page)
     assert "http" not in re.sub(r"http-equiv", "", page)
-    for name, data in re.findall(r'<audio id="(\w+)".*?base64,([^"]*)"', page):
-        samples, rate = soundfile.read(io.BytesIO(base64.b64decode(data)))
+    data = json.loads(re.search(r'<script type="application/json"[^>]*>(.*?)</script>', page, re.DOTALL)[1])
+    for name in ("before", "after"):
+        samples, rate = soundfile.read(io.BytesIO(base64.b64decode(data[name])))
         assert rate == 16000
         assert np.abs(samples - sound).max() < 2 / 32768, name
 
@@ -199,3 +201,15 @@ def test_errors(morva, model, recording, tmp_path, arguments, text):
     recording(np.zeros(1600), 16000)
     done = morva("report", *arguments, "--model", model(constant_mask(16000)), cwd=tmp_path, fails=True)
     assert text in done.stderr
+
+
+def test_one_model_in_two_roles(morva, model, recording, tmp_path):
+    """The same file as cleaner and as level model, and two files of one name."""
+    source = recording(speechlike(16000, 0.5, seed=1), 16000)
+    level = model(constant_mask(16000, 20, 0.0, "0.0.5"), "level.mvw")
+    (tmp_path / "other").mkdir()
+    namesake = model(constant_mask(16000, 30, 0.0, "0.0.5"), "other/level.mvw")
+    for role in (level, namesake):
+        done = morva("report", source, tmp_path / "p.html", "--model", level, "--level-model", role, "--models", tmp_path)
+        assert "Noise level" not in done.stderr
+        assert "Median noise level" in (tmp_path / "p.html").read_text()

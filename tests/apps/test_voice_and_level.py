@@ -84,7 +84,7 @@ def test_channels_are_averaged(morva, model, recording):
 
 
 @pytest.mark.parametrize("rate", RATES)
-@pytest.mark.parametrize("level", [-20.0, -50.0])
+@pytest.mark.parametrize("level", [-20.0, -50.0, -115.0])
 def test_what_is_removed_is_the_level(morva, model, recording, rate, level):
     noise = speechlike(rate, 3.0, seed=1, top=min(3000, 0.4 * rate))[:, 0]
     second = slice(rate, 2 * rate)
