@@ -2,7 +2,7 @@
 
 #include "error.h"
 #include "morva-ext.h"
-#include "morva-sdk.h"
+#include "morva-sdk/vocabulary.h"
 
 namespace morva::cli {
 namespace {
@@ -32,6 +32,11 @@ void mustSucceed(int code) {
 }
 
 }  // namespace
+
+std::size_t SessionSetup::frameSize() const {
+    return MORVA::MORVA_SDK::getSampleCount(static_cast<MorvaFrameDuration>(frameMs),
+                                            static_cast<MorvaSamplingRate>(rateHz));
+}
 
 std::wstring wide(std::filesystem::path const& path) {
     auto const points = path.u32string();

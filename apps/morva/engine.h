@@ -6,6 +6,7 @@
 // The Engine outlives its sessions.
 #pragma once
 
+#include <cstddef>
 #include <filesystem>
 #include <memory>
 #include <span>
@@ -20,6 +21,8 @@ struct SessionSetup {
     int rateHz = 0;
     int frameMs = 10;
     std::string model;  // name under which it was registered
+
+    std::size_t frameSize() const;  // samples
 };
 
 class Engine {

@@ -6,7 +6,6 @@
 
 #include "audio_file.h"
 #include "rate_converter.h"
-#include "rates.h"
 
 namespace morva::cli {
 namespace {
@@ -16,7 +15,7 @@ constexpr std::size_t framesPerRead = 4096;
 template <class ValueOf>
 std::vector<float> forEachFrame(MonoSound const& sound, SessionSetup const& setup,
                                 ValueOf valueOf) {
-    auto const size = static_cast<std::size_t>(frameSize(setup.rateHz, setup.frameMs));
+    auto const size = setup.frameSize();
     RateConverter converter(sound.rateHz, setup.rateHz);
     std::vector<float> samples;
     converter.push(sound.samples, samples);

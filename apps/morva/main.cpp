@@ -4,12 +4,13 @@
 #include <exception>
 
 #include "command.h"
+#include "morva-sdk/vocabulary.h"
 
 namespace morva::cli {
 
 void addFrameOptions(CLI::App& command, int& frameMs, bool& verbose) {
     command.add_option("--frame", frameMs, "Length of the engine's frames in milliseconds")
-        ->check(CLI::IsMember({10, 20, 30, 40}))
+        ->check(CLI::IsMember(MORVA::MORVA_SDK::kFrameDurationsMs))
         ->capture_default_str();
     command.add_flag("--verbose", verbose, "Show what the engine prints");
 }
