@@ -51,12 +51,11 @@ def recording(tmp_path):
 
 
 def speechlike(rate: int, seconds: float, seed: int, channels: int = 1) -> np.ndarray:
-    """Noise between 200 and 3000 Hz with slow swells: full enough to align, and free of resampling edges."""
+    """Noise between 200 and 3000 Hz that comes and goes: full enough to align, with nothing at the band's edges."""
     rng = np.random.default_rng(seed)
     count = round(rate * seconds)
     spectrum = np.fft.rfft(rng.standard_normal((count, channels)), axis=0)
     hz = np.fft.rfftfreq(count, 1 / rate)
     spectrum[(hz < 200) | (hz > min(3000, 0.4 * rate))] = 0
     sound = np.fft.irfft(spectrum, count, axis=0)
-    swell = 0.6 + 0.4 * np.sin(2 * np.pi * 1.3 * np.arange(count) / rate)
-    return sound / np.abs(sound).max() * 0.7 * swell[:, None]
+    return sound / np.abs(sound).max() * 0.9 * np.hanning(count)[:, None]

@@ -32,7 +32,7 @@ REFUSED = [
     ("denoise in.wav out.wav --model notes.txt", "ends in .mvw or .cfg"),
     ("denoise in.wav out.wav --model folder", "is a folder"),
     ("denoise in.wav out.wav --model text.mvw", "text.mvw: the model cannot be used: there are no Weight version"),
-    ("denoise in.wav out.wav --model cut.mvw", "ERROR DATA With Key: WeightNonLinear"),
+    ("denoise in.wav out.wav --model cut.mvw", "cut.mvw: the model cannot be used: ERROR DATA"),
     ("denoise in.wav out.wav --model voice.mvw", "Unsupported weight version"),
     ("denoise in.wav out.wav --model half.cfg", "half.cfg: a line is not made of a key and a value"),
     ("denoise in.wav out.wav --model louder.cfg", "louder.cfg: names no weight"),

@@ -74,7 +74,7 @@ def test_all_plots_are_drawn_and_both_sounds_play(opened, morva, model, recordin
     sound[:24000] = 0
     source = recording(sound, 48000, 'a <b> & "c" </script> äö.wav')
     others = ["--vad-model", model(loudness_voice(), "v.mvw"), "--level-model", model(noise_level(), "l.mvw")]
-    morva("report", source, tmp_path / "page.html", "--model", model(constant_mask(mask=0.0)), *others)
+    morva("report", source, tmp_path / "page.html", "--model", model(constant_mask(mask=0)), *others)
     browser = opened()
     inked = {}
     for name in ("wave-before", "wave-after", "spectrum-before", "spectrum-after", "score", "level"):
@@ -105,6 +105,10 @@ def test_a_page_of_little_sound_without_voice_and_level_models(opened, morva, mo
         assert browser.find_element("id", name).is_displayed() is shown
 
 
+def data_of(page):
+    return json.loads(re.search(r'<script type="application/json"[^>]*>(.*?)</script>', page.read_text(), re.DOTALL)[1])
+
+
 def test_the_page_is_self_contained_and_holds_the_first_seconds(morva, model, recording, tmp_path):
     sound = speechlike(16000, 1.5, seed=1)[:, 0]
     options = ("--model", model(constant_mask()), "--models", tmp_path, "--max-seconds", 1)
@@ -113,18 +117,17 @@ def test_the_page_is_self_contained_and_holds_the_first_seconds(morva, model, re
     page = (tmp_path / "page.html").read_text()
     assert not re.search(r"""(?:src|href)=["'](?!data:)""", page)
     assert "http" not in page.replace("http-equiv", "")
-    data = json.loads(re.search(r'<script type="application/json"[^>]*>(.*?)</script>', page, re.DOTALL)[1])
+    data = data_of(tmp_path / "page.html")
     for name in ("before", "after"):
         samples, rate = soundfile.read(io.BytesIO(base64.b64decode(data[name])))
         assert rate == 16000
-        assert np.abs(samples - sound[:16000]).max() <= 2**-16 + 2**-18, name
+        assert np.abs(samples - sound[:16000])[:-400].max() <= 2**-16 + 2**-18, name
 
 
 def test_one_model_for_two_purposes_and_two_of_one_name(morva, model, recording, tmp_path):
     (tmp_path / "other").mkdir()
-    level, namesake = model(noise_level(), "level.mvw"), model(noise_level(frame_ms=30), "other/level.mvw")
+    level, namesake = model(noise_level(), "level.mvw"), model(noise_level(1), "other/level.mvw")
     source, page = recording(speechlike(16000, 0.5, seed=1), 16000), tmp_path / "page.html"
-    for other in (level, namesake):
-        done = morva("report", source, page, "--model", level, "--level-model", other, "--models", tmp_path)
-        assert "Noise level" not in done.stderr
-        assert "Median noise level" in page.read_text()
+    for other, heard in [(level, True), (namesake, False)]:
+        morva("report", source, page, "--model", level, "--level-model", other, "--models", tmp_path)
+        assert (data_of(page)["levels"][-1] > -60) is heard

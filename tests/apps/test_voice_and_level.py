@@ -118,8 +118,8 @@ def test_what_is_removed_is_the_level(morva, model, recording, rate, level):
 
 def test_a_mask_that_removes_nothing_reads_as_silence(morva, model, recording):
     source = recording(speechlike(16000, 1.0, 2), 16000)
-    page = json.loads(morva("level", source, "--model", model(noise_level(1.0)), "--format", "json").stdout)
-    assert max(page["levels_db"]) < -50
+    page = json.loads(morva("level", source, "--model", model(noise_level(1)), "--format", "json").stdout)
+    assert max(page["levels_db"]) < -20  # of a least significant bit
     assert len(page["levels_db"]) == 100
 
 
