@@ -5,7 +5,6 @@ import json
 import numpy as np
 import pytest
 
-from conftest import SOURCE
 from weights import constant_mask, loudness_voice
 
 
@@ -44,21 +43,17 @@ def test_values_are_described_as_written(morva, model, seed):
     assert page["parameters"] == sum(part.size for part in arrays)
 
 
-def test_cost_and_latency_of_a_cleaner(morva, model):
-    values = constant_mask()
-    page = facts(morva, model(values))
-    lists = [value if isinstance(value, list) else [value] for value in values.values()]
+@pytest.mark.parametrize("ms", [10, 40])
+@pytest.mark.parametrize(
+    ("values", "kind"), [(constant_mask, "noise cancellation"), (loudness_voice, "voice activity")]
+)
+def test_cost_and_latency(morva, model, values, kind, ms):
+    page = facts(morva, model(values()), "--frame", ms)
+    cleans = values is constant_mask
+    lists = [value if isinstance(value, list) else [value] for value in values().values()]
     products = sum(part.size for parts in lists for part in parts if getattr(part, "ndim", 0) == 2)
-    assert page["multiply_adds_per_second"] == pytest.approx(products * 100)
-    assert (page["runs"], page["kind"], page["sample_rate"]) == (True, "noise cancellation", 16000)
-    assert page["latency_ms"] == 10
-
-
-def test_cost_of_a_voice_model_goes_with_the_frame(morva, model):
-    for ms, steps in [(10, 100), (40, 25)]:
-        page = facts(morva, model(loudness_voice()), "--frame", ms)
-        assert (page["kind"], page["latency_ms"]) == ("voice activity", None)
-        assert page["multiply_adds_per_second"] == pytest.approx((306 + 306 + 1) * steps)
+    assert page["multiply_adds_per_second"] == pytest.approx(products * (100 if cleans else 1000 / ms))
+    assert (page["runs"], page["kind"], page["latency_ms"]) == (True, kind, 10 if cleans else None)
 
 
 def test_what_is_odd_is_shown_and_steers_no_terminal(morva, model):
@@ -70,11 +65,3 @@ def test_what_is_odd_is_shown_and_steers_no_terminal(morva, model):
     text = morva("inspect", path, encoding="latin1").stdout
     assert "60 NOT FINITE" in text
     assert not set(text) & {"\x1b", "\x07"}
-
-
-@pytest.mark.parametrize("path", sorted((SOURCE / "models").glob("*.mvw")), ids=lambda path: path.name)
-def test_every_shipped_model_runs(morva, path):
-    page = facts(morva, path)
-    assert page["runs"] is True and page["kind"] != "unknown"
-    assert page["multiply_adds_per_second"] <= 100e6
-    assert not any("not_finite" in entry for entry in page["values"])

@@ -116,13 +116,6 @@ def test_what_is_removed_is_the_level(morva, model, recording, rate, level):
         assert float(r["level_db"]) - float(r["level_dbfs"]) == pytest.approx(90.309, abs=1e-3)
 
 
-def test_a_mask_that_removes_nothing_reads_as_silence(morva, model, recording):
-    source = recording(speechlike(16000, 1.0, 2), 16000)
-    page = json.loads(morva("level", source, "--model", model(noise_level(1)), "--format", "json").stdout)
-    assert max(page["levels_db"]) < -20  # of a least significant bit
-    assert len(page["levels_db"]) == 100
-
-
 def test_a_file_without_samples(morva, model, recording):
     source = recording(np.zeros(0), 16000)
     assert morva("vad", source, "--model", model(loudness_voice()), "--format", "csv").stdout.count("\n") == 1
