@@ -9,8 +9,6 @@
 #include <memory>
 #include <thread>
 
-#include "morva-sdk/morva-ext.h"
-
 namespace {
 std::atomic<bool> alive = false;
 std::atomic<bool> ending = false;

@@ -10,8 +10,7 @@ import numpy as np
 import pytest
 import soundfile
 
-from conftest import BUILD, SOURCE, speechlike
-from weights import constant_mask
+from conftest import BUILD, SOURCE, constant_mask, speechlike
 
 RATES = [4000, 8000, 11025, 12000, 16000, 22050, 24000, 32000, 37800, 44100, 48000, 64000, 88200, 96000]
 
@@ -143,20 +142,15 @@ def test_control_files(morva, model, recording, tmp_path, option, text):
     assert np.abs(after - (2 if text else 1) * before[:, 0]).max() < 1e-5
 
 
-def test_progress_bar_only_on_a_terminal(morva, model, recording, tmp_path):
+def test_the_engine_is_heard_only_if_wanted_and_a_bar_seen_only_on_a_terminal(morva, model, recording, tmp_path):
     source = recording(np.zeros(16000 * 120), 16000)
     arguments = ("denoise", source, tmp_path / "out.wav", "--model", model(constant_mask()))
-    assert "%" not in morva(*arguments).stderr
+    plain, verbose = morva(*arguments), morva(*arguments, "--verbose")
+    assert not re.search("WEIGHT|%", plain.stderr) and "WEIGHT" in verbose.stderr
+    assert not plain.stdout and not verbose.stdout
     leader, follower = pty.openpty()
     morva(*arguments, capture_output=False, stderr=follower)
     assert re.search(rb"\[#* *\] +\d+%", os.read(leader, 4096))
-
-
-def test_verbose_shows_the_engine_and_plain_does_not(morva, model, recording, tmp_path):
-    arguments = ("denoise", recording(np.zeros(100), 16000), tmp_path / "o.wav", "--model", model(constant_mask()))
-    for verbose in ([], ["--verbose"]):
-        done = morva(*arguments, *verbose)
-        assert ("WEIGHT" in done.stderr) == bool(verbose) and not done.stdout
 
 
 @pytest.mark.parametrize("rate", [8000, 16000, 44100, 96000, 22050, 0])

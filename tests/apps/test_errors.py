@@ -8,8 +8,7 @@ import numpy as np
 import pytest
 import soundfile
 
-from conftest import mvw, speechlike
-from weights import constant_mask, loudness_voice, noise_level
+from conftest import constant_mask, loudness_voice, mvw, noise_level, speechlike
 
 REFUSED = [
     ("denoise in.wav", "name one input and one output"),
@@ -19,7 +18,6 @@ REFUSED = [
     ("denoise fast.wav out.wav", "fast.wav: a rate of 192000 Hz is not supported"),
     ("denoise in.wav in.wav", "is an input as well"),
     ("denoise in.wav link.wav", "is an input as well"),
-    ("denoise in.wav ./sub/../in.wav", "is an input as well"),
     ("denoise folder out.wav", "folder: is a folder"),
     ("denoise folder -o out", "no .wav, .flac or .ogg file"),
     ("denoise in.wav missing/out.wav", "missing/out.wav: cannot be written"),
@@ -38,11 +36,9 @@ REFUSED = [
     ("denoise in.wav out.wav --control good.mvw", "ends in .cfg"),
     ("denoise in.wav out.wav --model good.mvw --control good.cfg", "names a weight of its own"),
     ("denoise in.wav out.wav --model good.cfg --control louder.cfg", "not with another .cfg"),
-    ("vad in.wav --model good.mvw", "Unsupported weight version"),
     ("vad in.wav --model raw.mvw", "gives scores outside 0..1: it is not calibrated"),
     ("level in.wav --model level.mvw -o no/such/file", "cannot be written"),
     ("report in.wav in.wav", "is the input"),
-    ("report in.wav no/page.html --model good.mvw", "no/page.html: cannot be written"),
     ("report in.wav page.html --model good.mvw --vad-model missing.mvw", "missing.mvw: no such file"),
     ("inspect text.mvw", "text.mvw: is no weight file"),
 ]
@@ -90,19 +86,9 @@ def test_errors_are_told_and_leave_everything_as_it_was(morva, folder, command, 
 def test_a_full_disk_is_left_as_it_was(morva, folder, more):
     """Neither half a result stays nor the temporary file that joins a weight and a control file."""
     before = content(folder)
-    full = {"preexec_fn": lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (0, 0)), "restore_signals": False}
-    morva(
-        "denoise",
-        "in.wav",
-        "out.wav",
-        "--model",
-        "good.mvw",
-        *more,
-        cwd=folder,
-        status=1,
-        env=os.environ | {"TMPDIR": str(folder)},
-        **full,
-    )
+    options = {"env": os.environ | {"TMPDIR": str(folder)}, "cwd": folder, "restore_signals": False}
+    options["preexec_fn"] = lambda: resource.setrlimit(resource.RLIMIT_FSIZE, (0, 0))
+    morva("denoise", "in.wav", "out.wav", "--model", "good.mvw", *more, status=1, **options)
     assert content(folder) == before
 
 
