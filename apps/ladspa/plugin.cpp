@@ -26,9 +26,7 @@ void Plugin::CloseSession::operator()(void* session) const {
 }
 
 Plugin::Plugin(std::size_t channels, unsigned long rateHz)
-    : engine_(SharedEngine::acquire()),
-      rateHz_(static_cast<int>(rateHz)),
-      ports_(portCount(channels)) {
+    : rateHz_(static_cast<int>(rateHz)), ports_(portCount(channels)) {
     for (std::size_t c = 0; c < channels; ++c) {
         channels_.push_back({nullptr, FrameFifo(rateHz * kFrameMs / 1000)});
     }

@@ -51,7 +51,7 @@ private:
     void openSessions();
     void followControls();
 
-    std::shared_ptr<SharedEngine> engine_;
+    SharedEngine engine_;  // first, so that it outlives the sessions
     int rateHz_;
     std::vector<Channel> channels_;
     std::vector<LADSPA_Data*> ports_;

@@ -2,7 +2,7 @@
 
 #include <dlfcn.h>
 
-#include <array>
+#include <algorithm>
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
@@ -13,17 +13,15 @@
 #include <vector>
 
 #include "morva-sdk/morva-ext.h"
+#include "shipped_models.h"
 
 namespace morva::ladspa {
 namespace fs = std::filesystem;
 namespace {
 
-struct Shipped {
-    char const* file;
-    int maxRateHz;
-};
-constexpr std::array kModels{Shipped{"NC_small_8k.mvw", 8000}, Shipped{"NC_small_16k.mvw", 16000},
-                             Shipped{"c6.xs.f.ca03f4.mvw", 96000}};
+// Beginning and end of the engine happen under one lock, so that no new engine meets an old one.
+std::mutex changing;
+int users = 0;
 
 // Where this library was loaded from.
 fs::path pluginFolder() {
@@ -64,42 +62,39 @@ void registerModel(char const* name) {
     }
 }
 
-struct DestroyEngine {
-    void operator()(void const*) const { Morva_SDK_GlobalDestroy(); }
-};
-
-}  // namespace
-
-std::shared_ptr<SharedEngine> SharedEngine::acquire() {
-    static std::mutex mutex;
-    static std::weak_ptr<SharedEngine> shared;
-    std::lock_guard const lock(mutex);
-    auto engine = shared.lock();
-    if (!engine) {
-        engine = std::make_shared<SharedEngine>();
-        shared = engine;
-    }
-    return engine;
-}
-
-SharedEngine::SharedEngine() {
+void start() {
     if (Morva_SDK_GlobalInit(nullptr, 1) != 0) {
         throw std::runtime_error(lastError("the engine cannot start"));
     }
-    std::unique_ptr<SharedEngine, DestroyEngine> undo(this);
-    for (auto const& model : kModels) registerModel(model.file);
-    static_cast<void>(undo.release());
+    try {
+        for (auto const& model : shippedModels) {
+            if (model.kind == ShippedKind::NC) registerModel(model.file);
+        }
+    } catch (...) {
+        Morva_SDK_GlobalDestroy();
+        throw;
+    }
+}
+
+}  // namespace
+
+SharedEngine::SharedEngine() {
+    std::lock_guard const lock(changing);
+    if (users == 0) start();
+    ++users;
 }
 
 SharedEngine::~SharedEngine() {
-    Morva_SDK_GlobalDestroy();
+    std::lock_guard const lock(changing);
+    if (--users == 0) Morva_SDK_GlobalDestroy();
 }
 
 char const* SharedEngine::modelFor(int rateHz) {
-    for (auto const& model : kModels) {
-        if (rateHz <= model.maxRateHz) return model.file;
-    }
-    return kModels.back().file;
+    auto const* const model = std::ranges::find_if(shippedModels, [&](auto const& shipped) {
+        return shipped.kind == ShippedKind::NC && rateHz <= shipped.maxRateHz;
+    });
+    // What no model serves is refused by the engine with its own reason.
+    return model != shippedModels.end() ? model->file : shippedModels.front().file;
 }
 
 }  // namespace morva::ladspa

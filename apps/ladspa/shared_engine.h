@@ -1,17 +1,14 @@
-// The one engine of this plugin library, shared by its instances: created with the first, destroyed
-// with the last. Threads: instances may come and go on any thread; nothing here is for the audio
+// The one engine of this plugin library, shared by its instances: begins with the first user, ends
+// with the last. Threads: users may come and go on any thread; nothing here is for the audio
 // thread.
 #pragma once
 
-#include <memory>
-
 namespace morva::ladspa {
 
+// A share in the engine.
 class SharedEngine {
 public:
     // Throws std::runtime_error when the engine cannot start or no models are found.
-    static std::shared_ptr<SharedEngine> acquire();
-
     SharedEngine();
     ~SharedEngine();
     SharedEngine(SharedEngine const&) = delete;

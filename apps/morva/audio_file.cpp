@@ -9,7 +9,9 @@
 #include <initializer_list>
 #include <string>
 #include <system_error>
+#include <vector>
 
+#include "descriptor.h"
 #include "error.h"
 
 namespace morva::cli {
@@ -81,6 +83,17 @@ int toInteger(float sample, int bits) {
     return static_cast<int>(whole * (std::int64_t{1} << (32 - bits)));
 }
 
+// False when not all were taken.
+bool writeSamples(SNDFILE* file, int format, std::span<float const> samples) {
+    auto const count = static_cast<sf_count_t>(samples.size());
+    int const bits = integerBits(format);
+    if (bits == 0) return sf_write_float(file, samples.data(), count) == count;
+    std::vector<int> integers(samples.size());
+    std::ranges::transform(samples, integers.begin(),
+                           [bits](float sample) { return toInteger(sample, bits); });
+    return sf_write_int(file, integers.data(), count) == count;
+}
+
 void copyTags(SNDFILE* from, SNDFILE* to) {
     for (int const tag :
          {SF_STR_TITLE, SF_STR_COPYRIGHT, SF_STR_ARTIST, SF_STR_COMMENT, SF_STR_DATE, SF_STR_ALBUM,
@@ -140,21 +153,22 @@ int outputFormat(fs::path const& path, int sourceFormat, int channels, int rateH
 }
 
 SoundWriter::SoundWriter(fs::path const& path, SoundReader const& source, int format)
-    : path_(path), part_(path), file_(nullptr, &sf_close) {
+    : path_(path),
+      part_(path.string() + ".part-" + std::to_string(::getpid())),
+      file_(nullptr, &sf_close) {
     std::error_code error;
     auto const status = fs::status(path, error);
     if (fs::is_directory(status)) throw Error(path.string() + ": is a folder");
     if (fs::exists(status) && !fs::is_regular_file(status)) {
         throw Error(path.string() + ": cannot be written: not a regular file");
     }
-    part_ += ".part-" + std::to_string(::getpid());
     info_.channels = source.channels();
     info_.samplerate = source.rateHz();
     info_.format = format;
     if ((format & SF_FORMAT_TYPEMASK) == SF_FORMAT_WAV) {
         info_.format = (format & ~SF_FORMAT_TYPEMASK) | wavFor(source.frames(), info_.channels);
     }
-    file_.reset(sf_open(part_.c_str(), SFM_WRITE, &info_));
+    file_.reset(sf_open(part_.path().c_str(), SFM_WRITE, &info_));
     if (!file_) throw Error(path.string() + ": cannot be written: " + sf_strerror(nullptr));
     sf_command(file_.get(), SFC_SET_CLIPPING, nullptr, SF_TRUE);
     double quality = 0.7;
@@ -162,35 +176,32 @@ SoundWriter::SoundWriter(fs::path const& path, SoundReader const& source, int fo
     copyTags(source.file_.get(), file_.get());
 }
 
-SoundWriter::~SoundWriter() {
-    if (!file_) return;
-    file_.reset();
-    std::error_code ignored;
-    fs::remove(part_, ignored);
-}
-
 void SoundWriter::write(std::span<float const> interleaved) {
-    auto const frames = static_cast<sf_count_t>(interleaved.size()) / info_.channels;
-    int const bits = integerBits(info_.format);
-    integers_.resize(bits > 0 ? interleaved.size() : 0);
-    std::ranges::transform(interleaved.first(integers_.size()), integers_.begin(),
-                           [bits](float sample) { return toInteger(sample, bits); });
-    auto const written = bits > 0 ? sf_writef_int(file_.get(), integers_.data(), frames)
-                                  : sf_writef_float(file_.get(), interleaved.data(), frames);
-    if (written != frames) {
+    if (!writeSamples(file_.get(), info_.format, interleaved)) {
         throw Error(path_.string() + ": cannot be written: " + sf_strerror(file_.get()));
     }
 }
 
 void SoundWriter::finish() {
-    bool const closed = sf_close(file_.release()) == 0;
-    std::error_code error;
-    if (closed) fs::rename(part_, path_, error);
-    if (closed && !error) return;
-    std::error_code ignored;
-    fs::remove(part_, ignored);
-    throw Error(path_.string() + ": cannot be written" +
-                (error ? ": " + error.message() : std::string()));
+    if (sf_close(file_.release()) != 0) throw Error(path_.string() + ": cannot be written");
+    try {
+        part_.become(path_);
+    } catch (fs::filesystem_error const& error) {
+        throw Error(path_.string() + ": cannot be written: " + error.code().message());
+    }
+}
+
+std::string wavFile(std::span<float const> samples, int rateHz) {
+    SF_INFO info{};
+    info.channels = 1;
+    info.samplerate = rateHz;
+    info.format = SF_FORMAT_WAV | SF_FORMAT_PCM_16;
+    Descriptor const memory = memoryFile();
+    SoundHandle file(sf_open_fd(memory.get(), SFM_WRITE, &info, SF_FALSE), &sf_close);
+    if (!file || !writeSamples(file.get(), info.format, samples) || sf_close(file.release()) != 0) {
+        throw Error(std::string("a sound cannot be held in memory: ") + sf_strerror(file.get()));
+    }
+    return contentFrom(memory, 0);
 }
 
 }  // namespace morva::cli

@@ -10,7 +10,9 @@
 #include <filesystem>
 #include <memory>
 #include <span>
-#include <vector>
+#include <string>
+
+#include "vanishing_file.h"
 
 namespace morva::cli {
 
@@ -52,19 +54,18 @@ class SoundWriter {
 public:
     // Rate, channels and text tags are those of `source`.
     SoundWriter(std::filesystem::path const& path, SoundReader const& source, int format);
-    ~SoundWriter();
-    SoundWriter(SoundWriter const&) = delete;
-    SoundWriter& operator=(SoundWriter const&) = delete;
 
     void write(std::span<float const> interleaved);
     void finish();
 
 private:
     std::filesystem::path path_;
-    std::filesystem::path part_;
+    VanishingFile part_;
     SF_INFO info_{};
     SoundHandle file_;
-    std::vector<int> integers_;
 };
+
+// A mono WAV file with 16-bit samples, held in memory. Throws Error.
+std::string wavFile(std::span<float const> samples, int rateHz);
 
 }  // namespace morva::cli

@@ -2,14 +2,12 @@
 
 #include <algorithm>
 
-#include "rates.h"
-
 namespace morva::cli {
 ChannelCleaner::ChannelCleaner(Engine& engine, int fileRateHz, SessionSetup const& setup)
     : session_(engine, setup),
       toEngine_(fileRateHz, setup.rateHz),
       fromEngine_(setup.rateHz, fileRateHz),
-      frameSize_(static_cast<std::size_t>(frameSize(setup.rateHz, setup.frameMs))),
+      frameSize_(setup.frameSize()),
       toSkip_(session_.latencySamples()),
       frame_(frameSize_) {}
 

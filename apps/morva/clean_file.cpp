@@ -5,7 +5,6 @@
 
 #include "audio_file.h"
 #include "channel_cleaner.h"
-#include "rates.h"
 
 namespace morva::cli {
 namespace {
@@ -48,14 +47,15 @@ std::vector<ChannelCleaner> openChannels(Engine& engine, SoundReader const& read
 
 }  // namespace
 
-CleanedFile cleanFile(Engine& engine, Models& models, Job const& job, int frameMs,
+CleanedFile cleanFile(Workbench& bench, Job const& job,
                       std::function<void(std::int64_t)> const& advance) {
     SoundReader reader(job.input);
-    int const engineRateHz = requireEngineRate(job.input.string(), reader.rateHz());
+    auto const setup =
+        bench.setup(ShippedKind::NC, bench.model, job.input.string(), reader.rateHz());
     int const format =
         outputFormat(job.output, reader.format(), reader.channels(), reader.rateHz());
-    CleanedFile result{0, reader.channels(), reader.rateHz(), models.cleaning(reader.rateHz())};
-    auto channels = openChannels(engine, reader, {engineRateHz, frameMs, result.model});
+    CleanedFile result{0, reader.channels(), reader.rateHz(), setup.model};
+    auto channels = openChannels(bench.engine, reader, setup);
     SoundWriter writer(job.output, reader, format);
 
     Interleaver ready(channels.size());

@@ -6,7 +6,7 @@
 #include <string>
 
 #include "jobs.h"
-#include "models.h"
+#include "workbench.h"
 
 namespace morva::cli {
 
@@ -19,7 +19,7 @@ struct CleanedFile {
 
 // `advance` is told of the input frames done since its last call. Throws Error; then no output
 // exists.
-CleanedFile cleanFile(Engine& engine, Models& models, Job const& job, int frameMs,
+CleanedFile cleanFile(Workbench& bench, Job const& job,
                       std::function<void(std::int64_t)> const& advance);
 
 }  // namespace morva::cli

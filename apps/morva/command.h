@@ -5,21 +5,25 @@
 #include <functional>
 #include <memory>
 
-#include "models.h"
-#include "streams.h"
+#include "workbench.h"
 
 namespace morva::cli {
-
-struct EngineOptions {
-    ModelChoice models;
-    int frameMs = 10;
-    bool verbose = false;
-};
 
 // Set by the subcommand that was named; returns the exit status and may throw Error.
 using Action = std::function<int()>;
 
-// --model, --models, --control, --frame, --verbose.
+// Options of `command`, with which `run` is called when it was named.
+template <class Options>
+Options& addOptions(CLI::App& command, Action& action, int (*run)(Options const&)) {
+    auto const options = std::make_shared<Options>();
+    command.callback(
+        [options, &action, run] { action = [options, run] { return run(*options); }; });
+    return *options;
+}
+
+// --frame and --verbose.
+void addFrameOptions(CLI::App& command, int& frameMs, bool& verbose);
+// These, --model, --models and --control.
 void addEngineOptions(CLI::App& command, EngineOptions& options);
 
 void addDenoise(CLI::App& app, Action& action);

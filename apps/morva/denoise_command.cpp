@@ -2,7 +2,6 @@
 #include <algorithm>
 #include <atomic>
 #include <chrono>
-#include <cstdio>
 #include <string>
 #include <thread>
 #include <vector>
@@ -11,6 +10,7 @@
 #include "clean_file.h"
 #include "command.h"
 #include "error.h"
+#include "formatted.h"
 #include "jobs.h"
 #include "progress.h"
 
@@ -35,11 +35,10 @@ std::int64_t framesOf(Job const& job) {
 
 std::string summary(Job const& job, CleanedFile const& file, double seconds) {
     double const length = static_cast<double>(file.frames) / file.rateHz;
-    char numbers[160];
-    std::snprintf(numbers, sizeof numbers, " (%.1f s, %d Hz, %d channel%s, %s, %.0f x real time)",
-                  length, file.rateHz, file.channels, file.channels == 1 ? "" : "s",
-                  file.model.c_str(), length / std::max(seconds, 1e-3));
-    return job.input.string() + " -> " + job.output.string() + numbers;
+    return job.input.string() + " -> " + job.output.string() +
+           formatted(" (%.1f s, %d Hz, %d channel%s, %s, %.0f x real time)", length, file.rateHz,
+                     file.channels, file.channels == 1 ? "" : "s", file.model.c_str(),
+                     length / std::max(seconds, 1e-3));
 }
 
 // Runs `work(i)` for i in 0..count-1 on `threads` threads, each taking the next free index.
@@ -59,20 +58,18 @@ int run(DenoiseOptions const& options) {
     bool const batch = jobs.size() > 1;
     if (options.output && (batch || !options.output->has_filename())) makeFolders(jobs);
 
-    Streams streams(options.engine.verbose);
-    Engine engine(streams, controlFolder(options.engine.models));
-    Models models(engine, options.engine.models);
+    Workbench bench(options.engine);
     std::int64_t total = 0;
     for (auto const& job : jobs) total += framesOf(job);
-    Progress progress(streams, total, !options.quiet);
+    Progress progress(bench.streams, total, !options.quiet);
 
     std::atomic<std::size_t> failures = 0;
     auto const cleanOne = [&](std::size_t index) {
         auto const& job = jobs[index];
         try {
             auto const start = std::chrono::steady_clock::now();
-            auto const file = cleanFile(engine, models, job, options.engine.frameMs,
-                                        [&](std::int64_t frames) { progress.advance(frames); });
+            auto const file =
+                cleanFile(bench, job, [&](std::int64_t frames) { progress.advance(frames); });
             std::chrono::duration<double> const taken = std::chrono::steady_clock::now() - start;
             if (!options.quiet) progress.say(summary(job, file, taken.count()));
         } catch (std::exception const& error) {
@@ -92,18 +89,16 @@ int run(DenoiseOptions const& options) {
 }  // namespace
 
 void addDenoise(CLI::App& app, Action& action) {
-    auto const options = std::make_shared<DenoiseOptions>();
-    auto* command = app.add_subcommand("denoise", "Remove background noise from sound files");
+    auto& command = *app.add_subcommand("denoise", "Remove background noise from sound files");
+    auto& options = addOptions(command, action, &run);
     command
-        ->add_option("files", options->inputs, "Input files or folders; without -o: input, output")
+        .add_option("files", options.inputs, "Input files or folders; without -o: input, output")
         ->required();
-    command->add_option("-o,--output", options->output,
-                        "Output file, or folder for several inputs");
-    command->add_option("-j,--jobs", options->jobs,
-                        "Files cleaned at a time (default: one per core)");
-    command->add_flag("-q,--quiet", options->quiet, "Print nothing but errors");
-    addEngineOptions(*command, options->engine);
-    command->callback([options, &action] { action = [options] { return run(*options); }; });
+    command.add_option("-o,--output", options.output, "Output file, or folder for several inputs");
+    command.add_option("-j,--jobs", options.jobs,
+                       "Files cleaned at a time (default: one per core)");
+    command.add_flag("-q,--quiet", options.quiet, "Print nothing but errors");
+    addEngineOptions(command, options.engine);
 }
 
 }  // namespace morva::cli

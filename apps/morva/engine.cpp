@@ -1,11 +1,8 @@
 #include "engine.h"
 
-#include <algorithm>
-#include <cmath>
-
 #include "error.h"
 #include "morva-ext.h"
-#include "morva-sdk.h"
+#include "morva-sdk/vocabulary.h"
 
 namespace morva::cli {
 namespace {
@@ -30,26 +27,25 @@ unsigned int count(std::span<float const> frame) {
     return static_cast<unsigned int>(frame.size());
 }
 
-// Scores and levels go through the integer calls: the float calls answer only results within 0..1
-// and print about every other one.
-void toIntegers(std::span<float const> frame, std::vector<std::int16_t>& samples) {
-    samples.resize(frame.size());
-    std::ranges::transform(frame, samples.begin(), [](float x) {
-        float const scaled = std::isnan(x) ? 0.0F : std::clamp(x * 32768.0F, -32768.0F, 32767.0F);
-        return static_cast<std::int16_t>(std::lrint(scaled));
-    });
+void mustSucceed(int code) {
+    if (code != 0) throw Error("the engine refused a frame");
 }
 
 }  // namespace
+
+std::size_t SessionSetup::frameSize() const {
+    return MORVA::MORVA_SDK::getSampleCount(static_cast<MorvaFrameDuration>(frameMs),
+                                            static_cast<MorvaSamplingRate>(rateHz));
+}
 
 std::wstring wide(std::filesystem::path const& path) {
     auto const points = path.u32string();
     return {points.begin(), points.end()};
 }
 
-Engine::Engine(Streams& streams, std::filesystem::path const& folder) : streams_(streams) {
+Engine::Engine(Streams& streams) : streams_(streams) {
     EngineTalk const talk(streams_);
-    if (Morva_SDK_GlobalInit(wide(folder).c_str(), 1) != 0) {
+    if (Morva_SDK_GlobalInit(nullptr, 1) != 0) {
         throw Error(withReason("the engine cannot start", talk));
     }
 }
@@ -61,7 +57,7 @@ Engine::~Engine() {
 void Engine::addModel(std::filesystem::path const& file, std::string const& name) {
     EngineTalk const talk(streams_);
     if (Morva_SDK_SetModel(wide(file).c_str(), name.c_str()) != 0) {
-        throw Error(withReason(file.string() + ": not a usable model", talk));
+        throw Error(withReason(name + ": not a usable model", talk));
     }
 }
 
@@ -75,19 +71,16 @@ CleaningSession::CleaningSession(Engine& engine, SessionSetup const& setup)
 }
 
 void CleaningSession::clean(std::span<float const> in, std::span<float> out) {
-    if (Morva_NC_CleanAmbientNoiseFloat(session_.get(), in.data(), count(in), out.data(),
-                                        count(out)) != 0) {
-        throw Error("the engine refused a frame");
-    }
+    mustSucceed(Morva_NC_CleanAmbientNoiseFloat(session_.get(), in.data(), count(in), out.data(),
+                                                count(out)));
 }
 
 VoiceSession::VoiceSession(Engine& engine, SessionSetup const& setup)
     : session_(open(engine, setup, &Morva_VAD_CloseSession, &Morva_VAD_CreateSession)) {}
 
 float VoiceSession::score(std::span<float const> frame) {
-    toIntegers(frame, samples_);
-    float const score = Morva_VAD_FrameInt16(session_.get(), samples_.data(), count(frame));
-    if (!(score >= 0.0F && score <= 1.0F)) {
+    float const score = Morva_VAD_FrameFloat(session_.get(), frame.data(), count(frame));
+    if (score < 0.0F) {
         throw Error("the voice-activity model gives scores outside 0..1: it is not calibrated");
     }
     return score;
@@ -97,8 +90,9 @@ LevelSession::LevelSession(Engine& engine, SessionSetup const& setup)
     : session_(open(engine, setup, &Morva_NoiseDB_CloseSession, &Morva_NoiseDB_CreateSession)) {}
 
 float LevelSession::level(std::span<float const> frame) {
-    toIntegers(frame, samples_);
-    return Morva_NoiseDB_FrameInt16(session_.get(), samples_.data(), count(frame));
+    float level = 0.0F;
+    mustSucceed(MorvaExt_NoiseDB_FrameFloat(session_.get(), frame.data(), count(frame), &level));
+    return level;
 }
 
 }  // namespace morva::cli

@@ -6,12 +6,11 @@
 // The Engine outlives its sessions.
 #pragma once
 
-#include <cstdint>
+#include <cstddef>
 #include <filesystem>
 #include <memory>
 #include <span>
 #include <string>
-#include <vector>
 
 #include "streams.h"
 
@@ -22,18 +21,20 @@ struct SessionSetup {
     int rateHz = 0;
     int frameMs = 10;
     std::string model;  // name under which it was registered
+
+    std::size_t frameSize() const;  // samples
 };
 
 class Engine {
 public:
-    // Relative weight paths inside control files are resolved against `folder`. Throws Error when
-    // the processor lacks what the engine needs.
-    Engine(Streams& streams, std::filesystem::path const& folder);
+    // Throws Error when the processor lacks what the engine needs.
+    explicit Engine(Streams& streams);
     ~Engine();
     Engine(Engine const&) = delete;
     Engine& operator=(Engine const&) = delete;
 
-    // Registers a weight or control file under `name`; throws Error with the engine's reason.
+    // Registers a weight or control file, given by its absolute path, under a name that no model
+    // has yet; throws Error with the engine's reason.
     void addModel(std::filesystem::path const& file, std::string const& name);
     Streams& streams() { return streams_; }
 
@@ -69,7 +70,6 @@ public:
 
 private:
     SessionHandle session_;
-    std::vector<std::int16_t> samples_;
 };
 
 class LevelSession {
@@ -80,7 +80,6 @@ public:
 
 private:
     SessionHandle session_;
-    std::vector<std::int16_t> samples_;
 };
 
 }  // namespace morva::cli

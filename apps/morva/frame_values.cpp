@@ -1,27 +1,65 @@
 #include "frame_values.h"
 
-#include "rates.h"
+#include <algorithm>
+#include <numeric>
+#include <span>
+
+#include "audio_file.h"
+#include "rate_converter.h"
 
 namespace morva::cli {
+namespace {
 
-std::vector<float> voiceScores(Engine& engine, Models& models, std::string const& name,
-                               MonoSound const& sound, int frameMs) {
-    int const rateHz = requireEngineRate(name, sound.rateHz);
-    VoiceSession session(engine, {rateHz, frameMs, models.voice()});
-    std::vector<float> scores;
-    forEachFrame(sound, rateHz, frameMs,
-                 [&](std::span<float const> frame) { scores.push_back(session.score(frame)); });
-    return scores;
+constexpr std::size_t framesPerRead = 4096;
+
+template <class ValueOf>
+std::vector<float> forEachFrame(MonoSound const& sound, SessionSetup const& setup,
+                                ValueOf valueOf) {
+    auto const size = setup.frameSize();
+    RateConverter converter(sound.rateHz, setup.rateHz);
+    std::vector<float> samples;
+    converter.push(sound.samples, samples);
+    converter.finish(samples);
+    samples.resize((samples.size() + size - 1) / size * size);
+    std::vector<float> values;
+    for (std::size_t at = 0; at < samples.size(); at += size)
+        values.push_back(valueOf(std::span(samples).subspan(at, size)));
+    return values;
 }
 
-std::vector<float> noiseLevels(Engine& engine, Models& models, std::string const& name,
-                               MonoSound const& sound, int frameMs) {
-    int const rateHz = requireEngineRate(name, sound.rateHz);
-    LevelSession session(engine, {rateHz, frameMs, models.level()});
-    std::vector<float> levels;
-    forEachFrame(sound, rateHz, frameMs,
-                 [&](std::span<float const> frame) { levels.push_back(session.level(frame)); });
-    return levels;
+}  // namespace
+
+MonoSound readMono(std::filesystem::path const& file, double maxSeconds) {
+    SoundReader reader(file);
+    auto const channels = static_cast<std::size_t>(reader.channels());
+    auto const limit = maxSeconds > 0.0 ? static_cast<std::size_t>(maxSeconds * reader.rateHz())
+                                        : static_cast<std::size_t>(-1);
+    MonoSound sound{file.string(), reader.rateHz(), {}};
+    std::vector<float> block(framesPerRead * channels);
+    while (sound.samples.size() < limit) {
+        auto const frames = reader.read(block);
+        if (frames == 0) break;
+        for (std::size_t i = 0; i < frames; ++i) {
+            auto const frame = std::span(block).subspan(i * channels, channels);
+            sound.samples.push_back(std::accumulate(frame.begin(), frame.end(), 0.0F) /
+                                    static_cast<float>(channels));
+        }
+    }
+    sound.samples.resize(std::min(sound.samples.size(), limit));
+    return sound;
+}
+
+std::vector<float> voiceScores(Workbench& bench, ModelFiles const& model, MonoSound const& sound) {
+    auto const setup = bench.setup(ShippedKind::VAD, model, sound.name, sound.rateHz);
+    VoiceSession session(bench.engine, setup);
+    EngineTalk const talk(bench.streams);  // a score that it refuses is printed
+    return forEachFrame(sound, setup, [&](auto frame) { return session.score(frame); });
+}
+
+std::vector<float> noiseLevels(Workbench& bench, ModelFiles const& model, MonoSound const& sound) {
+    auto const setup = bench.setup(ShippedKind::NoiseDB, model, sound.name, sound.rateHz);
+    LevelSession session(bench.engine, setup);
+    return forEachFrame(sound, setup, [&](auto frame) { return session.level(frame); });
 }
 
 }  // namespace morva::cli

@@ -1,20 +1,28 @@
 // Voice scores and noise levels of a whole sound, one value per frame.
 #pragma once
 
+#include <filesystem>
 #include <string>
 #include <vector>
 
-#include "models.h"
-#include "mono_frames.h"
+#include "workbench.h"
 
 namespace morva::cli {
 
-// `name` is what the user calls the sound, for error texts. Both throw Error.
-std::vector<float> voiceScores(Engine& engine, Models& models, std::string const& name,
-                               MonoSound const& sound, int frameMs);
+struct MonoSound {
+    std::string name;            // what the user calls it
+    int rateHz = 0;              // of the file
+    std::vector<float> samples;  // channels averaged
+};
+
+// Reads at most `maxSeconds`; 0 reads all. Throws Error.
+MonoSound readMono(std::filesystem::path const& file, double maxSeconds = 0.0);
+
+// The sound is brought to a rate that the engine takes and its last frame filled up with silence.
+// Both throw Error.
+std::vector<float> voiceScores(Workbench& bench, ModelFiles const& model, MonoSound const& sound);
 // Decibels re one squared unit of the 16-bit sample scale.
-std::vector<float> noiseLevels(Engine& engine, Models& models, std::string const& name,
-                               MonoSound const& sound, int frameMs);
+std::vector<float> noiseLevels(Workbench& bench, ModelFiles const& model, MonoSound const& sound);
 
 // Level in decibels re a full-scale square wave of a level re one squared unit of the 16-bit scale.
 inline constexpr double fullScaleDb = 90.30899869919435;  // 20 log10(32768)

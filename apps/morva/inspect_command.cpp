@@ -1,6 +1,5 @@
 // morva inspect: what a weight file holds, what the model is, what it costs and how late its sound
 // is.
-#include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
 
@@ -144,20 +143,16 @@ std::string asText(InspectOptions const& options, WeightFacts const& facts, Tria
 
 int run(InspectOptions const& options) {
     Streams streams(options.verbose);
-    Engine engine(streams, std::filesystem::current_path());
+    Engine engine(streams);
     if (!std::filesystem::is_regular_file(options.file)) {
         throw Error(options.file.string() + ": no such file");
     }
     auto const facts = readWeightFacts(options.file);
     auto const trial = tryOut(engine, options.file, facts, options.frameMs);
-    TextOutput const output{options.output, {}};
-    using nlohmann::json;
-    output.write(
-        streams,
-        options.json
-            ? asJson(options, facts, trial).dump(1, ' ', false, json::error_handler_t::replace) +
-                  '\n'
-            : asText(options, facts, trial));
+    TextOutput const output{options.output, options.json ? "json" : "text"};
+    output.write(streams, {[&] { return asText(options, facts, trial); },
+                           {},
+                           [&] { return asJson(options, facts, trial); }});
     if (!trial.runs) streams.err("morva: " + trial.reason + '\n');
     return trial.runs ? 0 : 1;
 }
@@ -165,18 +160,12 @@ int run(InspectOptions const& options) {
 }  // namespace
 
 void addInspect(CLI::App& app, Action& action) {
-    auto const options = std::make_shared<InspectOptions>();
-    auto* command = app.add_subcommand("inspect", "Describe a weight file (.mvw)");
-    command->add_option("file", options->file, "Weight file")->required();
-    command->add_option("-o,--output", options->output, "File to write instead of standard output");
-    command
-        ->add_option("--frame", options->frameMs,
-                     "Frame length in milliseconds of the latency and cost")
-        ->check(CLI::IsMember({10, 20, 30, 40}))
-        ->capture_default_str();
-    command->add_flag("--json", options->json, "As JSON");
-    command->add_flag("--verbose", options->verbose, "Show what the engine prints");
-    command->callback([options, &action] { action = [options] { return run(*options); }; });
+    auto& command = *app.add_subcommand("inspect", "Describe a weight file (.mvw)");
+    auto& options = addOptions(command, action, &run);
+    command.add_option("file", options.file, "Weight file")->required();
+    command.add_option("-o,--output", options.output, "File to write instead of standard output");
+    command.add_flag("--json", options.json, "As JSON");
+    addFrameOptions(command, options.frameMs, options.verbose);
 }
 
 }  // namespace morva::cli

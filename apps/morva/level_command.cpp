@@ -1,6 +1,5 @@
 // morva level: the level of the background noise in a file, one value per frame.
 #include <algorithm>
-#include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
 
@@ -40,37 +39,30 @@ std::string asCsv(std::vector<float> const& levels, double frameMs) {
 }
 
 int run(LevelOptions const& options) {
-    Streams streams(options.engine.verbose);
-    Engine engine(streams, controlFolder(options.engine.models));
-    Models models(engine, options.engine.models);
+    Workbench bench(options.engine);
     auto const sound = readMono(options.file);
-    auto const levels =
-        noiseLevels(engine, models, options.file.string(), sound, options.engine.frameMs);
-    auto const format = options.output.chosenFormat();
-    double const frameMs = options.engine.frameMs;
-    if (format == "json") {
-        nlohmann::ordered_json const page{{"file", options.file.string()},
-                                          {"sample_rate", sound.rateHz},
-                                          {"frame_ms", frameMs},
-                                          {"full_scale_db", fullScaleDb},
-                                          {"levels_db", levels}};
-        options.output.write(streams, page.dump(1) + '\n');
-    } else {
-        options.output.write(streams,
-                             format == "csv" ? asCsv(levels, frameMs) : asText(levels, frameMs));
-    }
+    auto const levels = noiseLevels(bench, bench.model, sound);
+    double const frameMs = bench.frameMs;
+    auto const asJson = [&] {
+        return nlohmann::ordered_json{{"file", sound.name},
+                                      {"sample_rate", sound.rateHz},
+                                      {"frame_ms", frameMs},
+                                      {"full_scale_db", fullScaleDb},
+                                      {"levels_db", levels}};
+    };
+    options.output.write(bench.streams, {[&] { return asText(levels, frameMs); },
+                                         [&] { return asCsv(levels, frameMs); }, asJson});
     return 0;
 }
 
 }  // namespace
 
 void addLevel(CLI::App& app, Action& action) {
-    auto const options = std::make_shared<LevelOptions>();
-    auto* command = app.add_subcommand("level", "Measure the background noise level per frame");
-    command->add_option("file", options->file, "Sound file; channels are averaged")->required();
-    addTextOutput(*command, options->output);
-    addEngineOptions(*command, options->engine);
-    command->callback([options, &action] { action = [options] { return run(*options); }; });
+    auto& command = *app.add_subcommand("level", "Measure the background noise level per frame");
+    auto& options = addOptions(command, action, &run);
+    command.add_option("file", options.file, "Sound file; channels are averaged")->required();
+    addTextOutput(command, options.output);
+    addEngineOptions(command, options.engine);
 }
 
 }  // namespace morva::cli

@@ -4,23 +4,27 @@
 #include <exception>
 
 #include "command.h"
+#include "morva-sdk/vocabulary.h"
 
 namespace morva::cli {
 
+void addFrameOptions(CLI::App& command, int& frameMs, bool& verbose) {
+    command.add_option("--frame", frameMs, "Length of the engine's frames in milliseconds")
+        ->check(CLI::IsMember(MORVA::MORVA_SDK::kFrameDurationsMs))
+        ->capture_default_str();
+    command.add_flag("--verbose", verbose, "Show what the engine prints");
+}
+
 void addEngineOptions(CLI::App& command, EngineOptions& options) {
     command
-        .add_option("--model", options.models.model, "Weight (.mvw) or control file (.cfg) to use")
+        .add_option("--model", options.model.model, "Weight (.mvw) or control file (.cfg) to use")
         ->type_name("FILE");
-    command.add_option("--models", options.models.folder, "Folder of the shipped models")
+    command.add_option("--models", options.models, "Folder of the shipped models")
         ->type_name("DIR");
     command
-        .add_option("--control", options.models.control,
-                    "Control file (.cfg) with model parameters")
+        .add_option("--control", options.model.control, "Control file (.cfg) with model parameters")
         ->type_name("FILE");
-    command.add_option("--frame", options.frameMs, "Frame length in milliseconds")
-        ->check(CLI::IsMember({10, 20, 30, 40}))
-        ->capture_default_str();
-    command.add_flag("--verbose", options.verbose, "Show what the engine prints");
+    addFrameOptions(command, options.frameMs, options.verbose);
 }
 
 namespace {

@@ -2,72 +2,21 @@
 
 #include <unistd.h>
 
-#include <array>
+#include <algorithm>
 #include <cerrno>
-#include <cstdlib>
-#include <fstream>
-#include <iterator>
-#include <sstream>
 #include <system_error>
 #include <utility>
+#include <vector>
 
 #include "error.h"
+#include "vanishing_file.h"
+#include "weights/control_file.h"
 
 namespace morva::cli {
 namespace fs = std::filesystem;
 namespace {
 
-struct Shipped {
-    char const* file;
-    int maxRateHz;
-};
-constexpr std::array shippedByRate{Shipped{"NC_small_8k.mvw", 8000},
-                                   Shipped{"NC_small_16k.mvw", 16000},
-                                   Shipped{"c6.xs.f.ca03f4.mvw", 96000}};
-
-// A file that vanishes with its holder.
-class TemporaryFile {
-public:
-    TemporaryFile(std::string const& ending, std::string const& content) {
-        auto name = (fs::temp_directory_path() / ("morva-XXXXXX" + ending)).string();
-        int const number = ::mkstemps(name.data(), static_cast<int>(ending.size()));
-        if (number < 0)
-            throw Error("cannot write a temporary file: " + std::generic_category().message(errno));
-        Descriptor const descriptor(number);
-        path_ = name;
-        std::ofstream stream(path_, std::ios::binary);
-        stream << content << std::flush;
-        if (!stream) throw Error("cannot write " + name);
-    }
-    ~TemporaryFile() {
-        std::error_code ignored;
-        fs::remove(path_, ignored);
-    }
-    TemporaryFile(TemporaryFile const&) = delete;
-    TemporaryFile& operator=(TemporaryFile const&) = delete;
-    fs::path const& path() const { return path_; }
-
-private:
-    fs::path path_;
-};
-
-std::string textOf(fs::path const& file) {
-    std::ifstream stream(file, std::ios::binary);
-    std::string text{std::istreambuf_iterator<char>(stream), {}};
-    if (!stream.eof() && !stream) throw Error("cannot read " + file.string());
-    return text;
-}
-
-bool namesWeight(std::string const& controlText) {
-    std::istringstream lines(controlText);
-    std::string line;
-    while (std::getline(lines, line)) {
-        std::istringstream words(line);
-        std::string key;
-        if (words >> key && key == "WEIGHT") return true;
-    }
-    return false;
-}
+using Entries = std::vector<std::pair<std::string, std::string>>;
 
 void mustBeFile(fs::path const& file) {
     std::error_code error;
@@ -78,8 +27,19 @@ void mustBeFile(fs::path const& file) {
         throw Error(file.string() + ": " + std::generic_category().message(errno));
 }
 
-bool isControl(fs::path const& file) {
-    return file.extension() == ".cfg";
+Entries entriesOf(fs::path const& control) {
+    Entries entries;
+    if (!MORVA::UTILS::readControlFile(entries, MORVA::UTILS::Path(wide(control).c_str())))
+        throw Error(control.string() + ": a line is not made of a key and a value");
+    return entries;
+}
+
+// Beside the control file, wherever one stands; empty: it names none.
+fs::path weightNamedIn(fs::path const& control) {
+    auto const entries = entriesOf(control);
+    auto const named = std::ranges::find(entries, "WEIGHT", &Entries::value_type::first);
+    return named == entries.end() ? fs::path()
+                                  : (control.parent_path() / named->second).lexically_normal();
 }
 
 fs::path programFolder() {
@@ -90,85 +50,78 @@ fs::path programFolder() {
 
 }  // namespace
 
-std::optional<std::string> shippedCleaningModel(int rateHz) {
-    for (auto const& [file, maxRateHz] : shippedByRate) {
-        if (rateHz <= maxRateHz) return file;
+ModelFiles modelFiles(ModelChoice const& choice) {
+    auto const absolute = [](fs::path const& path) {
+        return path.empty() ? path : fs::absolute(path).lexically_normal();
+    };
+    ModelFiles files{absolute(choice.model), absolute(choice.control)};
+    for (auto const& file : {files.weight, files.control}) {
+        if (!file.empty()) mustBeFile(file);
     }
-    return std::nullopt;
-}
-
-fs::path controlFolder(ModelChoice const& choice) {
-    auto const& file = choice.control.empty() ? choice.model : choice.control;
-    return file.empty() ? fs::current_path() : fs::absolute(file).parent_path();
-}
-
-Models::Models(Engine& engine, ModelChoice choice) : engine_(engine), choice_(std::move(choice)) {
-    if (!choice_.model.empty()) {
-        mustBeFile(choice_.model);
-        if (choice_.model.extension() != ".mvw" && !isControl(choice_.model)) {
-            throw Error(choice_.model.string() + ": a model file ends in .mvw or .cfg");
-        }
+    bool const mustName = files.weight.extension() == ".cfg";
+    if (mustName) {
+        if (!files.control.empty())
+            throw Error("--control goes with a weight file, not with another .cfg");
+        files.control = std::exchange(files.weight, {});
     }
-    if (choice_.control.empty()) return;
-    mustBeFile(choice_.control);
-    if (!isControl(choice_.control))
-        throw Error(choice_.control.string() + ": a control file ends in .cfg");
-    if (isControl(choice_.model))
-        throw Error("--control goes with a weight file, not with another .cfg");
-    if (namesWeight(textOf(choice_.control))) {
-        if (!choice_.model.empty()) {
-            throw Error(choice_.control.string() +
-                        ": names a weight of its own; leave out --model");
-        }
-        choice_.model = std::exchange(choice_.control, {});
+    if (!files.weight.empty() && files.weight.extension() != ".mvw")
+        throw Error(files.weight.string() + ": a model file ends in .mvw or .cfg");
+    if (files.control.empty()) return files;
+    if (files.control.extension() != ".cfg")
+        throw Error(files.control.string() + ": a control file ends in .cfg");
+    auto const own = weightNamedIn(files.control);
+    if (own.empty()) {
+        if (mustName) throw Error(files.control.string() + ": names no weight");
+        return files;
     }
+    if (!files.weight.empty())
+        throw Error(files.control.string() + ": names a weight of its own; leave out --model");
+    mustBeFile(own);
+    files.weight = own;
+    return files;
 }
 
-std::string Models::cleaning(int rateHz) {
-    auto const file = shippedCleaningModel(rateHz);
-    if (!file) throw Error("no model for " + std::to_string(rateHz) + " Hz");
-    return chosenOr(*file);
-}
+Models::Models(Engine& engine, fs::path folder) : engine_(engine), folder_(std::move(folder)) {}
 
-std::string Models::voice() {
-    return chosenOr("VAD_weight.mvw");
-}
-
-std::string Models::level() {
-    return chosenOr("noise_level_16k.mvw");
-}
-
-std::string Models::chosenOr(std::string const& shippedFile) {
-    return registered(choice_.model.empty() ? shipped(shippedFile) : choice_.model);
-}
-
-std::string Models::registered(fs::path const& file) {
+std::string Models::name(ShippedKind kind, ModelFiles chosen, int rateHz) {
+    if (chosen.weight.empty()) chosen.weight = shipped(kind, rateHz);
     std::lock_guard const lock(registering_);
-    auto const path = fs::absolute(file);
-    if (auto const known = names_.find(path); known != names_.end()) return known->second;
-    auto const name = path.filename().string();
-    if (choice_.control.empty()) {
-        engine_.addModel(path, name);
-    } else {
-        TemporaryFile const joined(".cfg",
-                                   "WEIGHT " + path.string() + '\n' + textOf(choice_.control));
-        engine_.addModel(joined.path(), name);
-    }
-    return names_.emplace(path, name).first->second;
+    if (auto const known = names_.find(chosen); known != names_.end()) return known->second;
+    auto const fileName = chosen.weight.filename();
+    auto const namesakes = std::ranges::count_if(
+        names_, [&](auto const& entry) { return entry.first.weight.filename() == fileName; });
+    auto name = fileName.string();
+    if (namesakes > 0) name += " (" + std::to_string(namesakes + 1) + ')';
+    add(chosen, name);
+    return names_.emplace(std::move(chosen), name).first->second;
 }
 
-fs::path Models::shipped(std::string const& file) const {
-    if (!choice_.folder.empty()) {
-        auto path = choice_.folder / file;
+void Models::add(ModelFiles const& files, std::string const& name) {
+    if (files.control.empty()) return engine_.addModel(files.weight, name);
+    auto text = "WEIGHT " + files.weight.string() + '\n';
+    for (auto const& [key, value] : entriesOf(files.control)) {
+        if (key != "WEIGHT") text.append(key).append(" ").append(value).append("\n");
+    }
+    TemporaryFile const joined(".cfg", text);
+    engine_.addModel(joined.path(), name);
+}
+
+fs::path Models::shipped(ShippedKind kind, int rateHz) const {
+    auto const* const model = std::ranges::find_if(shippedModels, [&](ShippedModel const& one) {
+        return one.kind == kind && rateHz <= one.maxRateHz;
+    });
+    if (model == shippedModels.end()) throw Error("no model for " + std::to_string(rateHz) + " Hz");
+    if (!folder_.empty()) {
+        auto path = fs::absolute(folder_ / model->file);
         mustBeFile(path);
         return path;
     }
     auto const program = programFolder();
     for (auto const* place : {"models", "../share/morva/models", "../../models"}) {
-        auto const path = program / place / file;
+        auto const path = program / place / model->file;
         if (fs::exists(path)) return fs::canonical(path);
     }
-    throw Error("the model " + file +
+    throw Error(std::string("the model ") + model->file +
                 " is not installed; name a model with --model or a folder with --models");
 }
 

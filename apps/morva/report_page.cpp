@@ -8,38 +8,12 @@
 #include <span>
 #include <string_view>
 
+#include "audio_file.h"
 #include "formatted.h"
 #include "report_template.h"
 
 namespace morva::cli {
 namespace {
-
-void appendLittleEndian(std::string& bytes, std::uint32_t value, int size) {
-    for (int i = 0; i < size; ++i) bytes += static_cast<char>(value >> (8 * i) & 0xFFU);
-}
-
-// A 16-bit mono WAV file.
-std::string wavBytes(std::span<float const> samples, int rateHz) {
-    auto const dataSize = static_cast<std::uint32_t>(samples.size() * 2);
-    std::string bytes = "RIFF";
-    appendLittleEndian(bytes, 36 + dataSize, 4);
-    bytes += "WAVEfmt ";
-    appendLittleEndian(bytes, 16, 4);
-    appendLittleEndian(bytes, 1, 2);  // integer samples
-    appendLittleEndian(bytes, 1, 2);  // one channel
-    appendLittleEndian(bytes, static_cast<std::uint32_t>(rateHz), 4);
-    appendLittleEndian(bytes, static_cast<std::uint32_t>(rateHz) * 2, 4);
-    appendLittleEndian(bytes, 2, 2);
-    appendLittleEndian(bytes, 16, 2);
-    bytes += "data";
-    appendLittleEndian(bytes, dataSize, 4);
-    for (float const sample : samples) {
-        float const scaled =
-            std::isnan(sample) ? 0.0F : std::clamp(sample * 32768.0F, -32768.0F, 32767.0F);
-        appendLittleEndian(bytes, static_cast<std::uint32_t>(std::lrint(scaled)), 2);
-    }
-    return bytes;
-}
 
 std::string base64(std::string_view bytes) {
     constexpr std::string_view digits =
@@ -59,49 +33,11 @@ std::string base64(std::string_view bytes) {
     return text;
 }
 
-std::string html(std::string_view text) {
-    std::string safe;
-    for (char const c : text) {
-        switch (c) {
-            case '&':
-                safe += "&amp;";
-                break;
-            case '<':
-                safe += "&lt;";
-                break;
-            case '>':
-                safe += "&gt;";
-                break;
-            default:
-                safe += c;
-        }
-    }
-    return safe;
-}
-
 // JSON that cannot end the script element it stands in.
 std::string scriptSafe(nlohmann::ordered_json const& page) {
     auto text = page.dump(-1, ' ', true, nlohmann::json::error_handler_t::replace);
     for (auto at = text.find('<'); at != std::string::npos; at = text.find('<', at)) {
         text.replace(at, 1, "\\u003c");
-    }
-    return text;
-}
-
-// Replaces each {{NAME}} once, in one pass over the template.
-std::string fill(std::string_view page,
-                 std::vector<std::pair<std::string_view, std::string>> const& values) {
-    std::string text;
-    while (!page.empty()) {
-        auto const open = page.find("{{");
-        text += page.substr(0, open);
-        if (open == std::string_view::npos) break;
-        auto const close = page.find("}}", open);
-        auto const name = page.substr(open + 2, close - open - 2);
-        auto const value =
-            std::ranges::find(values, name, &std::pair<std::string_view, std::string>::first);
-        if (value != values.end()) text += value->second;
-        page.remove_prefix(close + 2);
     }
     return text;
 }
@@ -131,10 +67,8 @@ std::vector<std::pair<std::string, std::string>> summary(Report const& report) {
                            formatted("%.1f dB", pauses.beforeDb - pauses.afterDb));
     }
     if (!report.scores.empty()) {
-        double speechMs = 0.0;
-        for (auto const& segment : report.segments) speechMs += segment.endMs - segment.startMs;
         items.emplace_back(
-            "Speech", formatted("%.2f s in %zu segment%s", speechMs / 1000.0,
+            "Speech", formatted("%.2f s in %zu segment%s", totalMs(report.segments) / 1000.0,
                                 report.segments.size(), report.segments.size() == 1 ? "" : "s"));
     }
     if (!report.levelsDb.empty()) {
@@ -196,16 +130,17 @@ std::string renderPage(Report const& report) {
                                 {"release", report.rules.release},
                                 {"segments", nlohmann::json::array()},
                                 {"scores", nullptr},
-                                {"levels", nullptr}};
+                                {"levels", nullptr},
+                                {"before", base64(wavFile(report.before, report.rateHz))},
+                                {"after", base64(wavFile(report.after, report.rateHz))}};
     if (!report.scores.empty()) data["scores"] = report.scores;
     if (!report.levelsDb.empty()) data["levels"] = report.levelsDb;
     for (auto const& segment : report.segments) {
         data["segments"].push_back({segment.startMs / 1000.0, segment.endMs / 1000.0});
     }
-    return fill(reportTemplate, {{"TITLE", html(report.file)},
-                                 {"BEFORE", base64(wavBytes(report.before, report.rateHz))},
-                                 {"AFTER", base64(wavBytes(report.after, report.rateHz))},
-                                 {"DATA", scriptSafe(data)}});
+    std::string page(reportTemplate);
+    constexpr std::string_view place = "{{DATA}}";
+    return page.replace(page.find(place), place.size(), scriptSafe(data));
 }
 
 }  // namespace morva::cli

@@ -1,6 +1,8 @@
 #include "segments.h"
 
 #include <algorithm>
+#include <functional>
+#include <numeric>
 
 namespace morva::cli {
 namespace {
@@ -48,6 +50,11 @@ std::vector<Segment> speechSegments(std::span<float const> scores, double frameM
         segment.endMs += std::min(rules.padMs, last ? gapAfter : gapAfter / 2);
     }
     return segments;
+}
+
+double totalMs(std::span<Segment const> segments) {
+    return std::transform_reduce(segments.begin(), segments.end(), 0.0, std::plus<>(),
+                                 [](Segment const& one) { return one.endMs - one.startMs; });
 }
 
 }  // namespace morva::cli

@@ -26,4 +26,7 @@ struct Segment {
 std::vector<Segment> speechSegments(std::span<float const> scores, double frameMs,
                                     SegmentRules const& rules);
 
+// Length of all together.
+double totalMs(std::span<Segment const> segments);
+
 }  // namespace morva::cli

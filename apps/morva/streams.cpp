@@ -1,14 +1,12 @@
 #include "streams.h"
 
 #include <fcntl.h>
-#include <sys/mman.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdio>
 #include <iostream>
 #include <system_error>
-#include <utility>
 
 #include "error.h"
 
@@ -41,24 +39,11 @@ void flushLibraries() {
 
 }  // namespace
 
-Descriptor& Descriptor::operator=(Descriptor&& other) noexcept {
-    std::swap(number_, other.number_);
-    return *this;
-}
-
-Descriptor::~Descriptor() {
-    if (number_ >= 0) ::close(number_);
-}
-
-int Descriptor::release() {
-    return std::exchange(number_, -1);
-}
-
 Streams::Streams(bool verbose)
     : verbose_(verbose),
       out_(::fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3)),
       err_(::fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 3)),
-      heard_(::memfd_create("engine-talk", MFD_CLOEXEC)) {
+      heard_(memoryFile()) {
     if (heard_.get() >= 0) ::fcntl(heard_.get(), F_SETFL, O_APPEND);
     int const target = verbose_ ? err_.get() : heard_.get();
     if (target >= 0) ::dup2(target, STDOUT_FILENO);
@@ -99,16 +84,7 @@ EngineTalk::~EngineTalk() {
 
 std::string EngineTalk::reason() const {
     flushLibraries();
-    std::string text;
-    char block[512];
-    auto at = from_;
-    while (true) {
-        auto const got = ::pread(streams_.heard_.get(), block, sizeof block, at);
-        if (got <= 0) break;
-        text.append(block, static_cast<std::size_t>(got));
-        at += got;
-    }
-    return explain(text);
+    return explain(contentFrom(streams_.heard_, from_));
 }
 
 std::string explain(std::string_view diagnostics) {

@@ -12,22 +12,9 @@
 #include <string>
 #include <string_view>
 
+#include "descriptor.h"
+
 namespace morva::cli {
-
-// An owned file descriptor.
-class Descriptor {
-public:
-    explicit Descriptor(int number = -1) : number_(number) {}
-    Descriptor(Descriptor&& other) noexcept : number_(other.release()) {}
-    Descriptor& operator=(Descriptor&& other) noexcept;
-    ~Descriptor();
-
-    int get() const { return number_; }
-    int release();
-
-private:
-    int number_;
-};
 
 class Streams {
 public:

@@ -8,10 +8,13 @@
 
 namespace morva::cli {
 
-std::string TextOutput::chosenFormat() const {
-    if (!format.empty()) return format;
-    auto const ending = file.extension();
-    return ending == ".csv" ? "csv" : ending == ".json" ? "json" : "text";
+void TextOutput::write(Streams& streams, Forms const& forms) const {
+    auto const form = format.empty() ? file.extension().string() : '.' + format;
+    if (form == ".csv") return write(streams, forms.csv());
+    if (form != ".json") return write(streams, forms.text());
+    // Texts from files and file names need not be UTF-8.
+    write(streams,
+          forms.json().dump(1, ' ', false, nlohmann::json::error_handler_t::replace) + '\n');
 }
 
 void TextOutput::write(Streams& streams, std::string const& text) const {

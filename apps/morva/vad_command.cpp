@@ -1,5 +1,4 @@
 // morva vad: the voice score of each frame and the stretches of speech in a file.
-#include <nlohmann/json.hpp>
 #include <string>
 #include <vector>
 
@@ -25,12 +24,6 @@ struct Findings {
     int rateHz;
 };
 
-double spokenMs(Findings const& found) {
-    double sum = 0.0;
-    for (auto const& segment : found.segments) sum += segment.endMs - segment.startMs;
-    return sum;
-}
-
 std::string asText(Findings const& found) {
     std::string text = "start_s    end_s      length_s\n";
     for (auto const& [start, end] : found.segments) {
@@ -38,9 +31,9 @@ std::string asText(Findings const& found) {
                           (end - start) / 1000.0);
     }
     double const whole = static_cast<double>(found.scores.size()) * found.frameMs;
-    text +=
-        formatted("%zu segment%s, %.3f s of speech in %.3f s\n", found.segments.size(),
-                  found.segments.size() == 1 ? "" : "s", spokenMs(found) / 1000.0, whole / 1000.0);
+    text += formatted("%zu segment%s, %.3f s of speech in %.3f s\n", found.segments.size(),
+                      found.segments.size() == 1 ? "" : "s", totalMs(found.segments) / 1000.0,
+                      whole / 1000.0);
     return text;
 }
 
@@ -59,7 +52,7 @@ std::string asCsv(Findings const& found) {
     return text;
 }
 
-std::string asJson(Findings const& found, VadOptions const& options) {
+nlohmann::ordered_json asJson(Findings const& found, VadOptions const& options) {
     nlohmann::ordered_json page{{"file", options.file.string()},
                                 {"sample_rate", found.rateHz},
                                 {"frame_ms", found.frameMs},
@@ -67,59 +60,49 @@ std::string asJson(Findings const& found, VadOptions const& options) {
                                 {"release_threshold", options.rules.release},
                                 {"min_silence_ms", options.rules.minSilenceMs},
                                 {"padding_ms", options.rules.padMs},
-                                {"speech_s", spokenMs(found) / 1000.0},
+                                {"speech_s", totalMs(found.segments) / 1000.0},
                                 {"segments", nlohmann::json::array()},
                                 {"scores", found.scores}};
     for (auto const& [start, end] : found.segments) {
         page["segments"].push_back({{"start_s", start / 1000.0}, {"end_s", end / 1000.0}});
     }
-    return page.dump(1) + '\n';
+    return page;
 }
 
 int run(VadOptions const& options) {
-    Streams streams(options.engine.verbose);
-    Engine engine(streams, controlFolder(options.engine.models));
-    Models models(engine, options.engine.models);
+    Workbench bench(options.engine);
     auto const sound = readMono(options.file);
-    Findings found{
-        .scores = voiceScores(engine, models, options.file.string(), sound, options.engine.frameMs),
-        .segments = {},
-        .frameMs = static_cast<double>(options.engine.frameMs),
-        .rateHz = sound.rateHz};
+    Findings found{.scores = voiceScores(bench, bench.model, sound),
+                   .segments = {},
+                   .frameMs = static_cast<double>(bench.frameMs),
+                   .rateHz = sound.rateHz};
     found.segments = speechSegments(found.scores, found.frameMs, options.rules);
-    auto const format = options.output.chosenFormat();
-    options.output.write(streams, format == "csv"    ? asCsv(found)
-                                  : format == "json" ? asJson(found, options)
-                                                     : asText(found));
+    options.output.write(bench.streams,
+                         {[&] { return asText(found); }, [&] { return asCsv(found); },
+                          [&] { return asJson(found, options); }});
     return 0;
 }
 
 }  // namespace
 
 void addVad(CLI::App& app, Action& action) {
-    auto const options = std::make_shared<VadOptions>();
-    auto* command =
-        app.add_subcommand("vad", "Find speech: voice score per frame and speech segments");
-    command->add_option("file", options->file, "Sound file; channels are averaged")->required();
-    auto& rules = options->rules;
-    command->add_option("--threshold", rules.threshold, "Score that starts speech")
-        ->check(CLI::Range(0.0, 1.0))
-        ->capture_default_str();
-    command->add_option("--release-threshold", rules.release, "Score below which speech may end")
-        ->check(CLI::Range(0.0, 1.0))
-        ->capture_default_str();
-    command
-        ->add_option("--min-silence", rules.minSilenceMs,
-                     "Silence that ends speech, in milliseconds")
-        ->check(CLI::NonNegativeNumber)
-        ->capture_default_str();
-    command
-        ->add_option("--padding", rules.padMs, "Added at both ends of a segment, in milliseconds")
-        ->check(CLI::NonNegativeNumber)
-        ->capture_default_str();
-    addTextOutput(*command, options->output);
-    addEngineOptions(*command, options->engine);
-    command->callback([options, &action] { action = [options] { return run(*options); }; });
+    auto& command =
+        *app.add_subcommand("vad", "Find speech: voice score per frame and speech segments");
+    auto& options = addOptions(command, action, &run);
+    command.add_option("file", options.file, "Sound file; channels are averaged")->required();
+    auto const number = [&](char const* name, double& value, char const* meaning) {
+        return command.add_option(name, value, meaning)->capture_default_str();
+    };
+    auto& rules = options.rules;
+    number("--threshold", rules.threshold, "Score that starts speech")->check(CLI::Range(0.0, 1.0));
+    number("--release-threshold", rules.release, "Score below which speech may end")
+        ->check(CLI::Range(0.0, 1.0));
+    number("--min-silence", rules.minSilenceMs, "Silence that ends speech, in milliseconds")
+        ->check(CLI::NonNegativeNumber);
+    number("--padding", rules.padMs, "Added at both ends of a segment, in milliseconds")
+        ->check(CLI::NonNegativeNumber);
+    addTextOutput(command, options.output);
+    addEngineOptions(command, options.engine);
 }
 
 }  // namespace morva::cli

@@ -2,120 +2,95 @@
 
 #include <algorithm>
 #include <cmath>
-#include <limits>
-#include <memory>
 #include <span>
+#include <utility>
 
 #include "engine.h"
 #include "error.h"
-#include "utils/matrix.h"
+#include "weights/value_types.h"
 
 namespace morva::cli {
 namespace {
 
 using MORVA::CONTAINERS::AnyMap;
 using MORVA::CONTAINERS::Matrix;
-using Vectors = std::vector<std::vector<float>>;
-using Matrices = std::vector<Matrix>;
 
-class Range {
+// What a value's type means for the facts: one overload for each.
+class Describer {
 public:
-    void add(std::span<float const> numbers) {
-        for (float const number : numbers) {
-            ++count_;
+    Describer(ValueFacts& facts, WeightFacts& whole) : facts_(facts), whole_(whole) {}
+
+    void operator()(float value) { number("float", std::to_string(value), value); }
+    void operator()(int value) { number("int", std::to_string(value), static_cast<float>(value)); }
+    void operator()(std::string const& value) {
+        facts_.type = "string";
+        facts_.text = value;
+    }
+    void operator()(std::vector<float> const& value) { numbers("vector", value); }
+    void operator()(Matrix const& value) { numbers("matrix", value); }
+    void operator()(std::vector<std::vector<float>> const& value) { numbers("vectors", value); }
+    void operator()(std::vector<Matrix> const& value) { numbers("matrices", value); }
+
+    // To be called when all numbers are there.
+    void finish() {
+        auto const finite = facts_.count - facts_.notFinite;
+        if (finite > 0) facts_.mean = sum_ / static_cast<double>(finite);
+    }
+
+private:
+    void number(char const* type, std::string text, float value) {
+        facts_.type = type;
+        facts_.text = std::move(text);
+        range({&value, 1});
+    }
+    template <class Value>
+    void numbers(char const* type, Value const& value) {
+        facts_.type = type;
+        parts(value);
+        if (facts_.shape.empty()) facts_.shape = "none";
+    }
+
+    template <class Part>
+    void parts(std::vector<Part> const& list) {
+        for (auto const& part : list) parts(part);
+    }
+    void parts(std::vector<float> const& vector) { part(std::to_string(vector.size()), vector); }
+    void parts(Matrix const& matrix) {
+        part(std::to_string(matrix.rows) + 'x' + std::to_string(matrix.cols), matrix.data);
+        whole_.multiplyAddsPerStep += matrix.data.size();
+    }
+    void part(std::string const& shape, std::vector<float> const& data) {
+        if (!facts_.shape.empty()) facts_.shape += ' ';
+        facts_.shape += shape;
+        range(data);
+        whole_.parameters += data.size();
+    }
+
+    void range(std::span<float const> data) {
+        for (float const number : data) {
+            bool const first = facts_.count++ == facts_.notFinite;  // of the finite ones
             if (!std::isfinite(number)) {
-                ++notFinite_;
+                ++facts_.notFinite;
                 continue;
             }
             double const value = static_cast<double>(number);
-            lowest_ = std::min(lowest_, value);
-            highest_ = std::max(highest_, value);
+            facts_.lowest = first ? value : std::min(facts_.lowest, value);
+            facts_.highest = first ? value : std::max(facts_.highest, value);
             sum_ += value;
         }
     }
 
-    void into(ValueFacts& facts) const {
-        facts.count = count_;
-        facts.notFinite = notFinite_;
-        auto const finite = count_ - notFinite_;
-        if (finite == 0) return;
-        facts.lowest = lowest_;
-        facts.highest = highest_;
-        facts.mean = sum_ / static_cast<double>(finite);
-    }
-
-private:
-    std::size_t count_ = 0;
-    std::size_t notFinite_ = 0;
-    double lowest_ = std::numeric_limits<double>::infinity();
-    double highest_ = -std::numeric_limits<double>::infinity();
+    ValueFacts& facts_;
+    WeightFacts& whole_;
     double sum_ = 0.0;
 };
-
-std::string shapeOf(std::vector<float> const& vector) {
-    return std::to_string(vector.size());
-}
-std::string shapeOf(Matrix const& matrix) {
-    return std::to_string(matrix.rows) + 'x' + std::to_string(matrix.cols);
-}
-template <class T>
-std::string shapesOf(std::vector<T> const& items) {
-    std::string text;
-    for (auto const& item : items) {
-        if (!text.empty()) text += ' ';
-        text += shapeOf(item);
-    }
-    return text.empty() ? "none" : text;
-}
-
-std::uint64_t products(Matrix const& matrix) {
-    return matrix.data.size();
-}
 
 // The facts of one value; adds its share to the sums in `whole`.
 ValueFacts describe(std::string const& name, AnyMap const& values, WeightFacts& whole) {
     ValueFacts facts{.name = name, .type = "", .shape = "", .text = ""};
-    Range range;
-    if (auto const number = values.find<float>(name)) {
-        facts.type = "float";
-        facts.text = std::to_string(*number);
-        range.add({number.get(), 1});
-    } else if (auto const integer = values.find<int>(name)) {
-        facts.type = "int";
-        facts.text = std::to_string(*integer);
-        float const value = static_cast<float>(*integer);
-        range.add({&value, 1});
-    } else if (auto const text = values.find<std::string>(name)) {
-        facts.type = "string";
-        facts.text = *text;
-    } else if (auto const vector = values.find<std::vector<float>>(name)) {
-        facts.type = "vector";
-        facts.shape = shapeOf(*vector);
-        range.add(*vector);
-        whole.parameters += vector->size();
-    } else if (auto const vectors = values.find<Vectors>(name)) {
-        facts.type = "vectors";
-        facts.shape = shapesOf(*vectors);
-        for (auto const& one : *vectors) {
-            range.add(one);
-            whole.parameters += one.size();
-        }
-    } else if (auto const matrix = values.find<Matrix>(name)) {
-        facts.type = "matrix";
-        facts.shape = shapeOf(*matrix);
-        range.add(matrix->data);
-        whole.parameters += matrix->data.size();
-        whole.multiplyAddsPerStep += products(*matrix);
-    } else if (auto const matrices = values.find<Matrices>(name)) {
-        facts.type = "matrices";
-        facts.shape = shapesOf(*matrices);
-        for (auto const& one : *matrices) {
-            range.add(one.data);
-            whole.parameters += one.data.size();
-            whole.multiplyAddsPerStep += products(one);
-        }
-    }
-    range.into(facts);
+    Describer describer(facts, whole);
+    MORVA::WEIGHTS::visitValue(values, name, describer);
+    describer.finish();
     return facts;
 }
 

@@ -10,11 +10,7 @@ fail() { printf 'FAILED: %s\n' "$*" >&2 && exit 1; }
 cmake --install "$build" --prefix "$work/first" >/dev/null
 mv "$work/first" "$work/moved" # nothing may depend on the place
 prefix=$work/moved
-[ -L "$(echo "$prefix"/lib*/libmorva.so)" ] || fail "no development link"
 readelf -d "$prefix"/lib*/libmorva.so | grep -q 'SONAME.*libmorva\.so\.1\]' || fail "SONAME"
-for file in include/morva/morva-sdk.h include/morva/morva-ext.h share/morva/models/NC_small_16k.mvw; do
-    [ -f "$prefix/$file" ] || fail "$file is missing"
-done
 
 echo "-- find_package"
 cmake -S "$source/examples/cmake" -B "$work/user" -G Ninja -DCMAKE_PREFIX_PATH="$prefix" >"$work/log" ||

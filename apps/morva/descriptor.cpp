@@ -1,0 +1,38 @@
+#include "descriptor.h"
+
+#include <sys/mman.h>
+#include <unistd.h>
+
+#include <utility>
+
+namespace morva::cli {
+
+Descriptor& Descriptor::operator=(Descriptor&& other) noexcept {
+    std::swap(number_, other.number_);
+    return *this;
+}
+
+Descriptor::~Descriptor() {
+    if (number_ >= 0) ::close(number_);
+}
+
+int Descriptor::release() {
+    return std::exchange(number_, -1);
+}
+
+Descriptor memoryFile() {
+    return Descriptor(::memfd_create("morva", MFD_CLOEXEC));
+}
+
+std::string contentFrom(Descriptor const& file, long start) {
+    std::string text;
+    char block[4096];
+    for (auto at = start;;) {
+        auto const got = ::pread(file.get(), block, sizeof block, at);
+        if (got <= 0) return text;
+        text.append(block, static_cast<std::size_t>(got));
+        at += got;
+    }
+}
+
+}  // namespace morva::cli
