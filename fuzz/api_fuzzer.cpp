@@ -205,8 +205,7 @@ private:
                 answer(MorvaExt_NC_SetBackgroundSpeaker(session, on), {0, 1, 2, -3});
                 break;
             case 3:
-                answer(MorvaExt_NC_EnableVoice(session, rate(), duration(), pick(names)),
-                       {0, 1, 2, -3});
+                answer(MorvaExt_NC_EnableVoice(session, pick(names)), {0, 2, -3});
                 break;
             default: {
                 float voice = 0.0F;

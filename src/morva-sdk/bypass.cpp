@@ -20,7 +20,7 @@ Bypass::Bypass(std::size_t inputFrame, std::size_t outputFrame, std::size_t late
     input_.push_backNULL(frames_ * inputFrame);
 }
 
-void Bypass::remember(std::vector<float> const& input) {
+void Bypass::remember(std::span<float const> input) {
     input_.start += input.size();
     input_.push_back(input.data(), input.size());
 }
@@ -37,7 +37,7 @@ void Bypass::convertLast(std::size_t frames) {
     delayed_.start = delayed_.end - waiting_ - outputFrame_;
 }
 
-void Bypass::mix(std::vector<float>& cleaned) {
+void Bypass::mix(std::span<float> cleaned) {
     float const from = share_;
     float const to = target_.load(std::memory_order_relaxed) ? 1.0f : 0.0f;
     share_ = to;

@@ -1,6 +1,5 @@
 // The way around the model: the caller's own sound at the session's latency, cross-faded against
-// the cleaned sound, so that switching neither clicks nor shifts. One thread at a time; the switch
-// itself may be thrown from any thread.
+// the cleaned sound, so that switching neither clicks nor shifts.
 //
 // While it is off, nothing but a copy of the last input frames is kept. The frame that finds the
 // switch on converts all of them at once; the filter of the conversion has then heard enough to
@@ -9,6 +8,7 @@
 
 #include <atomic>
 #include <cstddef>
+#include <span>
 #include <vector>
 
 #include "utils/cyclic_block_data.h"
@@ -21,13 +21,14 @@ public:
     // `inputFrame` and `outputFrame` in samples, `latency` in output samples.
     Bypass(std::size_t inputFrame, std::size_t outputFrame, std::size_t latency);
 
+    // [any thread]
     void set(bool on) { target_.store(on, std::memory_order_relaxed); }
 
     // Remembers one input frame on the internal scale. To be called before the frame is cleaned.
-    void remember(std::vector<float> const& input);
+    void remember(std::span<float const> input);
 
     // Mixes the delayed input into one cleaned output frame, as far as the switch asks for it.
-    void mix(std::vector<float>& cleaned);
+    void mix(std::span<float> cleaned);
 
 private:
     void convertLast(std::size_t frames);

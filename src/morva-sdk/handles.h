@@ -7,20 +7,20 @@ namespace MORVA::MORVA_SDK {
 
 inline constexpr char const* kWrongSession =
     "The Session pointer is wrong insert existing session pointer";
-inline constexpr auto kAnyType = MorvaSessionType::Unknown;
 
 // Throws MORVA_Exception when there is none.
 inline MorvaInstanceT& engine() {
     return *MorvaInstanceT::Instance(MorvaInstanceT::MODE::get, nullptr);
 }
 
-// The live session of that type behind a handle, or null.
-inline MorvaSessionT* sessionOf(void* handle, MorvaSessionType type) {
-    auto const& instance = engine();
+// The live session behind a handle, of whatever kind or of this one; or null.
+inline MorvaSessionT* liveSession(void* handle) {
     auto* const session = static_cast<MorvaSessionT*>(handle);
-    bool const matches = instance.isSessionTrue(session) &&
-                         (type == kAnyType || instance.getSessionType(session) == type);
-    return matches ? session : nullptr;
+    return engine().isSessionTrue(session) ? session : nullptr;
+}
+inline MorvaSessionT* liveSession(void* handle, MorvaSessionType type) {
+    auto* const session = liveSession(handle);
+    return session != nullptr && session->getType() == type ? session : nullptr;
 }
 
 }  // namespace MORVA::MORVA_SDK

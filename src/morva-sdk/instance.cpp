@@ -14,14 +14,13 @@ constexpr char const* kUnit = "src/morva-sdk/instance";
 // Sessions without sound of their own are built for this output rate.
 constexpr MorvaSamplingRate kValueSessionRate = MORVA_RATE_16000;
 
-// What audio threads read; the holder inside Instance owns it. It also says whether there is an
-// instance: at process exit the holder may be gone before the last caller.
+// Owns the instance, and is what audio threads read. A plain pointer on purpose: process exit,
+// which an audio thread may meet inside a frame, destroys nothing.
 std::atomic<MorvaInstanceT*> current{nullptr};
 
 }  // namespace
 
 MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
-    static std::unique_ptr<MorvaInstanceT> holder;
     switch (mode) {
         case MODE::get: {
             auto* const instance = current.load(std::memory_order_acquire);
@@ -35,26 +34,23 @@ MorvaInstanceT* MorvaInstanceT::Instance(MODE mode, wchar_t const* path) {
             if (current.load(std::memory_order_relaxed) != nullptr) {
                 UTILS::raise("DOUBLE INITIALIZATION WITHOUT DESTROYING", kUnit, "Instance");
             }
-            holder = std::make_unique<MorvaInstanceT>(path != nullptr ? path : L"");
-            current.store(holder.get(), std::memory_order_release);
-            return holder.get();
+            auto fresh = std::make_unique<MorvaInstanceT>(path != nullptr ? path : L"");
+            current.store(fresh.get(), std::memory_order_release);
+            return fresh.release();
         }
         case MODE::destroy: {
             std::lock_guard const lock(mutexForInputs_);
-            if (current.load(std::memory_order_relaxed) == nullptr) {
-                UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
-            }
-            holder.reset();
+            std::unique_ptr<MorvaInstanceT> const last(current.exchange(nullptr));
+            if (!last) UTILS::raise("DESTROYING WITHOUT INTIALIZATION", kUnit, "Instance");
             return nullptr;
         }
     }
     UTILS::raise("Incorrect instance access mode...", kUnit, "Instance");
 }
 
-MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : workingPath_(path) {}
+MorvaInstanceT::MorvaInstanceT(wchar_t const* path) : registry_(path) {}
 
 MorvaInstanceT::~MorvaInstanceT() {
-    current.store(nullptr, std::memory_order_release);
     clearAll();
 }
 
@@ -102,11 +98,19 @@ MorvaSessionType MorvaInstanceT::getSessionType(MorvaSessionT* session) const {
 
 bool MorvaInstanceT::destroySession(MorvaSessionT* session) {
     std::lock_guard const lock(mutexForInputs_);
+    if (remove(session)) return true;
+    std::cout << "WARNING SESSION ISN'T FOUND" << std::endl;
+    return false;
+}
+
+bool MorvaInstanceT::closeSession(MorvaSessionT* session, MorvaSessionType type) {
+    std::lock_guard const lock(mutexForInputs_);
+    return getSessionType(session) == type && remove(session);
+}
+
+bool MorvaInstanceT::remove(MorvaSessionT const* session) {
     auto const found = std::ranges::find(sessions_, session, &std::unique_ptr<MorvaSessionT>::get);
-    if (found == sessions_.end()) {
-        std::cout << "WARNING SESSION ISN'T FOUND" << std::endl;
-        return false;
-    }
+    if (found == sessions_.end()) return false;
     directory_.remove(session);
     sessions_.erase(found);
     return true;
@@ -115,10 +119,7 @@ bool MorvaInstanceT::destroySession(MorvaSessionT* session) {
 bool MorvaInstanceT::clearAll() {
     for (auto const& session : sessions_) directory_.remove(session.get());
     sessions_.clear();
-    while (!modelEnvironments_.empty()) modelEnvironments_.pop_back();
-    modelNames_.clear();
-    weightIdentities_.clear();
-    workingPath_ = UTILS::Path(L"");
+    registry_.clear();
     return true;
 }
 

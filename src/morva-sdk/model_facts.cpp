@@ -1,40 +1,32 @@
 #include "morva-sdk/model_facts.h"
 
 #include <cstddef>
+#include <string>
 #include <vector>
 
 #include "utils/matrix.h"
+#include "weights/value_types.h"
 
 namespace MORVA::MORVA_SDK {
 namespace {
 
-using CONTAINERS::Matrix;
-using Vector = std::vector<float>;
-
-std::size_t floats(float) {
+std::size_t numbersIn(std::string const&) {
+    return 0;
+}
+template <class Number>
+std::size_t numbersIn(Number) {
     return 1;
 }
-std::size_t floats(int) {
-    return 1;
-}
-std::size_t floats(Vector const& values) {
+std::size_t numbersIn(std::vector<float> const& values) {
     return values.size();
 }
-std::size_t floats(Matrix const& matrix) {
+std::size_t numbersIn(CONTAINERS::Matrix const& matrix) {
     return matrix.data.size();
 }
 template <class Element>
-std::size_t floats(std::vector<Element> const& parts) {
+std::size_t numbersIn(std::vector<Element> const& parts) {
     std::size_t sum = 0;
-    for (auto const& part : parts) sum += floats(part);
-    return sum;
-}
-
-template <class... Types>
-std::size_t floatsOf(WEIGHTS::Weight const& weight, std::string const& name) {
-    std::size_t sum = 0;
-    auto const add = [&](auto const& found) { sum += found ? floats(*found) : 0; };
-    (add(weight.values().find<Types>(name)), ...);
+    for (auto const& part : parts) sum += numbersIn(part);
     return sum;
 }
 
@@ -52,10 +44,9 @@ ModelFacts modelFacts(WEIGHTS::Weight const& weight) {
         facts.frameMs = static_cast<int>(static_cast<long long>(*length) * 1000 / *rate);
     }
     for (auto const& [name, value] : weight.values()) {
-        facts.bytes +=
-            sizeof(float) *
-            floatsOf<float, int, Vector, Matrix, std::vector<Vector>, std::vector<Matrix>>(weight,
-                                                                                           name);
+        WEIGHTS::visitValue(weight.values(), name, [&](auto const& typed) {
+            facts.bytes += sizeof(float) * numbersIn(typed);
+        });
     }
     return facts;
 }

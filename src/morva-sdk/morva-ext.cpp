@@ -1,8 +1,7 @@
 #include "morva-sdk/morva-ext.h"
 
 #include <algorithm>
-#include <cmath>
-#include <memory>
+#include <cstdlib>
 #include <mutex>
 
 #include "morva-sdk/cpu_support.h"
@@ -16,12 +15,15 @@ namespace {
 
 using namespace MORVA::MORVA_SDK;
 
-// Runs `body` on the live session of that type behind a handle; 2 with the usual line when there is
-// none.
-template <class Body>
-int withSession(void* handle, MorvaSessionType type, Body&& body) {
+constexpr int kDone = 0;
+constexpr int kCannot = 1;
+
+// Runs `body` on the live session that `type`, where it is given, allows behind a handle; 2 with
+// the usual line when there is none.
+template <class Body, class... Type>
+int withSession(void* handle, Body&& body, Type... type) {
     return funnel(kIntFailures, [&] {
-        auto* const session = sessionOf(handle, type);
+        auto* const session = liveSession(handle, type...);
         if (session == nullptr) {
             printError(kWrongSession);
             return 2;
@@ -29,9 +31,14 @@ int withSession(void* handle, MorvaSessionType type, Body&& body) {
         return static_cast<int>(body(*session));
     });
 }
-
-constexpr int kDone = 0;
-constexpr int kCannot = 1;
+template <class Body>
+int withNoiseSession(void* handle, Body&& body) {
+    return withSession(handle, body, MorvaSessionType::NoiseCancellation);
+}
+template <class Body>
+int withSound(void* handle, Body&& body) {
+    return withNoiseSession(handle, [&](auto& session) { return body(session.sound()); });
+}
 
 void copyText(char* target, std::size_t room, std::string const& text) {
     std::size_t const length = std::min(text.size(), room - 1);
@@ -56,15 +63,15 @@ extern "C" {
 
 int MorvaExt_SessionLatencySamples(void* handle) {
     int latency = 0;
-    int const code = withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
-        latency = static_cast<int>(std::lround(session.latencySamples()));
+    int const code = withSound(handle, [&](auto& sound) {
+        latency = static_cast<int>(sound.latencySamples());
         return kDone;
     });
     return code == kDone ? latency : -std::abs(code);
 }
 
 int MorvaExt_SessionFrameSizes(void* handle, unsigned int* inputSize, unsigned int* outputSize) {
-    return withSession(handle, kAnyType, [&](auto& session) {
+    return withSession(handle, [&](auto& session) {
         if (inputSize != nullptr) *inputSize = static_cast<unsigned>(session.inputFrameSize());
         if (outputSize != nullptr) *outputSize = static_cast<unsigned>(session.outputFrameSize());
         return kDone;
@@ -72,66 +79,59 @@ int MorvaExt_SessionFrameSizes(void* handle, unsigned int* inputSize, unsigned i
 }
 
 int MorvaExt_NC_SetAttenuationLimit(void* handle, float limitDb) {
-    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
-        if (!(limitDb >= 0.0f)) return kCannot;
-        session.maskControls()->setMaskFloor(std::pow(10.0f, -limitDb / 20.0f));
-        return kDone;
-    });
+    return withSound(
+        handle, [&](auto& sound) { return sound.setAttenuationLimit(limitDb) ? kDone : kCannot; });
 }
 
 int MorvaExt_NC_SetBypass(void* handle, int on) {
-    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
-        session.bypass()->set(on != 0);
+    return withSound(handle, [&](auto& sound) {
+        sound.setBypass(on != 0);
         return kDone;
     });
 }
 
 int MorvaExt_NC_SetBackgroundSpeaker(void* handle, int on) {
-    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
-        return session.maskControls()->switchBackgroundSpeaker(on != 0) ? kDone : kCannot;
-    });
+    return withSound(
+        handle, [&](auto& sound) { return sound.setBackgroundSpeaker(on != 0) ? kDone : kCannot; });
 }
 
-int MorvaExt_NC_EnableVoice(void* handle, MorvaSamplingRate inputRate, MorvaFrameDuration duration,
-                            char const* vadModel) {
-    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
+int MorvaExt_NC_EnableVoice(void* handle, char const* vadModel) {
+    return withNoiseSession(handle, [&](auto& session) {
         std::lock_guard const lock(MorvaInstanceT::mutexForInputs_);
-        auto voice = std::make_unique<MorvaSessionT>(inputRate, MORVA_RATE_16000, duration,
-                                                     vadModel, MorvaSessionType::VoiceActivity);
-        if (voice->inputFrameSize() != session.inputFrameSize()) return kCannot;
-        session.judgeVoiceWith(std::move(voice));
+        session.enableVoice(vadModel);
         return kDone;
     });
 }
 
 int MorvaExt_NC_FrameMeters(void* handle, float* voice, float* noiseDb) {
-    return withSession(handle, MorvaSessionType::NoiseCancellation, [&](auto& session) {
-        if (voice != nullptr) *voice = session.lastVoice();
-        if (noiseDb != nullptr) *noiseDb = session.maskControls()->noiseLevelDb();
+    return withSound(handle, [&](auto& sound) {
+        if (voice != nullptr) *voice = sound.voiceScore();
+        if (noiseDb != nullptr) *noiseDb = sound.noiseLevelDb();
         return kDone;
     });
 }
 
 int MorvaExt_NoiseDB_FrameFloat(void* handle, float const* input, unsigned int inputSize,
                                 float* levelDb) {
-    return withSession(handle, MorvaSessionType::NoiseLevel, [&](auto& session) {
+    auto const frame = [&](MorvaSessionT& session) {
         if (input == nullptr || levelDb == nullptr) return 2;
         if (inputSize != session.inputFrameSize()) return kCannot;
         *levelDb = session.frameNoiseDB(input, inputSize);
         return kDone;
-    });
+    };
+    return withSession(handle, frame, MorvaSessionType::NoiseLevel);
 }
 
 int MorvaExt_ListModels(MorvaExtModelInfo* models, int capacity) {
     return funnel(kIntFailures, [&] {
-        auto const& instance = engine();
+        auto const& registry = engine().registry();
         std::lock_guard const lock(MorvaInstanceT::mutexForInputs_);
         int written = 0;
-        for (auto const& [name, index] : instance.modelNames()) {
+        for (auto const& [name, index] : registry.names()) {
             if (models == nullptr || written >= capacity) break;
-            models[written++] = describe(name, *instance.modelEnvironments()[index]->first);
+            models[written++] = describe(name, *registry.environments()[index]->first);
         }
-        return static_cast<int>(instance.modelNames().size());
+        return static_cast<int>(registry.names().size());
     });
 }
 

@@ -44,11 +44,9 @@ MORVA_API int MorvaExt_NC_SetBypass(void* session, int on);
 MORVA_API int MorvaExt_NC_SetBackgroundSpeaker(void* session, int on);
 
 /* [control thread] Lets the voice-activity model `vadModel` (null: chosen by rate) judge every
- * frame that this session cleans. `inputRate` and `duration` are those of the session. Not while a
- * frame call runs on it. 1 when the frame sizes disagree, -3 when the model cannot be opened; the
- * session then goes on as it was. */
-MORVA_API int MorvaExt_NC_EnableVoice(void* session, MorvaSamplingRate inputRate,
-                                      MorvaFrameDuration duration, char const* vadModel);
+ * frame that this session cleans, from the next one on, which allocates nothing either. Not while a
+ * frame call runs on it. -3 when the model cannot be opened; the session then goes on as it was. */
+MORVA_API int MorvaExt_NC_EnableVoice(void* session, char const* vadModel);
 
 /* [audio thread] Meters of the last cleaned frame: the voice score (NaN unless enabled) and the
  * level of what was removed, in decibels as noise-level sessions report it (with an attenuation

@@ -3,7 +3,6 @@
 #include <algorithm>
 #include <cstdio>
 #include <iostream>
-#include <iterator>
 #include <mutex>
 
 #include "morva-sdk/cpu_support.h"
@@ -11,6 +10,7 @@
 #include "morva-sdk/handles.h"
 #include "morva-sdk/instance.h"
 #include "morva-sdk/last_error.h"
+#include "morva-sdk/vocabulary.h"
 #include "utils/math_setup.h"
 
 namespace {
@@ -19,12 +19,6 @@ using namespace MORVA::MORVA_SDK;
 using MODE = MorvaInstanceT::MODE;
 
 constexpr char const* kUnit = "src/morva-sdk/morva-sdk";
-
-bool isSupported(MorvaSamplingRate rate) {
-    constexpr int kRates[] = {8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
-    return std::find(std::begin(kRates), std::end(kRates), static_cast<int>(rate)) !=
-           std::end(kRates);
-}
 
 template <class Register>
 int registerModel(bool hasInput, char const* nullWarning, Register&& add) {
@@ -42,7 +36,7 @@ int registerModel(bool hasInput, char const* nullWarning, Register&& add) {
 template <class Create>
 void* createSession(std::initializer_list<MorvaSamplingRate> rates, Create&& create) {
     return funnel(kHandleFailures, [&]() -> void* {
-        if (!std::all_of(rates.begin(), rates.end(), isSupported)) {
+        if (!std::ranges::all_of(rates, isSamplingRate)) {
             printError("Unsupported Sampling rates!");
             return nullptr;
         }
@@ -52,14 +46,12 @@ void* createSession(std::initializer_list<MorvaSamplingRate> rates, Create&& cre
 
 int closeSession(void* handle, MorvaSessionType type) {
     return funnel(kIntFailures, [&] {
-        auto& instance = engine();
-        auto* const session = static_cast<MorvaSessionT*>(handle);
-        if (instance.getSessionType(session) != type) {
+        if (!engine().closeSession(static_cast<MorvaSessionT*>(handle), type)) {
             MORVA::UTILS::raise(
                 "Trying to close a non-existant session or session of incompatible type", kUnit,
                 "closeSession");
         }
-        return instance.destroySession(session) ? 0 : 1;
+        return 0;
     });
 }
 
@@ -67,7 +59,7 @@ template <class Sample>
 int cleanFrame(void* handle, Sample const* input, unsigned inputSize, Sample* output,
                unsigned outputSize) {
     return funnel(kIntFailures, [&] {
-        auto* const session = sessionOf(handle, MorvaSessionType::NoiseCancellation);
+        auto* const session = liveSession(handle, MorvaSessionType::NoiseCancellation);
         if (session == nullptr) {
             printError(kWrongSession);
             return 2;
@@ -83,7 +75,7 @@ enum class Range { any, unit };
 template <class Frame>
 float frameValue(void* handle, MorvaSessionType type, Range range, Frame&& frame) {
     return funnel(kFloatFailures, [&] {
-        if (auto* const session = sessionOf(handle, type)) {
+        if (auto* const session = liveSession(handle, type)) {
             float const value = frame(*session);
             if (range == Range::any || (value >= 0.0f && value <= 1.0f)) return value;
             std::cerr << "THE CLEANING ERROR OUTPUT result " << value << std::endl;
@@ -168,7 +160,7 @@ int Morva_NoiseDB_CloseSession(void* session) {
 
 int Morva_NoiseDB_ResetSession(void* handle) {
     return funnel(kIntFailures, [&] {
-        auto* const session = sessionOf(handle, MorvaSessionType::NoiseLevel);
+        auto* const session = liveSession(handle, MorvaSessionType::NoiseLevel);
         if (session == nullptr) {
             MORVA::UTILS::raise(
                 "Trying to reset a non-existant session or session of incompatible type", kUnit,

@@ -57,16 +57,21 @@ extern "C" {
 #define MORVA_ENUM(name) enum name
 #endif
 
-/* Sampling rates in hertz that the engine takes; nothing between them. */
-typedef MORVA_ENUM(MorvaSamplingRate){
-    MORVA_RATE_8000 = 8000,   MORVA_RATE_12000 = 12000, MORVA_RATE_16000 = 16000,
-    MORVA_RATE_24000 = 24000, MORVA_RATE_32000 = 32000, MORVA_RATE_44100 = 44100,
-    MORVA_RATE_48000 = 48000, MORVA_RATE_88200 = 88200, MORVA_RATE_96000 = 96000} MorvaSamplingRate;
+/* What the engine takes, as lists: sampling rates in hertz and frame lengths in milliseconds,
+ * nothing between them. X(value) is expanded for each, ascending. */
+#define MORVA_SAMPLING_RATES(X) \
+    X(8000) X(12000) X(16000) X(24000) X(32000) X(44100) X(48000) X(88200) X(96000)
+#define MORVA_FRAME_DURATIONS(X) X(10) X(20) X(30) X(40)
 
-/* Frame lengths in milliseconds that a session takes. */
-typedef MORVA_ENUM(MorvaFrameDuration){MORVA_FRAME_10_MS = 10, MORVA_FRAME_20_MS = 20,
-                                       MORVA_FRAME_30_MS = 30,
-                                       MORVA_FRAME_40_MS = 40} MorvaFrameDuration;
+/* MORVA_RATE_8000 = 8000 ... MORVA_RATE_96000 = 96000 */
+#define MORVA_RATE_ENTRY(hz) MORVA_RATE_##hz = hz,
+typedef MORVA_ENUM(MorvaSamplingRate){MORVA_SAMPLING_RATES(MORVA_RATE_ENTRY)} MorvaSamplingRate;
+#undef MORVA_RATE_ENTRY
+
+/* MORVA_FRAME_10_MS = 10 ... MORVA_FRAME_40_MS = 40 */
+#define MORVA_FRAME_ENTRY(ms) MORVA_FRAME_##ms##_MS = ms,
+typedef MORVA_ENUM(MorvaFrameDuration){MORVA_FRAME_DURATIONS(MORVA_FRAME_ENTRY)} MorvaFrameDuration;
+#undef MORVA_FRAME_ENTRY
 
 /* [control thread] Creates the engine. Relative model paths are resolved against `workingPath` (may
  * be null: no prefix). A `threads` of 1..8 is passed on to the math library; the sequential layer

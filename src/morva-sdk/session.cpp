@@ -1,12 +1,11 @@
 #include "morva-sdk/session.h"
 
-#include <algorithm>
-#include <cmath>
-#include <span>
+#include <memory>
 #include <string>
+#include <utility>
 
 #include "morva-sdk/error_funnel.h"
-#include "noise_canceller/hop_pipeline.h"
+#include "noise_canceller/noise_cleaner.h"
 #include "utils/exception.h"
 #include "utils/flush_to_zero.h"
 #include "utils/pcm.h"
@@ -14,7 +13,10 @@
 namespace MORVA::MORVA_SDK {
 namespace {
 
+using NOISE_CANCELLER::NoiseCleaner;
+
 constexpr char const* kUnit = "src/morva-sdk/session";
+constexpr auto kHighestRate = static_cast<MorvaSamplingRate>(kSamplingRatesHz.back());
 
 // The two sample types differ in their texts and conversions, and in nothing else.
 struct Int16Samples {
@@ -41,18 +43,6 @@ struct FloatSamples {
     }
 };
 
-constexpr bool isSessionDuration(MorvaFrameDuration duration) {
-    int const ms = duration;
-    return ms == 10 || ms == 20 || ms == 30 || ms == 40;
-}
-
-// What a voice-activity session answers frames with has no samples.
-std::size_t outputSamples(MorvaFrameDuration duration, MorvaSamplingRate rate,
-                          MorvaSessionType type) {
-    return type == MorvaSessionType::VoiceActivity ? static_cast<std::size_t>(duration) / 1000
-                                                   : getSampleCount(duration, rate);
-}
-
 void printSizeError(char const* error, std::size_t inputSize, std::string const& outputSize) {
     auto const text = error + std::to_string(inputSize) + "\n output size must be " + outputSize;
     printError(text.c_str());
@@ -60,121 +50,91 @@ void printSizeError(char const* error, std::size_t inputSize, std::string const&
 
 }  // namespace
 
-std::size_t getSampleCount(MorvaFrameDuration duration, MorvaSamplingRate rate) {
-    double const samples = static_cast<double>(rate) * static_cast<double>(duration) / 1000.0;
-    return samples > 0.0 ? static_cast<std::size_t>(samples) : 0;
+MorvaSessionT::Path MorvaSessionT::openPath(char const* modelName) const {
+    bool const isSound = type_ == MorvaSessionType::NoiseCancellation;
+    // A missing model is what the caller hears about first, even when the duration is wrong as
+    // well.
+    auto const checkDuration = [this] {
+        if (isFrameDuration(duration_)) return;
+        UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
+    };
+    if (isSound) {
+        auto model = NOISE_CANCELLER::createNoiseModel(inputRate_, duration_, modelName);
+        checkDuration();
+        return Path(std::in_place_type<SoundPath>, std::move(model), inputFrameSize_,
+                    outputFrameSize_, duration_);
+    }
+    auto cleaner = NoiseCleaner::create(inputRate_, duration_, modelName, type_);
+    checkDuration();
+    return Path(std::in_place_type<ModelStage>, std::move(cleaner), inputFrameSize_, duration_);
 }
 
 MorvaSessionT::MorvaSessionT(MorvaSamplingRate inputRate, MorvaSamplingRate outputRate,
                              MorvaFrameDuration duration, char const* modelName,
                              MorvaSessionType type)
-    : type_(type),
-      cleaner_(NOISE_CANCELLER::NoiseCleaner::create(inputRate, duration, modelName, type)) {
-    // After the model, so that a missing model is what the caller hears about first; before the
-    // resamplers, which cannot be built for every duration.
-    if (!isSessionDuration(duration)) {
-        UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
-    }
-    auto const modelRate = cleaner_->environment()->first->getWeightInfo().first;
-    modelFrameSize_ = getSampleCount(duration, modelRate);
-    auto const soundRate = type == MorvaSessionType::VoiceActivity ? modelRate : outputRate;
-    inputFrameSize_ = getSampleCount(duration, inputRate);
-    outputFrameSize_ = outputSamples(duration, outputRate, type);
-    inputResampler_ = std::make_unique<UTILS::Resampler>(inputFrameSize_, modelFrameSize_);
-    outputResampler_ =
-        std::make_unique<UTILS::Resampler>(modelFrameSize_, getSampleCount(duration, soundRate));
-    auto const longest = std::max({inputFrameSize_, modelFrameSize_, outputFrameSize_});
-    frame_.reserve(longest);
-    resampled_.reserve(longest);
-    if (type == MorvaSessionType::NoiseCancellation) prepareSoundPath(duration);
+    : inputRate_(inputRate),
+      duration_(duration),
+      type_(type),
+      inputFrameSize_(getSampleCount(duration, inputRate)),
+      outputFrameSize_(
+          type == MorvaSessionType::VoiceActivity ? 0 : getSampleCount(duration, outputRate)),
+      path_(openPath(modelName)) {
+    frame_.reserve(getSampleCount(duration, kHighestRate));
 }
 
-void MorvaSessionT::prepareSoundPath(MorvaFrameDuration duration) {
-    auto const [modelRate, modelFrameMs] = cleaner_->environment()->first->getWeightInfo();
-    auto const pipelineDelay =
-        NOISE_CANCELLER::pipelineDelayMs(static_cast<std::size_t>(modelFrameMs),
-                                         static_cast<std::size_t>(duration)) *
-        static_cast<std::size_t>(modelRate) / 1000;
-    auto const atModelRate = inputResampler_->leadingZeros(inputFrameSize_) + pipelineDelay;
-    auto const atOutputRate = outputResampler_->leadingZeros(modelFrameSize_);
-    latency_ = static_cast<double>(atModelRate) * outputResampler_->ratio() +
-               static_cast<double>(atOutputRate);
-    bypass_ = std::make_unique<Bypass>(inputFrameSize_, outputFrameSize_,
-                                       static_cast<std::size_t>(std::lround(latency_)));
-    maskControls_ = dynamic_cast<NOISE_CANCELLER::MaskControls*>(cleaner_.get());
-}
-
-void MorvaSessionT::through(UTILS::Resampler& resampler) {
-    if (resampler.ratio() == 1.0) return;
-    if (resampler.resample(frame_, resampled_) > 0) frame_.swap(resampled_);
-}
-
-void MorvaSessionT::cleanFrame() {
-    bypass_->remember(frame_);
-    through(*inputResampler_);
-    UTILS::clipToPcm16(frame_);
-    cleaner_->cleanNoise(frame_);
-    through(*outputResampler_);
-    bypass_->mix(frame_);
-    UTILS::clipToPcm16(frame_);
+void MorvaSessionT::enableVoice(char const* vadModel) {
+    auto cleaner =
+        NoiseCleaner::create(inputRate_, duration_, vadModel, MorvaSessionType::VoiceActivity);
+    sound().enableVoice(
+        std::make_unique<VoiceMeter>(std::move(cleaner), inputFrameSize_, duration_));
 }
 
 template <class Format, class Sample>
-bool MorvaSessionT::cleanSamples(Sample const* input, std::size_t inputSize, Sample* output,
-                                 std::size_t outputSize) {
-    if (input == nullptr || output == nullptr || inputSize != inputFrameSize_ ||
-        outputSize != outputFrameSize_) {
+bool MorvaSessionT::cleanSamples(std::span<Sample const> input, std::span<Sample> output) {
+    if (input.data() == nullptr || output.data() == nullptr || input.size() != inputFrameSize_ ||
+        output.size() != outputFrameSize_) {
         printSizeError(Format::sizeError, inputFrameSize_, std::to_string(outputFrameSize_));
         return false;
     }
     UTILS::ScopedFlushToZero const fast;
-    if (voice_) lastVoice_ = voice_->frameVad(input, inputSize);
-    frame_.resize(inputSize);
-    Format::read({input, inputSize}, frame_);
-    cleanFrame();
-    std::size_t const written = std::min(frame_.size(), outputSize);
-    Format::write({frame_.data(), written}, {output, written});
+    frame_.resize(input.size());
+    Format::read(input, frame_);
+    sound().clean(frame_);
+    Format::write(frame_, output);
     return true;
 }
 
 bool MorvaSessionT::cleanNoise(short const* input, std::size_t inputSize, short* output,
                                std::size_t outputSize) {
-    return cleanSamples<Int16Samples>(input, inputSize, output, outputSize);
+    return cleanSamples<Int16Samples>(std::span(input, inputSize), std::span(output, outputSize));
 }
 
 bool MorvaSessionT::cleanNoise(float const* input, std::size_t inputSize, float* output,
                                std::size_t outputSize) {
-    return cleanSamples<FloatSamples>(input, inputSize, output, outputSize);
+    return cleanSamples<FloatSamples>(std::span(input, inputSize), std::span(output, outputSize));
 }
 
 template <class Format, class Sample>
-bool MorvaSessionT::takeFrame(Sample const* input, std::size_t inputSize) {
-    if (input == nullptr || inputSize != inputFrameSize_) {
+std::optional<float> MorvaSessionT::valueOf(std::span<Sample const> input) {
+    if (input.data() == nullptr || input.size() != inputFrameSize_) {
         printSizeError(Format::sizeError, inputFrameSize_, "");
-        return false;
+        return std::nullopt;
     }
-    frame_.resize(inputSize);
-    Format::read({input, inputSize}, frame_);
-    return true;
-}
-
-float MorvaSessionT::modelValue() {
     UTILS::ScopedFlushToZero const fast;
-    through(*inputResampler_);
-    UTILS::clipToPcm16(frame_);
-    cleaner_->cleanNoise(frame_);
+    frame_.resize(input.size());
+    Format::read(input, frame_);
+    std::get<ModelStage>(path_).run(frame_);
     return frame_.front();
 }
 
 float MorvaSessionT::frameValue(short const* input, std::size_t inputSize, char const* function) {
-    if (!takeFrame<Int16Samples>(input, inputSize)) {
-        UTILS::raise("ERROR in input values", kUnit, function);
-    }
-    return modelValue();
+    auto const value = valueOf<Int16Samples>(std::span(input, inputSize));
+    if (!value) UTILS::raise("ERROR in input values", kUnit, function);
+    return *value;
 }
 
 float MorvaSessionT::frameValue(float const* input, std::size_t inputSize) {
-    return takeFrame<FloatSamples>(input, inputSize) ? modelValue() : -2.0f;
+    return valueOf<FloatSamples>(std::span(input, inputSize)).value_or(-2.0f);
 }
 
 float MorvaSessionT::frameVad(short const* input, std::size_t inputSize) {
@@ -194,9 +154,7 @@ float MorvaSessionT::frameNoiseDB(float const* input, std::size_t inputSize) {
 }
 
 bool MorvaSessionT::resetNoiseDBSession() {
-    cleaner_->resetSession();
-    inputResampler_->reset();
-    outputResampler_->reset();
+    std::get<ModelStage>(path_).reset();
     return true;
 }
 

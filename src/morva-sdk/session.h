@@ -1,29 +1,33 @@
-// One stream of audio: checks the caller's frames, brings them to the model's scale and rate, hands
-// them to the cleaner and brings the result back. Samples inside are floats on the 16-bit scale.
+// One stream of audio, from the caller's frames to the model and back.
 //
-// One thread at a time per session; sessions on different threads share nothing but read-only
-// weights. A rejected frame changes no state. After the first frames a frame call allocates
-// nothing.
+// The way of a frame, with the file that a reader finds each step in; a rejected frame changes no
+// state.
+//
+//   Morva_NC_CleanAmbientNoiseInt16, ...   finds the session of a handle        morva-sdk.cpp
+//     MorvaSessionT::cleanNoise            size and null check; samples to      session.cpp
+//                                          floats on the 16-bit scale, not a
+//                                          number -> 0; and back at the end
+//       SoundPath::clean                   what else a noise session hears      sound_path.cpp
+//         ModelStage::run                  the caller's rate -> the model's     model_stage.cpp
+//           NoiseCleaner::cleanNoise       hops, spectrum, network, mask        noise_canceller/
+//                                                                               mask_model.h
+//
+// A voice-activity or noise-level session has no sound path: its frames go to the model stage at
+// once, and the model's one value is the answer.
 #pragma once
 
 #include <cstddef>
-#include <limits>
-#include <memory>
-#include <utility>
+#include <optional>
+#include <span>
+#include <variant>
 #include <vector>
 
-#include "morva-sdk/bypass.h"
-#include "morva-sdk/morva-sdk.h"
-#include "morva-sdk/session_type.h"
-#include "noise_canceller/mask_controls.h"
-#include "noise_canceller/noise_cleaner.h"
+#include "morva-sdk/model_stage.h"
+#include "morva-sdk/sound_path.h"
+#include "morva-sdk/vocabulary.h"
 #include "utils/non_copyable.h"
-#include "utils/resampler.h"
 
 namespace MORVA::MORVA_SDK {
-
-// rate * duration / 1000, truncated; 0 for a negative duration.
-std::size_t getSampleCount(MorvaFrameDuration duration, MorvaSamplingRate rate);
 
 class MorvaSessionT : public UTILS::NonCopyMovable {
 public:
@@ -53,51 +57,31 @@ public:
 
     std::size_t inputFrameSize() const { return inputFrameSize_; }
     std::size_t outputFrameSize() const { return outputFrameSize_; }
-    // From sound in to sound out, in samples at the output rate; 0 for sessions without sound.
-    double latencySamples() const { return latency_; }
 
-    // Of noise-cancellation sessions; null otherwise.
-    NOISE_CANCELLER::MaskControls* maskControls() { return maskControls_; }
-    Bypass* bypass() { return bypass_.get(); }
-
-    // Lets a voice-activity session of the same input judge every frame that this one cleans. The
-    // session has the same input rate and duration. [the session's thread, between frames]
-    void judgeVoiceWith(std::unique_ptr<MorvaSessionT> voice) { voice_ = std::move(voice); }
-    // Its score of the last frame; NaN without one.
-    float lastVoice() const { return lastVoice_; }
+    // Of noise-cancellation sessions only.
+    SoundPath& sound() { return std::get<SoundPath>(path_); }
+    // Lets a voice-activity model judge every frame that is cleaned from now on. Throws like the
+    // constructor. [control thread], between frames
+    void enableVoice(char const* vadModel);
 
 private:
-    template <class Format, class Sample>
-    bool cleanSamples(Sample const* input, std::size_t inputSize, Sample* output,
-                      std::size_t outputSize);
-    template <class Format, class Sample>
-    bool takeFrame(Sample const* input, std::size_t inputSize);
+    using Path = std::variant<ModelStage, SoundPath>;
+    Path openPath(char const* modelName) const;
 
-    // Both work on frame_, which holds the caller's samples on the internal scale: it becomes the
-    // cleaned output frame, or its first value the model's result.
-    void cleanFrame();
-    float modelValue();
+    template <class Format, class Sample>
+    bool cleanSamples(std::span<Sample const> input, std::span<Sample> output);
+    template <class Format, class Sample>
+    std::optional<float> valueOf(std::span<Sample const> input);
     float frameValue(short const* input, std::size_t inputSize, char const* function);
     float frameValue(float const* input, std::size_t inputSize);
-    void through(UTILS::Resampler& resampler);
 
-    void prepareSoundPath(MorvaFrameDuration duration);
-
-    // Declared so that the cleaner goes first when the session ends.
-    std::size_t inputFrameSize_ = 0;
-    std::size_t outputFrameSize_ = 0;
-    std::size_t modelFrameSize_ = 0;
-    double latency_ = 0.0;
-    float lastVoice_ = std::numeric_limits<float>::quiet_NaN();
+    MorvaSamplingRate inputRate_;
+    MorvaFrameDuration duration_;
     MorvaSessionType type_;
-    std::unique_ptr<UTILS::Resampler> outputResampler_;
-    std::unique_ptr<UTILS::Resampler> inputResampler_;
-    std::vector<float> frame_;
-    std::vector<float> resampled_;
-    std::unique_ptr<Bypass> bypass_;
-    std::unique_ptr<MorvaSessionT> voice_;
-    std::unique_ptr<NOISE_CANCELLER::NoiseCleaner> cleaner_;
-    NOISE_CANCELLER::MaskControls* maskControls_ = nullptr;  // of cleaner_
+    std::size_t inputFrameSize_;
+    std::size_t outputFrameSize_;
+    std::vector<float> frame_;  // the caller's samples on the internal scale, then what they become
+    Path path_;
 };
 
 }  // namespace MORVA::MORVA_SDK

@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "morva-sdk/morva-sdk.h"
-#include "morva-sdk/session_type.h"
+#include "morva-sdk/vocabulary.h"
 #include "utils/non_copyable.h"
 #include "weights/model_environment.h"
 
@@ -51,5 +51,18 @@ protected:
 private:
     ModelEnvironment environment_;
 };
+
+class MaskControls;
+
+// A noise cleaner with what its session may change and read beside its frames.
+struct NoiseModel {
+    std::unique_ptr<NoiseCleaner> cleaner;
+    MaskControls& controls;  // of the cleaner
+    std::size_t delay;       // from sound in to sound out, in samples at the model's rate
+};
+
+// NoiseCleaner::create for noise-cancellation sessions.
+NoiseModel createNoiseModel(MorvaSamplingRate rate, MorvaFrameDuration frameMs,
+                            char const* modelName);
 
 }  // namespace MORVA::NOISE_CANCELLER

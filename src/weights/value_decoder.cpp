@@ -1,12 +1,12 @@
 #include "weights/value_decoder.h"
 
+#include <array>
 #include <cstdint>
-#include <iterator>
 #include <utility>
 #include <vector>
 
-#include "utils/matrix.h"
 #include "weights/serializers.h"
+#include "weights/value_types.h"
 
 namespace MORVA::WEIGHTS {
 
@@ -69,22 +69,19 @@ bool decodeAs(BoundedReader& reader, std::string const& name, AnyMap& values) {
 
 using Decoder = bool (*)(BoundedReader&, std::string const&, AnyMap&);
 
+template <class... Types>
+constexpr std::array<Decoder, sizeof...(Types)> decodersOf(TypeList<Types...>) {
+    return {decodeAs<Types>...};
+}
+
 // Indexed by type code.
-constexpr Decoder decoders[] = {
-    decodeAs<float>,
-    decodeAs<int>,
-    decodeAs<std::string>,
-    decodeAs<std::vector<float>>,
-    decodeAs<Matrix>,
-    decodeAs<std::vector<std::vector<float>>>,
-    decodeAs<std::vector<Matrix>>,
-};
+constexpr auto decoders = decodersOf(ValueTypes{});
 
 }  // namespace
 
 bool decodeValue(BoundedReader& reader, int typeCode, std::string const& name, AnyMap& values) {
-    if (typeCode < 0 || typeCode >= static_cast<int>(std::size(decoders))) return false;
-    return decoders[typeCode](reader, name, values);
+    if (typeCode < 0 || typeCode >= static_cast<int>(decoders.size())) return false;
+    return decoders[static_cast<std::size_t>(typeCode)](reader, name, values);
 }
 
 }  // namespace MORVA::WEIGHTS

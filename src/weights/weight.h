@@ -39,8 +39,7 @@ public:
     bool read_value(std::string const& name, int typeCode, UTILS::SerializerSstream& source);
 
     // The value of that name and type; lives as long as the weight. Throws MORVA_Exception when it
-    // is absent or of another type. T is one of float, int, std::string, std::vector<float>,
-    // Matrix, std::vector<std::vector<float>>, std::vector<Matrix>.
+    // is absent or of another type. T is one of ValueTypes.
     template <class T>
     T const& getReference(std::string const& name) const {
         auto const value = values_.find<T>(name);

@@ -166,6 +166,21 @@ TEST(FrameMemory, FramesTakeNoneAfterWarmUp) {
     EXPECT_EQ(observe([&] { return allocationsOfAllSessions<short>(models, count); }).result, 0U);
 }
 
+TEST(FrameMemory, VoiceIsReadyForTheNextFrame) {
+    Engine engine;
+    ASSERT_EQ(Engine::add("nc", randomNcWeight({})), 0);
+    // Above some of the rates and below others.
+    ASSERT_EQ(Engine::add("vad", randomVadWeight({.sampleRate = 16000, .frameLength = 480})), 0);
+    for (int hz : kRates) {
+        auto* const session = openNc(hz, hz, 10, "nc");
+        std::vector<float> const in(samples(hz, 10), 0.1F);
+        std::vector<float> out(in.size());
+        for (int i = 0; i < 100; ++i) clean(session, in, out);
+        ASSERT_EQ(MorvaExt_NC_EnableVoice(session, "vad"), 0);
+        EXPECT_EQ(allocationsOf([&] { clean(session, in, out); }), 0U) << hz;
+    }
+}
+
 // What a session holds beside the weights and tables that it shares with the first one.
 TEST(SessionMemory, IsSmallBesideTheModel) {
     Engine engine;

@@ -325,7 +325,7 @@ TEST_F(Extension, MetersEqualSeparateSessions) {
             auto* const nc = open(hz, ms, "level");
             auto* const db = Morva_NoiseDB_CreateSession(rate(hz), duration(ms), "level");
             auto* const voiceSession = Morva_VAD_CreateSession(rate(hz), duration(ms), "vad");
-            ASSERT_EQ(MorvaExt_NC_EnableVoice(nc, rate(hz), duration(ms), "vad"), 0);
+            ASSERT_EQ(MorvaExt_NC_EnableVoice(nc, "vad"), 0);
             auto const sound = toPcm(voice(hz, 1.0, 6));
             std::vector<short> out(size);
             for (std::size_t at = 0; at + size <= sound.size(); at += size) {
@@ -351,13 +351,11 @@ TEST_F(Extension, VoiceIsNotANumberUntilItIsEnabled) {
         return value;
     };
     EXPECT_TRUE(std::isnan(score()));
-    EXPECT_EQ(MorvaExt_NC_EnableVoice(session, rate(16000), duration(20), nullptr), 1);
-    auto const unknown = observe(
-        [&] { return MorvaExt_NC_EnableVoice(session, rate(16000), duration(10), "nothing"); });
+    auto const unknown = observe([&] { return MorvaExt_NC_EnableVoice(session, "nothing"); });
     EXPECT_EQ(unknown.result, -3);
     EXPECT_THAT(unknown.err, ::testing::HasSubstr("Weight with this name isn't found"));
     EXPECT_TRUE(std::isnan(score()));
-    EXPECT_EQ(MorvaExt_NC_EnableVoice(session, rate(16000), duration(10), nullptr), 0);
+    EXPECT_EQ(MorvaExt_NC_EnableVoice(session, nullptr), 0);
     EXPECT_THAT(score(), ::testing::AllOf(::testing::Ge(0.0F), ::testing::Le(1.0F)));
 }
 
@@ -431,13 +429,12 @@ TEST_F(Extension, WrongHandlesAreRefused) {
     for (void* const handle :
          {vadSession, static_cast<void*>(&nothing), static_cast<void*>(nullptr)}) {
         auto const wrong = observe([&] {
-            return std::vector<int>{
-                MorvaExt_NC_SetAttenuationLimit(handle, 0.0F),
-                MorvaExt_NC_SetBypass(handle, 1),
-                MorvaExt_NC_SetBackgroundSpeaker(handle, 1),
-                MorvaExt_NC_EnableVoice(handle, rate(16000), duration(10), "vad"),
-                MorvaExt_NC_FrameMeters(handle, &value, &value),
-                MorvaExt_NoiseDB_FrameFloat(handle, frame, 160, &value)};
+            return std::vector<int>{MorvaExt_NC_SetAttenuationLimit(handle, 0.0F),
+                                    MorvaExt_NC_SetBypass(handle, 1),
+                                    MorvaExt_NC_SetBackgroundSpeaker(handle, 1),
+                                    MorvaExt_NC_EnableVoice(handle, "vad"),
+                                    MorvaExt_NC_FrameMeters(handle, &value, &value),
+                                    MorvaExt_NoiseDB_FrameFloat(handle, frame, 160, &value)};
         });
         EXPECT_THAT(wrong.result, ::testing::Each(2));
         EXPECT_EQ(observe([&] { return MorvaExt_SessionLatencySamples(handle); }).result, -2);

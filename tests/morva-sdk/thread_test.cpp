@@ -8,6 +8,7 @@
 #include <thread>
 
 #include "engine.h"
+#include "morva-sdk/instance.h"
 
 using namespace sdk_test;
 using test_support::randomNcWeight;
@@ -108,4 +109,25 @@ TEST(Threads, SessionsGiveTheBitsThatTheyGiveAlone) {
     done = true;
     control.join();
     for (std::size_t i = 0; i < kSessions; ++i) EXPECT_EQ(together[i], alone[i]) << i;
+}
+
+// Both callers are past whatever they look at without the lock when one of them gets it.
+TEST(Threads, OneOfTwoClosesASession) {
+    using MORVA::MORVA_SDK::MorvaInstanceT;
+    Engine engine;
+    Engine::addIdentity("id", 16000, 20);
+    auto* const session = openNc(16000, 16000, 10, "id");
+    std::array<int, 2> codes = {7, 7};
+    auto const seen = observe([&] {
+        std::unique_lock lock(MorvaInstanceT::mutexForInputs_);
+        std::thread first([&] { codes[0] = Morva_NC_CloseSession(session); });
+        std::thread second([&] { codes[1] = Morva_NC_CloseSession(session); });
+        std::this_thread::sleep_for(std::chrono::milliseconds(50));
+        lock.unlock();
+        first.join();
+        second.join();
+        return codes;
+    });
+    EXPECT_THAT(seen.result, ::testing::UnorderedElementsAre(0, -3));
+    EXPECT_EQ(seen.out, "");
 }

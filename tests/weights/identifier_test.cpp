@@ -1,4 +1,5 @@
-#include "weights/identifier.h"
+// The identifier by which a weight that is loaded already is recognised.
+#include "weights/model_registry.h"
 
 #include <gtest/gtest.h>
 
@@ -13,10 +14,10 @@ using namespace MORVA;
 using test_support::WeightWriter;
 
 std::string identify(WeightWriter const& writer, std::string const& expectedOutput) {
-    WEIGHTS::Weight weight;
-    weight.read(writer.bytes().data(), writer.bytes().size());
+    auto const weight = std::make_shared<WEIGHTS::Weight>();
+    weight->read(writer.bytes().data(), writer.bytes().size());
     testing::internal::CaptureStdout();
-    auto identifier = WEIGHTS::weightIdentifier(weight);
+    auto identifier = WEIGHTS::ModelRegistry::mvwUniqueIdGenerator(weight);
     EXPECT_EQ(testing::internal::GetCapturedStdout(), expectedOutput);
     return identifier;
 }

@@ -1,13 +1,16 @@
-// Model registration: weight files, control files and blobs into the instance's registry.
+#include "weights/model_registry.h"
+
 #include <iostream>
-#include <utility>
+#include <tuple>
 
-#include "morva-sdk/instance.h"
+#include "utils/exception.h"
 #include "weights/control_file.h"
-#include "weights/identifier.h"
 
-namespace MORVA::MORVA_SDK {
+namespace MORVA::WEIGHTS {
 namespace {
+
+// Changes under the engine's lock, like the registry itself.
+ModelRegistry const* existing = nullptr;
 
 // Identifiers shorter than this are not entered.
 constexpr std::size_t kShortestIdentifier = 2;
@@ -18,41 +21,76 @@ std::string multibyte(UTILS::Path const& path) {
 
 }  // namespace
 
-UTILS::Path MorvaInstanceT::resolve(wchar_t const* path) const {
+ModelRegistry::ModelRegistry(wchar_t const* workingPath) : workingPath_(workingPath) {
+    existing = this;
+}
+
+ModelRegistry::~ModelRegistry() {
+    existing = nullptr;
+}
+
+ModelRegistry const& ModelRegistry::current() {
+    if (existing == nullptr) {
+        UTILS::raise("There are no models without an engine", "src/weights/model_registry",
+                     "current");
+    }
+    return *existing;
+}
+
+void ModelRegistry::clear() {
+    while (!environments_.empty()) environments_.pop_back();
+    names_.clear();
+    identities_.clear();
+    workingPath_ = UTILS::Path(L"");
+}
+
+UTILS::Path ModelRegistry::resolve(wchar_t const* path) const {
     UTILS::Path resolved(path);
     resolved.pushFront(workingPath_.str());
     resolved.normalize();
     return resolved;
 }
 
-bool MorvaInstanceT::isFreeName(char const* modelName) const {
+bool ModelRegistry::isFreeName(char const* modelName) const {
     bool const named = modelName != nullptr && *modelName != '\0';
-    if (named && !modelNames_.contains(modelName)) return true;
+    if (named && !names_.contains(modelName)) return true;
     std::cout << "WARNING model name exists or empty, please insert different name" << std::flush;
     return false;
 }
 
-std::string MorvaInstanceT::mvwUniqueIdGenerator(
-    std::shared_ptr<WEIGHTS::Weight> const& weight) const {
-    return WEIGHTS::weightIdentifier(*weight);
+std::string ModelRegistry::mvwUniqueIdGenerator(std::shared_ptr<Weight> const& weight) {
+    auto const& values = weight->values();
+    auto const version = values.find<std::string>(VERSION);
+    auto const rate = values.find<int>(SAMPLERATE);
+    auto const length = values.find<int>(FRAMELENGHT);
+    auto const model = values.find<std::string>("ModelName");
+    auto const stamp = values.find<std::string>("TimeStamp");
+    // A rate below 1 kHz would make the divisor 0 or negative.
+    if (!version || !rate || !length || !model || !stamp || *rate < 1000) {
+        std::cout << "ERROR INVALID WEIGHT" << std::endl;
+        return {};
+    }
+    int const kilohertz = *rate / 1000;
+    int const duration = *length / kilohertz;
+    return *version + std::to_string(duration) + std::to_string(kilohertz) + *model + *stamp;
 }
 
-MorvaInstanceT::WeightAndIdentifier MorvaInstanceT::checkWeight(
-    std::shared_ptr<WEIGHTS::Weight> weight) const {
+ModelRegistry::WeightAndIdentifier ModelRegistry::checkWeight(
+    std::shared_ptr<Weight> weight) const {
     auto identifier = mvwUniqueIdGenerator(weight);
     if (identifier.size() < kShortestIdentifier) {
         std::cout << "ERROR WEIGHT NAME ISNT LONG ENOUGHT\n" << std::flush;
         return {std::move(weight), ""};
     }
-    if (auto const known = weightIdentities_.find(identifier); known != weightIdentities_.end()) {
-        return {modelEnvironments_[known->second]->first, ""};
+    if (auto const known = identities_.find(identifier); known != identities_.end()) {
+        return {environments_[known->second]->first, ""};
     }
     return {std::move(weight), std::move(identifier)};
 }
 
-MorvaInstanceT::WeightAndIdentifier MorvaInstanceT::readAndCheckWeight(
+ModelRegistry::WeightAndIdentifier ModelRegistry::readAndCheckWeight(
     UTILS::Path const& path) const {
-    auto weight = std::make_shared<WEIGHTS::Weight>();
+    auto weight = std::make_shared<Weight>();
     if (!weight->read(path)) {
         std::cout << "WARNING weight isn't loaded \n weigth file: " << multibyte(path) << std::endl;
         return {nullptr, ""};
@@ -60,9 +98,9 @@ MorvaInstanceT::WeightAndIdentifier MorvaInstanceT::readAndCheckWeight(
     return checkWeight(std::move(weight));
 }
 
-MorvaInstanceT::WeightAndIdentifier MorvaInstanceT::readAndCheckWeight(char const* data,
-                                                                       std::size_t size) const {
-    auto weight = std::make_shared<WEIGHTS::Weight>();
+ModelRegistry::WeightAndIdentifier ModelRegistry::readAndCheckWeight(char const* data,
+                                                                     std::size_t size) const {
+    auto weight = std::make_shared<Weight>();
     if (!weight->read(data, size)) {
         std::cout << "WARNING weight isn't loaded \n" << std::flush;
         return {nullptr, ""};
@@ -70,8 +108,8 @@ MorvaInstanceT::WeightAndIdentifier MorvaInstanceT::readAndCheckWeight(char cons
     return checkWeight(std::move(weight));
 }
 
-bool MorvaInstanceT::addModelEnvironment(ModelEnvironment const& environment, char const* key,
-                                         char const* value) const {
+bool ModelRegistry::addModelEnvironment(ModelEnvironment const& environment, char const* key,
+                                        char const* value) {
     std::cout << "ENVIRONMENT KEY-\"" << key << "\" VALUE-\"" << value << "\"" << std::endl;
     auto const added =
         environment->second.insert<std::string>(key, value, CONTAINERS::InsertMode::replace);
@@ -79,8 +117,8 @@ bool MorvaInstanceT::addModelEnvironment(ModelEnvironment const& environment, ch
 }
 
 // False when the whole registration is to be abandoned.
-bool MorvaInstanceT::applyControlFile(UTILS::Path const& path, ModelEnvironment const& environment,
-                                      std::string& identifier) const {
+bool ModelRegistry::applyControlFile(UTILS::Path const& path, ModelEnvironment const& environment,
+                                     std::string& identifier) const {
     std::vector<std::pair<std::string, std::string>> entries;
     if (!UTILS::readControlFile(entries, path)) return true;  // nothing is loaded
     for (auto const& [key, value] : entries) {
@@ -102,25 +140,25 @@ bool MorvaInstanceT::applyControlFile(UTILS::Path const& path, ModelEnvironment 
     return true;
 }
 
-bool MorvaInstanceT::enterModel(ModelEnvironment const& environment, std::string const& identifier,
-                                char const* modelName) {
+bool ModelRegistry::enterModel(ModelEnvironment const& environment, std::string const& identifier,
+                               char const* modelName) {
     if (!environment->first) {
         std::cout << "Warning Weight name isn't included or weight has beeen included before \n"
                   << std::flush;
         return false;
     }
     // Nodes are made before the registry changes, so that a failed allocation leaves it as it was.
-    unsigned long const index = modelEnvironments_.size();
-    std::map<std::string, unsigned long> name{{modelName, index}};
-    std::map<std::string, unsigned long> identity;
+    unsigned long const index = environments_.size();
+    Positions name{{modelName, index}};
+    Positions identity;
     if (!identifier.empty()) identity.emplace(identifier, index);
-    modelEnvironments_.push_back(environment);
-    modelNames_.merge(name);
-    weightIdentities_.merge(identity);  // an identifier that is there keeps its index
+    environments_.push_back(environment);
+    names_.merge(name);
+    identities_.merge(identity);  // an identifier that is there keeps its index
     return true;
 }
 
-bool MorvaInstanceT::addWeightWithControlFile(wchar_t const* path, char const* modelName) {
+bool ModelRegistry::addWeightWithControlFile(wchar_t const* path, char const* modelName) {
     auto const fullPath = resolve(path);
     auto const extension = fullPath.getFileExtension();
     auto const environment = CONTAINERS::makeModelEnvironment();
@@ -135,7 +173,7 @@ bool MorvaInstanceT::addWeightWithControlFile(wchar_t const* path, char const* m
     return enterModel(environment, identifier, modelName);
 }
 
-bool MorvaInstanceT::addWeightBlob(char const* data, std::size_t size, char const* modelName) {
+bool ModelRegistry::addWeightBlob(char const* data, std::size_t size, char const* modelName) {
     auto const environment = CONTAINERS::makeModelEnvironment();
     std::string identifier;
     if (!isFreeName(modelName)) return false;
@@ -143,4 +181,4 @@ bool MorvaInstanceT::addWeightBlob(char const* data, std::size_t size, char cons
     return enterModel(environment, identifier, modelName);
 }
 
-}  // namespace MORVA::MORVA_SDK
+}  // namespace MORVA::WEIGHTS
