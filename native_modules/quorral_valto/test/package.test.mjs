@@ -1,33 +1,59 @@
-// The package as its users see it: import and require, friendly functions, loader failures.
+// The package as its users find it: exports, loader, start-up and what fails in it, the example.
 import assert from 'node:assert/strict';
-import { mkdirSync, renameSync, rmSync, writeFileSync } from 'node:fs';
+import { execFileSync } from 'node:child_process';
+import {
+  cpSync,
+  mkdirSync,
+  readFileSync,
+  renameSync,
+  rmSync,
+  symlinkSync,
+  writeFileSync,
+} from 'node:fs';
 import path from 'node:path';
 import { test } from 'node:test';
 import * as imported from 'quorral_valto';
-import { runClean } from './support/child.mjs';
+import { levelDb, noise } from './support/audio.mjs';
 import {
   binaryFile,
+  copyBinary,
   copyPackage,
   NC_MODELS,
+  repository,
   require,
+  run,
+  temporaryFolder,
   VAD_MODELS,
   WEIGHTS,
 } from './support/package.mjs';
 
 const required = require('quorral_valto');
-const { ValtoError } = required;
-const coded = (code) => (error) => error instanceof ValtoError && error.code === code;
+const coded = (code) => (error) => error instanceof required.ValtoError && error.code === code;
 
-test('import and require give the same objects', () => {
+test('import and require give the same objects, the file its symbols and no more', () => {
   assert.deepEqual(Object.keys(imported).sort(), Object.keys(required).sort());
   for (const [name, value] of Object.entries(imported)) assert.equal(required[name], value);
   assert.equal(required.raw, require(binaryFile));
+  const show = (...command) => execFileSync(command[0], command.slice(1), { encoding: 'utf8' });
+  const symbols = show('nm', '-D', '--defined-only', binaryFile).match(/\S+$/gm).sort();
+  const sides = ['NC', 'VAD'].flatMap((side) => {
+    return ['Process', 'Reset', 'Setup'].map((each) => `Valto${side}${each}`);
+  });
+  const registration = ['napi_register_module_v1', 'node_api_module_get_api_version_v1'];
+  assert.deepEqual(symbols, [...sides, ...registration]);
+  const dynamic = show('readelf', '-d', binaryFile);
+  const needed = [...dynamic.matchAll(/NEEDED.*\[(.*)\]/g)].map((match) => match[1]);
+  const allowed = /^(lib(c|m|dl|pthread|stdc\+\+|gcc_s|resample|asan|ubsan)\.so|ld-linux)/;
+  assert.deepEqual(
+    needed.filter((name) => !allowed.test(name)),
+    [],
+  );
+  assert.match(dynamic, /NODELETE/);
 });
 
-test('friendly functions', async (t) => {
+test('friendly functions', async () => {
   const { initialize, raw, getNcModels, getVadModels, setNcModel, setVadModel } = required;
   assert.deepEqual(await getNcModels(), []);
-  initialize();
   initialize();
   assert.throws(() => raw._initialize(), { message: /error code: -4$/ });
   initialize();
@@ -36,132 +62,162 @@ test('friendly functions', async (t) => {
   setNcModel(NC_MODELS[0]);
   setNcModel(null);
   setVadModel(VAD_MODELS[0]);
-  assert.throws(() => setNcModel('nobody'), coded('ERR_VALTO_MODEL'));
-  assert.throws(() => setVadModel('nobody'), coded('ERR_VALTO_MODEL'));
-  for (const other of [undefined, 5, {}]) {
-    assert.throws(() => setNcModel(other), coded('ERR_VALTO_ARGUMENT'));
-    assert.throws(() => setVadModel(other), coded('ERR_VALTO_ARGUMENT'));
+  for (const set of [setNcModel, setVadModel]) {
+    assert.throws(() => set('nobody'), coded('ERR_VALTO_MODEL'));
+    for (const other of [undefined, 5, {}]) {
+      assert.throws(() => set(other), coded('ERR_VALTO_ARGUMENT'));
+    }
   }
   assert.throws(() => setVadModel(null), coded('ERR_VALTO_ARGUMENT'));
-
-  await t.test('initialize succeeds where the raw function did, in a worker too', async () => {
-    const { stdout } = await runClean(`
-      loadRaw()._initialize();
-      require(PACKAGE).initialize();
-      startWorker("require(PACKAGE).initialize(); parentPort.postMessage('up');").on('message', console.log);`);
-    assert.equal(stdout, 'up\n');
-  });
+  const { stdout } = await run(`
+    loadRaw()._initialize();
+    require(PACKAGE).initialize();
+    startWorker("require(PACKAGE).initialize(); parentPort.postMessage('up');").on('message', console.log);`);
+  assert.equal(stdout, 'up\n');
 });
 
-const START = `
-  try { require(process.env.MODULE).initialize(); } catch (error) {
-    console.log(JSON.stringify([error.code, error.nativeCode, error.message]));
-  }`;
-async function startFailure(folder) {
-  const { stdout } = await runClean(START + START, { env: { MODULE: folder } });
-  const reports = stdout.split('\n').filter((line) => line.startsWith('['));
-  assert.equal(reports.length, 2);
-  assert.equal(reports[0], reports[1], 'a second attempt names the same cause');
-  return JSON.parse(reports[0]);
+test('start-up of the raw module: install paths and weight files that cannot be read', async (t) => {
+  // Each copy has an engine of its own, so one process can try them all.
+  const failed = (code) => `Failed to setup Valto module, error code: ${code}`;
+  const missing = (weight, module) =>
+    `Failed to load Morva weight file: ./${weight} with working directory: ${path.dirname(module)}`;
+  const cases = ['with space', 'J\u00fcrgen \u4f60\u597d', 'a%20b#c?d', "it's", '\uff21\ufffd'].map(
+    (name) => [copyBinary(t, name), ['started'], NC_MODELS, VAD_MODELS],
+  );
+  const long = copyBinary(t, Array(3).fill('d'.repeat(200)).join('/'));
+  cases.push([long, ['started'], NC_MODELS, VAD_MODELS]);
+  const beyond = copyBinary(t, 'smile \u{1f600}');
+  cases.push([beyond, [missing(WEIGHTS[0], beyond), failed(-5)], [], []]);
+  const damages = [
+    (file) => rmSync(file),
+    (file) => {
+      rmSync(file);
+      mkdirSync(file);
+    },
+    (file) => {
+      rmSync(file);
+      symlinkSync('nowhere', file);
+    },
+  ];
+  for (const [index, weight] of WEIGHTS.entries()) {
+    const module = copyBinary(t);
+    damages[index % damages.length](path.join(path.dirname(module), weight));
+    const lines = [missing(weight, module), failed(-5 - index)];
+    cases.push([module, lines, NC_MODELS.slice(0, index), []]);
+  }
+  const { stdout } = await run(
+    `(async () => {
+       for (const file of JSON.parse(process.env.FILES)) {
+         const raw = require(file);
+         for (let i = 0; i < 2; ++i) {
+           try { raw._initialize(); console.log('started'); } catch (error) { console.log(error.message); }
+         }
+         for (const list of [raw._getNcModels, raw._getVadModels]) {
+           console.log(JSON.stringify(await new Promise((resolve) => list(resolve))));
+         }
+       }
+     })();`,
+    { env: { FILES: JSON.stringify(cases.map(([module]) => module)) } },
+  );
+  const second = ['Faild to initialize Morva SDK', failed(-4)];
+  const expected = cases.flatMap(([, lines, ...lists]) => {
+    return [...lines, ...second, ...lists.map((list) => JSON.stringify(list))];
+  });
+  assert.deepEqual(stdout.trim().split('\n'), expected);
+});
+
+/** What a script that requires the package in a folder reports: [code, native code, message]. */
+async function report(folder, use, prelude = '') {
+  const { stdout } = await run(
+    `${prelude} try { const valto = require(process.env.MODULE); ${use}; console.log('["fine"]'); } catch (e) {
+      console.log(JSON.stringify([e.code, e.nativeCode, e.message]));
+    }`,
+    { env: { MODULE: folder } },
+  );
+  return JSON.parse(stdout.trim().split('\n').at(-1));
 }
 
 test('a failed start names its cause', async (t) => {
-  await t.test('weight missing', async () => {
-    for (const [index, weight] of WEIGHTS.entries()) {
-      const folder = copyPackage(t);
-      rmSync(path.join(folder, 'prebuilds/linux-x64', weight));
-      const [code, nativeCode, message] = await startFailure(folder);
-      assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_MISSING', -5 - index]);
-      assert.ok(message.includes(weight));
-    }
-  });
-  await t.test('weight not readable', async () => {
+  const start = 'try { valto.initialize() } catch { valto.initialize() }'; // the second says it, too
+  const missing = async (weight, index) => {
     const folder = copyPackage(t);
-    const file = path.join(folder, 'prebuilds/linux-x64', WEIGHTS[2]);
-    rmSync(file);
-    mkdirSync(file);
-    const [code, nativeCode, message] = await startFailure(folder);
-    assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_INVALID', -7]);
-    assert.ok(message.includes(WEIGHTS[2]));
-  });
-  await t.test('weight with damaged content: its sessions do not open', async () => {
-    const folder = copyPackage(t);
-    writeFileSync(path.join(folder, 'prebuilds/linux-x64', WEIGHTS[2]), 'nonsense');
-    const { stdout } = await runClean(
-      `const { initialize, NoiseCanceller } = require(process.env.MODULE);
-       initialize();
-       for (const sampleRate of [16000, 48000]) {
-         try { new NoiseCanceller({ sampleRate, frameMs: 10 }); console.log('open'); } catch (error) {
-           console.log(error.code);
-         }
-       }`,
-      { env: { MODULE: folder } },
-    );
-    assert.deepEqual(stdout.match(/^(open|ERR_.*)$/gm), ['open', 'ERR_VALTO_SESSION']);
-  });
-  await t.test('a path that the engine cannot express', async () => {
-    const [code, nativeCode, message] = await startFailure(copyPackage(t, '\u{1f680}'));
-    assert.deepEqual([code, nativeCode], ['ERR_VALTO_PATH', -5]);
-    assert.ok(message.includes('\u{1f680}'));
-  });
+    rmSync(path.join(folder, 'prebuilds/linux-x64', weight));
+    const [code, nativeCode, message] = await report(folder, start);
+    assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_MISSING', -5 - index]);
+    assert.ok(message.includes(weight));
+  };
+  await Promise.all(WEIGHTS.map(missing));
+  const folder = copyPackage(t);
+  const file = path.join(folder, 'prebuilds/linux-x64', WEIGHTS[2]);
+  rmSync(file);
+  mkdirSync(file);
+  assert.deepEqual((await report(folder, start)).slice(0, 2), ['ERR_VALTO_WEIGHT_INVALID', -7]);
+  rmSync(file, { recursive: true });
+  for (const content of ['', 'RIFF this is no weight file', readFileSync(binaryFile)]) {
+    writeFileSync(file, content);
+    const open = 'new valto.NoiseCanceller({ sampleRate: 48000, frameMs: 10 })';
+    assert.equal((await report(folder, `valto.initialize(); ${open}`))[0], 'ERR_VALTO_SESSION');
+  }
+  const beyond = await report(copyPackage(t, '\u{1f680}'), start);
+  assert.deepEqual(beyond.slice(0, 2), ['ERR_VALTO_PATH', -5]);
 });
-
-const LOAD = `
-  try { require(process.env.MODULE); console.log('loaded'); } catch (error) {
-    console.log(JSON.stringify([error.name, error.code, error.message]));
-  }`;
-async function loadFailure(folder, prelude = '') {
-  const { stdout } = await runClean(prelude + LOAD, { env: { MODULE: folder } });
-  const [name, code, message] = JSON.parse(stdout);
-  assert.deepEqual([name, code], ['ValtoError', 'ERR_VALTO_LOAD']);
-  return message;
-}
 
 test('a failed load names platform, tried paths and remedy', async (t) => {
+  const expectFailure = async (folder, parts, prelude) => {
+    const [code, , message] = await report(folder, '', prelude);
+    assert.equal(code, 'ERR_VALTO_LOAD');
+    for (const part of parts) assert.ok(message.includes(part), message);
+  };
   const folder = copyPackage(t);
   const file = path.join(folder, 'prebuilds/linux-x64/quorral_valto.node');
-
-  await t.test('damaged binary', async () => {
-    writeFileSync(file, 'not a module');
-    const message = await loadFailure(folder);
-    for (const part of ['linux-x64', file, 'Reinstall']) assert.ok(message.includes(part), message);
-  });
-  await t.test('no binary', async () => {
-    rmSync(file);
-    const message = await loadFailure(folder);
-    for (const part of ['linux-x64', file, 'no such file'])
-      assert.ok(message.includes(part), message);
-  });
-  await t.test('another platform', async () => {
-    const message = await loadFailure(
-      folder,
-      "Object.defineProperty(process, 'platform', { value: 'win32' });",
-    );
-    assert.match(message, /win32-x64/);
-    assert.match(message, /Only linux-x64/);
-  });
+  const windows = "Object.defineProperty(process, 'platform', { value: 'win32' });";
+  await expectFailure(folder, ['win32-x64', 'Only linux-x64'], windows);
+  // A file of the host application's own that the loader has no business with.
+  const foreign = path.join(folder, '../../build/release/quorral_valto');
+  mkdirSync(path.dirname(foreign), { recursive: true });
+  renameSync(path.dirname(file), foreign);
+  await expectFailure(folder, ['linux-x64', file, 'no such file']);
+  cpSync(path.join(folder, 'package.json'), file);
+  await expectFailure(folder, [file, 'Reinstall']);
 });
 
-test('inside an archive the unpacked copy is loaded', async (t) => {
+test('inside an archive only what lies unpacked beside it is loaded', async (t) => {
   const folder = copyPackage(t, 'app.asar/node_modules');
-  const prebuilds = path.join(folder, 'prebuilds');
-  const unpacked = copyPackage(t, 'elsewhere');
-  const target = folder.replace('app.asar', 'app.asar.unpacked');
+  const [code, , message] = await report(folder, '');
+  assert.equal(code, 'ERR_VALTO_LOAD');
+  for (const part of ['app.asar.unpacked', 'keep the folder "prebuilds"']) {
+    assert.ok(message.includes(part), message);
+  }
   // What a packager leaves: scripts in the archive, native files outside of it.
-  rmSync(prebuilds, { recursive: true });
-  rmSync(path.join(unpacked, 'lib'), { recursive: true });
-  mkdirSync(path.dirname(target), { recursive: true });
-  renameSync(unpacked, target);
-  const { stdout } = await runClean(
-    `const valto = require(process.env.MODULE); valto.initialize();
-     valto.getNcModels().then((names) => console.log(names.length));`,
-    { env: { MODULE: folder } },
-  );
-  assert.equal(stdout, '3\n');
+  const outside = path.join(folder.replace('app.asar', 'app.asar.unpacked'), 'prebuilds');
+  mkdirSync(path.dirname(outside), { recursive: true });
+  renameSync(path.join(folder, 'prebuilds'), outside);
+  assert.deepEqual(await report(folder, 'valto.initialize()'), ['fine']);
 });
 
-test('a native file that stayed inside an archive is not loaded from there', async (t) => {
-  const message = await loadFailure(copyPackage(t, 'app.asar/node_modules'));
-  for (const part of ['app.asar.unpacked', 'keep the folder "prebuilds"'])
-    assert.ok(message.includes(part), message);
+test('the example cleans a stereo file in place and length', (t) => {
+  const folder = temporaryFolder(t);
+  const program = path.join(repository, 'examples/node/denoise.mjs');
+  const [rate, frames] = [48000, 48000 * 3 + 77];
+  const input = noise(frames * 2, 5);
+  for (let i = 1; i < input.length; i += 2) input[i] = 0; // silence on the right
+  // An odd-sized chunk of no interest comes before the samples.
+  const head = Buffer.alloc(56);
+  head.write('RIFF    WAVEfmt ');
+  head.set([16, 0, 0, 0, 1, 0, 2, 0], 16);
+  head.writeUInt32LE(rate, 24);
+  head.set([4, 0, 16, 0, ...Buffer.from('note'), 3], 32);
+  head.write('data', 48);
+  head.writeUInt32LE(input.byteLength, 52);
+  writeFileSync(path.join(folder, 'noisy.wav'), Buffer.concat([head, Buffer.from(input.buffer)]));
+  const example = (...files) =>
+    execFileSync(process.execPath, [program, ...files], { cwd: folder, stdio: 'pipe' });
+  assert.match(`${example('noisy.wav', 'clean.wav')}`, /clean\.wav: 3\.0 s cleaned/);
+  const bytes = readFileSync(path.join(folder, 'clean.wav'));
+  assert.equal(bytes.length, 56 + input.byteLength);
+  const output = new Int16Array(bytes.buffer.slice(bytes.byteOffset + 56));
+  const channel = (which) => output.filter((_, i) => i % 2 === which).subarray(rate);
+  assert.ok(levelDb(channel(0)) < levelDb(noise(rate, 5)) - 12);
+  assert.ok(channel(1).every((sample) => sample === 0));
+  assert.throws(() => example(program, 'clean.wav'), /no chunk "fmt "/);
 });
