@@ -1,9 +1,13 @@
 // The host module without script: start-up, entry points, and both when memory runs out.
 #include <gtest/gtest.h>
 
+#include <atomic>
 #include <filesystem>
+#include <random>
+#include <sstream>
 #include <stdexcept>
 #include <string>
+#include <thread>
 #include <utility>
 #include <vector>
 
@@ -69,45 +73,46 @@ protected:
 };
 
 TEST_F(EntryPointsTest, ModelRateAndDurationOfASetUp) {
-    const std::string full = "Setting Valto model: full_NC-ca03f4\n";
-    const std::string small = "Setting Valto model: small_NC\n";
-    const std::string smallest = "Setting Valto model: small_NC_8k\n";
-    const auto rate = [](const char* hertz) {
-        return std::string("The input sampling rate ") + hertz +
-               " is not supported; using default: 16000\n";
-    };
-    const auto duration = [](const char* ms) {
-        return std::string("The input frame duration ") + ms +
-               " is not supported; using default: 10\n";
-    };
     struct Case {
         int rateHz, durationMs;
-        const char* choice;
-        std::string lines;
-        unsigned samples;  // of a frame; 0 when no session opens
+        std::string model;  // none: no line at all
+        unsigned samples;   // of a frame; 0 when no session opens
+        bool otherRate = false, otherDuration = false;
+        const char* choice = "";
     };
-    const std::vector<Case> cases{{8000, 10, "", smallest, 80},
-                                  {12000, 20, "", small, 240},
-                                  {16000, 30, "", small, 480},
-                                  {24000, 40, "", full, 960},
-                                  {96000, 10, "", full, 960},
-                                  {48000, 10, "small_NC", small, 480},
-                                  {192000, 10, "", "", 0},
-                                  {22050, 10, "", full + rate("22050"), 160},
-                                  {48000, 25, "", full + duration("25"), 480},
-                                  {48000, 15, "", full, 0},
-                                  {48000, 32, "", full, 0},
-                                  {0, 0, "", smallest + rate("0") + duration("0"), 160}};
-    for (const auto& [rateHz, durationMs, choice, lines, samples] : cases) {
+    const std::vector<Case> cases{{8000, 10, "small_NC_8k", 80},
+                                  {12000, 20, "small_NC", 240},
+                                  {16000, 30, "small_NC", 480},
+                                  {24000, 40, "full_NC-ca03f4", 960},
+                                  {96000, 10, "full_NC-ca03f4", 960},
+                                  {48000, 10, "small_NC", 480, false, false, "small_NC"},
+                                  {192000, 10, "", 0},
+                                  {22050, 10, "full_NC-ca03f4", 160, true},
+                                  {48000, 25, "full_NC-ca03f4", 480, false, true},
+                                  {48000, 15, "full_NC-ca03f4", 0},
+                                  {48000, 32, "full_NC-ca03f4", 0},
+                                  {0, 0, "small_NC_8k", 160, true, true}};
+    for (const auto& [rateHz, durationMs, model, samples, otherRate, otherDuration, choice] :
+         cases) {
         SCOPED_TRACE(testing::Message() << rateHz << " Hz, " << durationMs << " ms " << choice);
+        std::ostringstream lines;
+        if (!model.empty()) lines << "Setting Valto model: " << model << '\n';
+        if (otherRate) {
+            lines << "The input sampling rate " << rateHz
+                  << " is not supported; using default: 16000\n";
+        }
+        if (otherDuration) {
+            lines << "The input frame duration " << durationMs
+                  << " is not supported; using default: 10\n";
+        }
         gNcModel = choice;
         testing::internal::CaptureStdout();
         void* const session = ValtoNCSetup(rateHz, durationMs);
-        EXPECT_EQ(testing::internal::GetCapturedStdout(), lines);
+        EXPECT_EQ(testing::internal::GetCapturedStdout(), lines.str());
         EXPECT_EQ(session != nullptr, samples != 0);
         std::vector<short> frame(960);
         EXPECT_EQ(ValtoNCProcess(session, frame.data(), samples, frame.data(), samples),
-                  session == nullptr ? 2 : 0);
+                  samples == 0 ? 2 : 0);
     }
 }
 
@@ -131,9 +136,47 @@ TEST_F(EntryPointsTest, Codes) {
     EXPECT_EQ(ValtoVADReset(detector), -3);
 }
 
+TEST_F(EntryPointsTest, AThreadCleansAsEverWhileOthersListAndSwitchModels) {
+    const auto clean = [](std::atomic<bool>& isSetUp) {
+        void* const cleaner = ValtoNCSetup(48000, 10);
+        void* const detector = ValtoVADSetup(48000, 10);
+        isSetUp = true;
+        std::vector<float> heard;
+        std::mt19937 random(7);
+        for (int n = 0; n < 300; ++n) {
+            std::vector<short> frame(480);
+            for (auto& sample : frame) sample = static_cast<short>(random() % 4096);
+            heard.push_back(ValtoVADProcess(detector, frame.data(), 480));
+            EXPECT_EQ(ValtoNCProcess(cleaner, frame.data(), 480, frame.data(), 480), 0);
+            heard.insert(heard.end(), frame.begin(), frame.end());
+        }
+        EXPECT_EQ(ValtoNCReset(cleaner), 0);
+        EXPECT_EQ(ValtoVADReset(detector), 0);
+        return heard;
+    };
+    std::atomic<bool> isSetUp{false};
+    const auto expected = clean(isSetUp);
+    isSetUp = false;
+    std::vector<float> heard;
+    std::atomic<bool> isDone{false};
+    std::jthread engine([&] {
+        heard = clean(isSetUp);
+        isDone = true;
+    });
+    while (!isSetUp) std::this_thread::yield();
+    do {
+        for (const auto& name : NcModelNames()) {
+            EXPECT_TRUE(ChooseNcModel(name));
+            ValtoNCReset(OpenNcSession(8000, 10, name).session);
+        }
+    } while (!isDone);
+    engine.join();
+    EXPECT_EQ(heard, expected);
+}
+
 // Fails the first, second, ... allocation of `work` until it gets by without reaching it; how often
-// it failed. What `work` has done must be taken back by itself, but for what is made once: a repeated
-// failure at the same place must find that there.
+// it failed. What `work` has done must be taken back by itself, but for what is made once: a
+// repeated failure at the same place must find that there.
 template <class Work>
 int FailEach(Work work) {
     for (int n = 1;; ++n) {

@@ -25,18 +25,18 @@ import { parseArgs } from 'node:util';
 const root = fileURLToPath(new URL('..', import.meta.url));
 const repository = path.join(root, '../..');
 const MODULE = 'native_modules/quorral_valto';
-const { values: options, positionals } = parseArgs({
+const { values: settings, positionals } = parseArgs({
   allowPositionals: true,
   options: {
     build: { type: 'string', default: path.join(repository, 'build/release') },
     sanitizer: { type: 'boolean', default: false },
   },
 });
-const build = path.resolve(options.build);
+const build = path.resolve(settings.build);
 const bin = (name) => path.join(root, 'node_modules', '.bin', name);
 const say = (what) => console.log(`== ${what}`);
-const run = (command, args, settings = {}) =>
-  execFileSync(command, args, { cwd: root, stdio: 'inherit', ...settings });
+const run = (command, args, options = {}) =>
+  execFileSync(command, args, { cwd: root, stdio: 'inherit', ...options });
 
 function pack(folder) {
   const env = { ...process.env, QUORRAL_VALTO_BUILD: path.join(build, 'quorral_valto') };
@@ -85,14 +85,14 @@ function suite(folder) {
   const env = {
     ...process.env,
     QUORRAL_VALTO_TEST_ADDONS: path.join(build, 'test_addons'),
-    ...(options.sanitizer ? sanitizerEnvironment() : {}),
+    ...(settings.sanitizer ? sanitizerEnvironment() : {}),
   };
   return spawnSync(process.execPath, ['--test', ...chosen], { cwd: folder, env, stdio: 'inherit' });
 }
 
 const work = mkdtempSync(path.join(os.tmpdir(), 'quorral-package-'));
 process.on('exit', () => rmSync(work, { recursive: true, force: true }));
-if (!options.sanitizer) {
+if (!settings.sanitizer) {
   say('lint');
   run(bin('biome'), ['check'], { cwd: repository });
 }
@@ -100,11 +100,14 @@ say('pack and install');
 const tarball = pack(work);
 const app = path.join(work, 'app with space');
 install(tarball, app);
-if (!options.sanitizer) {
+if (!settings.sanitizer) {
   say('publint');
   run(bin('publint'), ['run', '--strict', tarball]);
   say('types');
-  run(bin('tsc'), ['--project', path.join(app, MODULE, 'test/types')]);
+  const lib = ['--target', 'es2022', '--lib', 'es2022,dom', '--types', ''];
+  const strict = ['--strict', '--noUncheckedIndexedAccess', '--exactOptionalPropertyTypes'];
+  const options = ['--noEmit', '--module', 'node16', ...lib, ...strict];
+  run(bin('tsc'), [...options, path.join(app, MODULE, 'test/types/usage.mts')]);
 }
 say('suite');
 process.exitCode = suite(app).status ?? 1;

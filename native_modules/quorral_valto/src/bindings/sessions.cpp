@@ -22,8 +22,8 @@ namespace {
 constexpr int kNoNcSession = 2;
 constexpr double kNoVadSession = -4.0;
 
-// What a session holds, 90 to 140 KB as measured. Script's collector is told, since all that it sees of a
-// session is a handle.
+// What a session holds, 90 to 140 KB as measured. Script's collector is told, since all that it
+// sees of a session is a handle.
 constexpr std::int64_t kSessionBytes = 128 * 1024;
 
 struct Session;
