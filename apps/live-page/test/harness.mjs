@@ -11,7 +11,7 @@ import { startServer } from '../server.mjs';
 
 const { WebSocket } = require('ws');
 const recording = new URL('../../../examples/audio/noisy.flac', import.meta.url);
-export const TIMEOUT_MS = 180_000;
+const TIMEOUT_MS = 180_000;
 
 /** A server that ends with the test. */
 export async function serve(t, options) {
@@ -82,16 +82,9 @@ export async function openBrowser(folder) {
     executablePath: findChromium(),
     timeout: TIMEOUT_MS,
     args: [
-      '--no-sandbox',
-      '--disable-gpu',
-      '--disable-quic',
-      '--disable-dev-shm-usage',
-      '--no-first-run',
-      '--disable-background-networking',
-      '--disable-component-update',
-      '--disable-sync',
-      '--use-fake-ui-for-media-stream',
-      '--use-fake-device-for-media-stream',
+      ...['--no-sandbox', '--disable-gpu', '--disable-quic', '--disable-dev-shm-usage'],
+      ...['--no-first-run', '--disable-background-networking', '--disable-component-update'],
+      ...['--use-fake-ui-for-media-stream', '--use-fake-device-for-media-stream'],
       `--use-file-for-fake-audio-capture=${microphone}`,
     ],
   });
