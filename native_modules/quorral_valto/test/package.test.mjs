@@ -15,7 +15,6 @@ import { test } from 'node:test';
 import * as imported from 'quorral_valto';
 import {
   binaryFile,
-  copyBinary,
   copyPackage,
   NC_MODELS,
   repository,
@@ -75,85 +74,75 @@ test('friendly functions', async () => {
   assert.equal(stdout, 'up\n');
 });
 
-test('start-up of the raw module: install paths and weight files that cannot be read', async (t) => {
-  // Each copy has an engine of its own, so one process can try them all.
-  const failed = (code) => `Failed to setup Valto module, error code: ${code}`;
-  const missing = (weight, module) =>
-    `Failed to load Morva weight file: ./${weight} with working directory: ${path.dirname(module)}`;
-  const fine = ['with space', 'J\u00fcrgen \u4f60\u597d', 'a%20b#c?d', "it's", '\uff21\ufffd'];
-  const cases = [...fine, Array(3).fill('d'.repeat(200)).join('/')].map((name) => {
-    return [copyBinary(t, name), ['started'], NC_MODELS, VAD_MODELS];
-  });
-  const beyond = copyBinary(t, 'smile \u{1f600}');
-  cases.push([beyond, [missing(WEIGHTS[0], beyond), failed(-5)], [], []]);
-  const damages = [() => {}, (file) => mkdirSync(file), (file) => symlinkSync('nowhere', file)];
-  for (const [index, weight] of WEIGHTS.entries()) {
-    const module = copyBinary(t);
-    const file = path.join(path.dirname(module), weight);
-    rmSync(file);
-    damages[index % damages.length](file);
-    const lines = [missing(weight, module), failed(-5 - index)];
-    cases.push([module, lines, NC_MODELS.slice(0, index), []]);
-  }
+/** What scripts report that require the packages in these folders, one after the other in one process. */
+async function reports(folders, use, prelude = '') {
   const { stdout } = await run(
-    `(async () => {
-       for (const file of JSON.parse(process.env.FILES)) {
-         const raw = require(file);
-         for (let i = 0; i < 2; ++i) {
-           try { raw._initialize(); console.log('started'); } catch (error) { console.log(error.message); }
-         }
-         for (const list of [raw._getNcModels, raw._getVadModels]) {
-           console.log(JSON.stringify(await new Promise((resolve) => list(resolve))));
+    `${prelude} (async () => {
+       for (const folder of JSON.parse(process.env.FOLDERS)) {
+         try {
+           const valto = require(folder);
+           console.log(JSON.stringify(await (${use})(valto)));
+         } catch ({ code, nativeCode, message }) {
+           console.log(JSON.stringify({ code, nativeCode, message }));
          }
        }
      })();`,
-    { env: { FILES: JSON.stringify(cases.map(([module]) => module)) } },
+    { env: { FOLDERS: JSON.stringify(folders) } },
   );
-  const second = ['Faild to initialize Morva SDK', failed(-4)];
-  const expected = cases.flatMap(([, lines, ...lists]) => {
-    return [...lines, ...second, ...lists.map((list) => JSON.stringify(list))];
-  });
-  assert.deepEqual(stdout.trim().split('\n'), expected);
-});
-
-/** What a script that requires the package in a folder reports: [code, native code, message]. */
-async function report(folder, use, prelude = '') {
-  const { stdout } = await run(
-    `${prelude} try { const valto = require(process.env.MODULE); ${use}; console.log('["fine"]'); } catch (e) {
-      console.log(JSON.stringify([e.code, e.nativeCode, e.message]));
-    }`,
-    { env: { MODULE: folder } },
-  );
-  return JSON.parse(stdout.trim().split('\n').at(-1));
+  return stdout.trim().split('\n');
 }
 
-test('a failed start names its cause', async (t) => {
-  const start = 'try { valto.initialize() } catch { valto.initialize() }'; // the second says it, too
-  const folder = copyPackage(t);
-  const place = (weight) => path.join(folder, 'prebuilds/linux-x64', weight);
+test('start-up: install paths, weight files that cannot be read or used', async (t) => {
+  const within = (folder, file = '') => path.join(folder, 'prebuilds/linux-x64', file);
+  const failed = (code) => `Failed to setup Valto module, error code: ${code}`;
+  const cases = []; // [folder, printed lines, what initialize() throws, models]
+  const fine = ['with space', 'J\u00fcrgen \u4f60\u597d', 'a%20b#c?d', "it's", '\uff21\ufffd'];
+  for (const name of [...fine, Array(3).fill('d'.repeat(200)).join('/')]) {
+    cases.push([copyPackage(t, name), [], null, NC_MODELS]);
+  }
+  const fails = (folder, code, index) => {
+    const line = `Failed to load Morva weight file: ./${WEIGHTS[index]} with working directory: `;
+    const error = { code, nativeCode: -5 - index };
+    cases.push([folder, [line + within(folder)], error, NC_MODELS.slice(0, index)]);
+  };
   for (const [index, weight] of WEIGHTS.entries()) {
-    renameSync(place(weight), place('elsewhere'));
-    const [code, nativeCode, message] = await report(folder, start);
-    assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_MISSING', -5 - index]);
-    assert.ok(message.includes(weight));
-    renameSync(place('elsewhere'), place(weight));
+    const folder = copyPackage(t);
+    rmSync(within(folder, weight));
+    if (index === 1) symlinkSync('nowhere', within(folder, weight));
+    if (index === 2) mkdirSync(within(folder, weight));
+    fails(folder, `ERR_VALTO_WEIGHT_${index === 2 ? 'INVALID' : 'MISSING'}`, index);
   }
-  rmSync(place(WEIGHTS[2]));
-  for (const content of ['', 'RIFF this is no weight file', readFileSync(binaryFile)]) {
-    writeFileSync(place(WEIGHTS[2]), content);
-    const open = 'new valto.NoiseCanceller({ sampleRate: 48000, frameMs: 10 })';
-    assert.equal((await report(folder, `valto.initialize(); ${open}`))[0], 'ERR_VALTO_SESSION');
-  }
-  rmSync(place(WEIGHTS[2]));
-  mkdirSync(place(WEIGHTS[2]));
-  assert.deepEqual((await report(folder, start)).slice(0, 2), ['ERR_VALTO_WEIGHT_INVALID', -7]);
-  const beyond = await report(copyPackage(t, '\u{1f680}'), start);
-  assert.deepEqual(beyond.slice(0, 2), ['ERR_VALTO_PATH', -5]);
+  fails(copyPackage(t, '\u{1f680}'), 'ERR_VALTO_PATH', 0);
+  const use = `async ({ initialize, getNcModels, raw }) => {
+    const attempt = (start) => { try { start(); return null; } catch (error) { return error; } };
+    const [first, second, third] = [initialize, initialize, raw._initialize].map(attempt);
+    if (first?.message !== second?.message) throw new Error('a second attempt names another cause');
+    return [first?.code, first?.nativeCode, third.message, await getNcModels()];
+  }`;
+  const expected = cases.flatMap(([, lines, error, models]) => {
+    const { code = null, nativeCode = null } = error ?? {};
+    const said = [code, nativeCode, failed(-4), models];
+    return [...lines, 'Faild to initialize Morva SDK', JSON.stringify(said)];
+  });
+  assert.deepEqual(
+    await reports(
+      cases.map(([folder]) => folder),
+      use,
+    ),
+    expected,
+  );
+  // Only what holds no weight at all is found out later.
+  const folder = copyPackage(t);
+  rmSync(within(folder, WEIGHTS[2]));
+  writeFileSync(within(folder, WEIGHTS[2]), 'RIFF this is no weight file');
+  const open = 'valto.initialize(); new valto.NoiseCanceller({ sampleRate: 48000, frameMs: 10 });';
+  const lines = await reports([folder], `(valto) => { ${open} }`);
+  assert.equal(JSON.parse(lines.at(-1)).code, 'ERR_VALTO_SESSION');
 });
 
 test('a failed load names platform, tried paths and remedy', async (t) => {
   const expectFailure = async (folder, parts, prelude) => {
-    const [code, , message] = await report(folder, '', prelude);
+    const { code, message } = JSON.parse(await reports([folder], '() => null', prelude));
     assert.equal(code, 'ERR_VALTO_LOAD');
     for (const part of parts) assert.ok(message.includes(part), message);
   };
@@ -168,20 +157,14 @@ test('a failed load names platform, tried paths and remedy', async (t) => {
   await expectFailure(folder, ['linux-x64', file, 'no such file']);
   cpSync(path.join(folder, 'package.json'), file);
   await expectFailure(folder, [file, 'Reinstall']);
-});
 
-test('inside an archive only what lies unpacked beside it is loaded', async (t) => {
-  const folder = copyPackage(t, 'app.asar/node_modules');
-  const [code, , message] = await report(folder, '');
-  assert.equal(code, 'ERR_VALTO_LOAD');
-  for (const part of ['app.asar.unpacked', 'keep the folder "prebuilds"']) {
-    assert.ok(message.includes(part), message);
-  }
+  const archived = copyPackage(t, 'app.asar/node_modules');
+  await expectFailure(archived, ['app.asar.unpacked', 'keep the folder "prebuilds"']);
   // What a packager leaves: scripts in the archive, native files outside of it.
-  const outside = path.join(folder.replace('app.asar', 'app.asar.unpacked'), 'prebuilds');
+  const outside = path.join(archived.replace('app.asar', 'app.asar.unpacked'), 'prebuilds');
   mkdirSync(path.dirname(outside), { recursive: true });
-  renameSync(path.join(folder, 'prebuilds'), outside);
-  assert.deepEqual(await report(folder, 'valto.initialize()'), ['fine']);
+  renameSync(path.join(archived, 'prebuilds'), outside);
+  assert.deepEqual(await reports([archived], '(valto) => valto.getNcModels()'), ['[]']);
 });
 
 test('the example cleans each channel, in step with the original', (t) => {

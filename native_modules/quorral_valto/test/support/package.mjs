@@ -3,7 +3,15 @@
 import assert from 'node:assert/strict';
 import { spawn } from 'node:child_process';
 import { once } from 'node:events';
-import { cpSync, existsSync, mkdirSync, mkdtempSync, rmSync, symlinkSync } from 'node:fs';
+import {
+  cpSync,
+  existsSync,
+  mkdirSync,
+  mkdtempSync,
+  readdirSync,
+  rmSync,
+  symlinkSync,
+} from 'node:fs';
 import { createRequire } from 'node:module';
 import os from 'node:os';
 import path from 'node:path';
@@ -35,24 +43,19 @@ export function temporaryFolder(t) {
   return folder;
 }
 
-/** A copy of the binary beside links to its weights, in a new folder of that name; the copy's path. */
-export function copyBinary(t, name = 'copy', target = path.join(temporaryFolder(t), name)) {
-  mkdirSync(target, { recursive: true });
-  cpSync(binaryDir, target, {
-    recursive: true,
-    filter: (file) => !file.endsWith('.mvw'),
-  });
-  for (const file of WEIGHTS) symlinkSync(path.join(binaryDir, file), path.join(target, file));
-  return path.join(target, 'quorral_valto.node');
-}
-
-/** A copy of the whole package, as it would lie in another node_modules. */
+/** A copy of the whole package, as it would lie in another node_modules; its weights are links. */
 export function copyPackage(t, name = 'copy') {
   const folder = path.join(temporaryFolder(t), name, 'quorral_valto');
   for (const entry of ['package.json', 'index.cjs', 'index.mjs', 'lib']) {
     cpSync(path.join(packageDir, entry), path.join(folder, entry), { recursive: true });
   }
-  copyBinary(t, name, path.join(folder, 'prebuilds/linux-x64'));
+  const target = path.join(folder, 'prebuilds/linux-x64');
+  mkdirSync(target, { recursive: true });
+  for (const file of readdirSync(binaryDir)) {
+    const [from, to] = [binaryDir, target].map((each) => path.join(each, file));
+    if (WEIGHTS.includes(file)) symlinkSync(from, to);
+    else cpSync(from, to);
+  }
   return folder;
 }
 
