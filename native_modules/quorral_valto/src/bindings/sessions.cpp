@@ -24,7 +24,7 @@ constexpr double kNoVadSession = -4.0;
 
 // What a session holds, 90 to 140 KB as measured. Script's collector is told, since all that it
 // sees of a session is a handle.
-constexpr std::int64_t kSessionBytes = 128 * 1024;
+constexpr std::int64_t kSessionBytes = 128'000;
 
 struct Session;
 // The sessions of this thread that script may still hold.
@@ -216,7 +216,8 @@ napi_value WeightFiles(napi_env env) {
     napi_value files = nullptr;
     napi_create_array(env, &files);
     std::uint32_t index = 0;
-    for (const auto& model : HostedModels()) {
+    for (const auto& model : morva::shippedModels) {
+        if (!IsHosted(model)) continue;
         napi_value file = nullptr;
         napi_create_string_utf8(env, model.file, NAPI_AUTO_LENGTH, &file);
         napi_set_element(env, files, index++, file);

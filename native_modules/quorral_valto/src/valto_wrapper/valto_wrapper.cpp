@@ -56,7 +56,8 @@ bool Register(const morva::ShippedModel& model, const std::string& directory) {
 int RegisterShippedModels(const std::string& directory) {
     int code = kFirstWeightMissing;
     try {
-        for (const auto& model : HostedModels()) {
+        for (const auto& model : morva::shippedModels) {
+            if (!IsHosted(model)) continue;
             if (!Register(model, directory)) return code;
             --code;
         }

@@ -2,19 +2,15 @@
 // module. Thread rule: control threads; serialised by the models lock.
 #pragma once
 
-#include <ranges>
-
 #include "native/node_api/optional.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/cpu_features.h"
 #include "shipped_models.h"
 
 namespace quorral {
 
-// The shipped models that a host is offered, in the order of their registration.
-inline auto HostedModels() {
-    return std::views::filter(morva::shippedModels, [](const morva::ShippedModel& model) {
-        return model.kind != morva::ShippedKind::NoiseDB;
-    });
+// Which of the shipped models a host is offered.
+constexpr bool IsHosted(const morva::ShippedModel& model) {
+    return model.kind != morva::ShippedKind::NoiseDB;
 }
 
 // 0 on success; -1 no SSE 4.1, -2 no AVX2, -4 the engine cannot be created (or exists already),
