@@ -1,5 +1,6 @@
 # The one list of shipped models, models/shipped.json, for C++: the header shipped_models.h, found through
-# the target morva_shipped_models. Fields of a row, which follows the order of registration:
+# the target morva_shipped_models. For CMake: MORVA_NC_FILES, MORVA_VAD_FILES, MORVA_NoiseDB_FILES.
+# Fields of a row, which follows the order of registration:
 #   file            weight file in models/
 #   name            what a host registers it as
 #   kind            NC, VAD or NoiseDB, as in the names of the C interface
@@ -11,10 +12,14 @@ file(READ ${list} json)
 string(JSON count LENGTH "${json}")
 math(EXPR last "${count} - 1")
 set(MORVA_SHIPPED_ROWS "")
+foreach(kind NC VAD NoiseDB)
+    set(MORVA_${kind}_FILES "")
+endforeach()
 foreach(index RANGE ${last})
     foreach(field file name kind rate maxSampleRate)
         string(JSON ${field} GET "${json}" ${index} ${field})
     endforeach()
+    list(APPEND MORVA_${kind}_FILES ${file})
     string(APPEND MORVA_SHIPPED_ROWS
            "    ShippedModel{\"${file}\", \"${name}\", ShippedKind::${kind}, ${rate}, ${maxSampleRate}},\n")
 endforeach()

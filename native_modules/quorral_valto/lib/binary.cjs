@@ -16,8 +16,10 @@ function candidates() {
   const root = path.join(__dirname, '..');
   // Inside an archive it is not looked for: Electron would load a copy, far from the weight files.
   const packaged = outsideArchive(path.join(root, 'prebuilds', target, FILE));
-  const built = path.join(root, '..', '..', 'build', 'release', 'quorral_valto', FILE);
-  return [packaged, built];
+  // Only a checkout of this project has the build's own file; elsewhere "../../build" is the host
+  // application's.
+  if (!fs.existsSync(path.join(root, 'CMakeLists.txt'))) return [packaged];
+  return [packaged, path.join(root, '../../build/release/quorral_valto', FILE)];
 }
 
 function isMusl() {

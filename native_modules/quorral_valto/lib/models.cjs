@@ -5,19 +5,14 @@ const fs = require('node:fs');
 const path = require('node:path');
 const { ValtoError } = require('./errors.cjs');
 
-// Start-up codes -5 to -8 name the weight file that could not be registered.
-const WEIGHTS = {
-  '-5': 'NC_small_8k.mvw',
-  '-6': 'NC_small_16k.mvw',
-  '-7': 'c6.xs.f.ca03f4.mvw',
-  '-8': 'VAD_weight.mvw',
-};
+// Start-up codes from here down name the weight file that could not be registered.
+const FIRST_WEIGHT = -5;
 
-function startupError(nativeCode, directory) {
+function startupError(nativeCode, directory, weightFiles) {
   const fail = (code, message) => new ValtoError(code, message, { nativeCode });
   if (nativeCode === -1) return fail('ERR_VALTO_CPU', 'The processor does not support SSE 4.1');
   if (nativeCode === -2) return fail('ERR_VALTO_CPU', 'The processor does not support AVX2');
-  const weight = WEIGHTS[nativeCode];
+  const weight = weightFiles[FIRST_WEIGHT - nativeCode];
   if (weight === undefined) return fail('ERR_VALTO_ENGINE', 'The engine could not be created');
   const file = path.join(directory, weight);
   if (/[\u{10000}-\u{10FFFF}]/u.test(directory)) {
@@ -52,7 +47,7 @@ function createModelFunctions({ raw, sessions, directory }) {
   return {
     initialize() {
       const code = sessions.initialize();
-      if (code !== 0) throw startupError(code, directory);
+      if (code !== 0) throw startupError(code, directory, sessions.weightFiles);
     },
     getNcModels: () => new Promise((resolve) => raw._getNcModels(resolve)),
     getVadModels: () => new Promise((resolve) => raw._getVadModels(resolve)),

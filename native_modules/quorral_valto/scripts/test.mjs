@@ -1,5 +1,6 @@
-// Tests the package as its users get it: packed, installed into an empty folder without scripts, then
-// the whole suite from there. Before that the checks of the sources: lint, publint, types.
+// Tests the package as its users get it, and the live page on top of it: packed, installed without scripts
+// into an empty folder that has the layout of this repository, then all suites from there. Before that the
+// checks of the sources: lint, publint, types.
 //
 //   node scripts/test.mjs [--build <folder of a preset>] [--sanitizer] [test files]
 //
@@ -11,6 +12,7 @@ import {
   mkdirSync,
   mkdtempSync,
   readdirSync,
+  renameSync,
   rmSync,
   symlinkSync,
   writeFileSync,
@@ -21,18 +23,20 @@ import { fileURLToPath } from 'node:url';
 import { parseArgs } from 'node:util';
 
 const root = fileURLToPath(new URL('..', import.meta.url));
-const { values: options, positionals } = parseArgs({
+const repository = path.join(root, '../..');
+const MODULE = 'native_modules/quorral_valto';
+const { values: settings, positionals } = parseArgs({
   allowPositionals: true,
   options: {
-    build: { type: 'string', default: path.join(root, '../../build/release') },
+    build: { type: 'string', default: path.join(repository, 'build/release') },
     sanitizer: { type: 'boolean', default: false },
   },
 });
-const build = path.resolve(options.build);
+const build = path.resolve(settings.build);
 const bin = (name) => path.join(root, 'node_modules', '.bin', name);
 const say = (what) => console.log(`== ${what}`);
-const run = (command, args, settings = {}) =>
-  execFileSync(command, args, { cwd: root, stdio: 'inherit', ...settings });
+const run = (command, args, options = {}) =>
+  execFileSync(command, args, { cwd: root, stdio: 'inherit', ...options });
 
 function pack(folder) {
   const env = { ...process.env, QUORRAL_VALTO_BUILD: path.join(build, 'quorral_valto') };
@@ -45,18 +49,19 @@ function pack(folder) {
 }
 
 function install(tarball, folder) {
-  mkdirSync(folder);
-  writeFileSync(path.join(folder, 'package.json'), '{ "private": true }\n');
+  const inside = (...parts) => path.join(folder, ...parts);
+  mkdirSync(inside('native_modules'), { recursive: true });
+  writeFileSync(inside('package.json'), '{ "private": true }\n');
   const quiet = ['--silent', '--no-audit', '--no-fund', '--offline'];
   run('npm', ['install', '--ignore-scripts', ...quiet, tarball], { cwd: folder });
-  cpSync(path.join(root, 'test'), path.join(folder, 'test'), { recursive: true });
-  for (const example of ['node/denoise.mjs', 'audio/noisy.flac']) {
-    cpSync(path.join(root, '../../examples', example), path.join(folder, path.basename(example)));
+  renameSync(inside('node_modules/quorral_valto'), inside(MODULE));
+  symlinkSync(inside(MODULE), inside('node_modules/quorral_valto'));
+  const around = [`${MODULE}/test`, 'apps/live-page', 'models/shipped.json'];
+  for (const each of [...around, 'examples/node/denoise.mjs', 'examples/audio/noisy.flac']) {
+    cpSync(path.join(repository, each), inside(each), { recursive: true });
   }
-  // The live page, which is no part of the package, and what it and its tests call.
-  cpSync(path.join(root, 'demo'), path.join(folder, 'demo'), { recursive: true });
   for (const name of ['ws', 'playwright-core']) {
-    symlinkSync(path.join(root, 'node_modules', name), path.join(folder, 'node_modules', name));
+    symlinkSync(path.join(root, 'node_modules', name), inside('node_modules', name));
   }
 }
 
@@ -72,32 +77,37 @@ function sanitizerEnvironment() {
 }
 
 function suite(folder) {
-  const all = readdirSync(path.join(folder, 'test')).filter((name) => name.endsWith('.test.mjs'));
-  const wanted = positionals.length === 0 ? all : positionals.map((file) => path.basename(file));
+  const files = [`${MODULE}/test`, 'apps/live-page/test']
+    .flatMap((tests) => readdirSync(path.join(folder, tests)).map((name) => `${tests}/${name}`))
+    .filter((file) => file.endsWith('.test.mjs'));
+  const wanted = positionals.map((file) => path.basename(file));
+  const chosen = files.filter((file) => !wanted.length || wanted.includes(path.basename(file)));
   const env = {
     ...process.env,
     QUORRAL_VALTO_TEST_ADDONS: path.join(build, 'test_addons'),
-    ...(options.sanitizer ? sanitizerEnvironment() : {}),
+    ...(settings.sanitizer ? sanitizerEnvironment() : {}),
   };
-  const files = wanted.map((name) => path.join('test', name));
-  return spawnSync(process.execPath, ['--test', ...files], { cwd: folder, env, stdio: 'inherit' });
+  return spawnSync(process.execPath, ['--test', ...chosen], { cwd: folder, env, stdio: 'inherit' });
 }
 
 const work = mkdtempSync(path.join(os.tmpdir(), 'quorral-package-'));
 process.on('exit', () => rmSync(work, { recursive: true, force: true }));
-if (!options.sanitizer) {
+if (!settings.sanitizer) {
   say('lint');
-  run(bin('biome'), ['check', '.']);
+  run(bin('biome'), ['check'], { cwd: repository });
 }
 say('pack and install');
 const tarball = pack(work);
 const app = path.join(work, 'app with space');
 install(tarball, app);
-if (!options.sanitizer) {
+if (!settings.sanitizer) {
   say('publint');
   run(bin('publint'), ['run', '--strict', tarball]);
   say('types');
-  run(bin('tsc'), ['--project', path.join(app, 'test/types')]);
+  const lib = ['--target', 'es2022', '--lib', 'es2022,dom', '--types', ''];
+  const strict = ['--strict', '--noUncheckedIndexedAccess', '--exactOptionalPropertyTypes'];
+  const options = ['--noEmit', '--module', 'node16', ...lib, ...strict];
+  run(bin('tsc'), [...options, path.join(app, MODULE, 'test/types/usage.mts')]);
 }
 say('suite');
 process.exitCode = suite(app).status ?? 1;

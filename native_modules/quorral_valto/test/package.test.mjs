@@ -1,33 +1,57 @@
-// The package as its users see it: import and require, friendly functions, loader failures.
+// The package as its users find it: exports, loader, start-up and what fails in it, the example.
 import assert from 'node:assert/strict';
-import { mkdirSync, renameSync, rmSync, writeFileSync } from 'node:fs';
+import { execFileSync } from 'node:child_process';
+import {
+  cpSync,
+  mkdirSync,
+  readFileSync,
+  renameSync,
+  rmSync,
+  symlinkSync,
+  writeFileSync,
+} from 'node:fs';
 import path from 'node:path';
 import { test } from 'node:test';
 import * as imported from 'quorral_valto';
-import { runClean } from './support/child.mjs';
 import {
   binaryFile,
   copyPackage,
   NC_MODELS,
+  repository,
   require,
+  run,
+  temporaryFolder,
   VAD_MODELS,
   WEIGHTS,
 } from './support/package.mjs';
 
 const required = require('quorral_valto');
-const { ValtoError } = required;
-const coded = (code) => (error) => error instanceof ValtoError && error.code === code;
+const coded = (code) => (error) => error instanceof required.ValtoError && error.code === code;
 
-test('import and require give the same objects', () => {
+test('import and require give the same objects, the file its symbols and no more', () => {
   assert.deepEqual(Object.keys(imported).sort(), Object.keys(required).sort());
   for (const [name, value] of Object.entries(imported)) assert.equal(required[name], value);
   assert.equal(required.raw, require(binaryFile));
+  const show = (...command) => execFileSync(command[0], command.slice(1), { encoding: 'utf8' });
+  const symbols = show('nm', '-D', '--defined-only', binaryFile).match(/\S+$/gm).sort();
+  const sides = ['NC', 'VAD'].flatMap((side) => {
+    return ['Process', 'Reset', 'Setup'].map((each) => `Valto${side}${each}`);
+  });
+  const registration = ['napi_register_module_v1', 'node_api_module_get_api_version_v1'];
+  assert.deepEqual(symbols, [...sides, ...registration]);
+  const dynamic = show('readelf', '-d', binaryFile);
+  const needed = [...dynamic.matchAll(/NEEDED.*\[(.*)\]/g)].map((match) => match[1]);
+  const allowed = /^(lib(c|m|dl|pthread|stdc\+\+|gcc_s|resample|asan|ubsan)\.so|ld-linux)/;
+  assert.deepEqual(
+    needed.filter((name) => !allowed.test(name)),
+    [],
+  );
+  assert.match(dynamic, /NODELETE/);
 });
 
-test('friendly functions', async (t) => {
+test('friendly functions', async () => {
   const { initialize, raw, getNcModels, getVadModels, setNcModel, setVadModel } = required;
   assert.deepEqual(await getNcModels(), []);
-  initialize();
   initialize();
   assert.throws(() => raw._initialize(), { message: /error code: -4$/ });
   initialize();
@@ -36,132 +60,132 @@ test('friendly functions', async (t) => {
   setNcModel(NC_MODELS[0]);
   setNcModel(null);
   setVadModel(VAD_MODELS[0]);
-  assert.throws(() => setNcModel('nobody'), coded('ERR_VALTO_MODEL'));
-  assert.throws(() => setVadModel('nobody'), coded('ERR_VALTO_MODEL'));
-  for (const other of [undefined, 5, {}]) {
-    assert.throws(() => setNcModel(other), coded('ERR_VALTO_ARGUMENT'));
-    assert.throws(() => setVadModel(other), coded('ERR_VALTO_ARGUMENT'));
+  for (const set of [setNcModel, setVadModel]) {
+    assert.throws(() => set('nobody'), coded('ERR_VALTO_MODEL'));
+    for (const other of [undefined, 5, {}]) {
+      assert.throws(() => set(other), coded('ERR_VALTO_ARGUMENT'));
+    }
   }
   assert.throws(() => setVadModel(null), coded('ERR_VALTO_ARGUMENT'));
-
-  await t.test('initialize succeeds where the raw function did, in a worker too', async () => {
-    const { stdout } = await runClean(`
-      loadRaw()._initialize();
-      require(PACKAGE).initialize();
-      startWorker("require(PACKAGE).initialize(); parentPort.postMessage('up');").on('message', console.log);`);
-    assert.equal(stdout, 'up\n');
-  });
+  const { stdout } = await run(`
+    loadRaw()._initialize();
+    require(PACKAGE).initialize();
+    startWorker("require(PACKAGE).initialize(); parentPort.postMessage('up');").on('message', console.log);`);
+  assert.equal(stdout, 'up\n');
 });
 
-const START = `
-  try { require(process.env.MODULE).initialize(); } catch (error) {
-    console.log(JSON.stringify([error.code, error.nativeCode, error.message]));
-  }`;
-async function startFailure(folder) {
-  const { stdout } = await runClean(START + START, { env: { MODULE: folder } });
-  const reports = stdout.split('\n').filter((line) => line.startsWith('['));
-  assert.equal(reports.length, 2);
-  assert.equal(reports[0], reports[1], 'a second attempt names the same cause');
-  return JSON.parse(reports[0]);
-}
-
-test('a failed start names its cause', async (t) => {
-  await t.test('weight missing', async () => {
-    for (const [index, weight] of WEIGHTS.entries()) {
-      const folder = copyPackage(t);
-      rmSync(path.join(folder, 'prebuilds/linux-x64', weight));
-      const [code, nativeCode, message] = await startFailure(folder);
-      assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_MISSING', -5 - index]);
-      assert.ok(message.includes(weight));
-    }
-  });
-  await t.test('weight not readable', async () => {
-    const folder = copyPackage(t);
-    const file = path.join(folder, 'prebuilds/linux-x64', WEIGHTS[2]);
-    rmSync(file);
-    mkdirSync(file);
-    const [code, nativeCode, message] = await startFailure(folder);
-    assert.deepEqual([code, nativeCode], ['ERR_VALTO_WEIGHT_INVALID', -7]);
-    assert.ok(message.includes(WEIGHTS[2]));
-  });
-  await t.test('weight with damaged content: its sessions do not open', async () => {
-    const folder = copyPackage(t);
-    writeFileSync(path.join(folder, 'prebuilds/linux-x64', WEIGHTS[2]), 'nonsense');
-    const { stdout } = await runClean(
-      `const { initialize, NoiseCanceller } = require(process.env.MODULE);
-       initialize();
-       for (const sampleRate of [16000, 48000]) {
-         try { new NoiseCanceller({ sampleRate, frameMs: 10 }); console.log('open'); } catch (error) {
-           console.log(error.code);
+/** What scripts report that require the packages in these folders, one after the other in one process. */
+async function reports(folders, use, prelude = '') {
+  const { stdout } = await run(
+    `${prelude} (async () => {
+       for (const folder of JSON.parse(process.env.FOLDERS)) {
+         try {
+           const valto = require(folder);
+           console.log(JSON.stringify(await (${use})(valto)));
+         } catch ({ code, nativeCode, message }) {
+           console.log(JSON.stringify({ code, nativeCode, message }));
          }
-       }`,
-      { env: { MODULE: folder } },
-    );
-    assert.deepEqual(stdout.match(/^(open|ERR_.*)$/gm), ['open', 'ERR_VALTO_SESSION']);
-  });
-  await t.test('a path that the engine cannot express', async () => {
-    const [code, nativeCode, message] = await startFailure(copyPackage(t, '\u{1f680}'));
-    assert.deepEqual([code, nativeCode], ['ERR_VALTO_PATH', -5]);
-    assert.ok(message.includes('\u{1f680}'));
-  });
-});
-
-const LOAD = `
-  try { require(process.env.MODULE); console.log('loaded'); } catch (error) {
-    console.log(JSON.stringify([error.name, error.code, error.message]));
-  }`;
-async function loadFailure(folder, prelude = '') {
-  const { stdout } = await runClean(prelude + LOAD, { env: { MODULE: folder } });
-  const [name, code, message] = JSON.parse(stdout);
-  assert.deepEqual([name, code], ['ValtoError', 'ERR_VALTO_LOAD']);
-  return message;
+       }
+     })();`,
+    { env: { FOLDERS: JSON.stringify(folders) } },
+  );
+  return stdout.trim().split('\n');
 }
+
+test('start-up: install paths, weight files that cannot be read or used', async (t) => {
+  const within = (folder, file = '') => path.join(folder, 'prebuilds/linux-x64', file);
+  const failed = (code) => `Failed to setup Valto module, error code: ${code}`;
+  const cases = []; // [folder, printed lines, what initialize() throws, models]
+  const fine = ['with space', 'J\u00fcrgen \u4f60\u597d', 'a%20b#c?d', "it's", '\uff21\ufffd'];
+  for (const name of [...fine, Array(3).fill('d'.repeat(200)).join('/')]) {
+    cases.push([copyPackage(t, name), [], null, NC_MODELS]);
+  }
+  const fails = (folder, code, index) => {
+    const line = `Failed to load Morva weight file: ./${WEIGHTS[index]} with working directory: `;
+    const error = { code, nativeCode: -5 - index };
+    cases.push([folder, [line + within(folder)], error, NC_MODELS.slice(0, index)]);
+  };
+  for (const [index, weight] of WEIGHTS.entries()) {
+    const folder = copyPackage(t);
+    rmSync(within(folder, weight));
+    if (index === 1) symlinkSync('nowhere', within(folder, weight));
+    if (index === 2) mkdirSync(within(folder, weight));
+    fails(folder, `ERR_VALTO_WEIGHT_${index === 2 ? 'INVALID' : 'MISSING'}`, index);
+  }
+  fails(copyPackage(t, '\u{1f680}'), 'ERR_VALTO_PATH', 0);
+  const use = `async ({ initialize, getNcModels, raw }) => {
+    const attempt = (start) => { try { start(); return null; } catch (error) { return error; } };
+    const [first, second, third] = [initialize, initialize, raw._initialize].map(attempt);
+    if (first?.message !== second?.message) throw new Error('a second attempt names another cause');
+    return [first?.code, first?.nativeCode, third.message, await getNcModels()];
+  }`;
+  const expected = cases.flatMap(([, lines, error, models]) => {
+    const { code = null, nativeCode = null } = error ?? {};
+    const said = [code, nativeCode, failed(-4), models];
+    return [...lines, 'Faild to initialize Morva SDK', JSON.stringify(said)];
+  });
+  assert.deepEqual(
+    await reports(
+      cases.map(([folder]) => folder),
+      use,
+    ),
+    expected,
+  );
+  // Only what holds no weight at all is found out later.
+  const folder = copyPackage(t);
+  rmSync(within(folder, WEIGHTS[2]));
+  writeFileSync(within(folder, WEIGHTS[2]), 'RIFF this is no weight file');
+  const open = 'valto.initialize(); new valto.NoiseCanceller({ sampleRate: 48000, frameMs: 10 });';
+  const lines = await reports([folder], `(valto) => { ${open} }`);
+  assert.equal(JSON.parse(lines.at(-1)).code, 'ERR_VALTO_SESSION');
+});
 
 test('a failed load names platform, tried paths and remedy', async (t) => {
+  const expectFailure = async (folder, parts, prelude) => {
+    const { code, message } = JSON.parse(await reports([folder], '() => null', prelude));
+    assert.equal(code, 'ERR_VALTO_LOAD');
+    for (const part of parts) assert.ok(message.includes(part), message);
+  };
   const folder = copyPackage(t);
   const file = path.join(folder, 'prebuilds/linux-x64/quorral_valto.node');
+  const windows = "Object.defineProperty(process, 'platform', { value: 'win32' });";
+  await expectFailure(folder, ['win32-x64', 'Only linux-x64'], windows);
+  // A file of the host application's own that the loader has no business with.
+  const foreign = path.join(folder, '../../build/release/quorral_valto');
+  mkdirSync(path.dirname(foreign), { recursive: true });
+  renameSync(path.dirname(file), foreign);
+  await expectFailure(folder, ['linux-x64', file, 'no such file']);
+  cpSync(path.join(folder, 'package.json'), file);
+  await expectFailure(folder, [file, 'Reinstall']);
 
-  await t.test('damaged binary', async () => {
-    writeFileSync(file, 'not a module');
-    const message = await loadFailure(folder);
-    for (const part of ['linux-x64', file, 'Reinstall']) assert.ok(message.includes(part), message);
-  });
-  await t.test('no binary', async () => {
-    rmSync(file);
-    const message = await loadFailure(folder);
-    for (const part of ['linux-x64', file, 'no such file'])
-      assert.ok(message.includes(part), message);
-  });
-  await t.test('another platform', async () => {
-    const message = await loadFailure(
-      folder,
-      "Object.defineProperty(process, 'platform', { value: 'win32' });",
-    );
-    assert.match(message, /win32-x64/);
-    assert.match(message, /Only linux-x64/);
-  });
-});
-
-test('inside an archive the unpacked copy is loaded', async (t) => {
-  const folder = copyPackage(t, 'app.asar/node_modules');
-  const prebuilds = path.join(folder, 'prebuilds');
-  const unpacked = copyPackage(t, 'elsewhere');
-  const target = folder.replace('app.asar', 'app.asar.unpacked');
+  const archived = copyPackage(t, 'app.asar/node_modules');
+  await expectFailure(archived, ['app.asar.unpacked', 'keep the folder "prebuilds"']);
   // What a packager leaves: scripts in the archive, native files outside of it.
-  rmSync(prebuilds, { recursive: true });
-  rmSync(path.join(unpacked, 'lib'), { recursive: true });
-  mkdirSync(path.dirname(target), { recursive: true });
-  renameSync(unpacked, target);
-  const { stdout } = await runClean(
-    `const valto = require(process.env.MODULE); valto.initialize();
-     valto.getNcModels().then((names) => console.log(names.length));`,
-    { env: { MODULE: folder } },
-  );
-  assert.equal(stdout, '3\n');
+  const outside = path.join(archived.replace('app.asar', 'app.asar.unpacked'), 'prebuilds');
+  mkdirSync(path.dirname(outside), { recursive: true });
+  renameSync(path.join(archived, 'prebuilds'), outside);
+  assert.deepEqual(await reports([archived], '(valto) => valto.getNcModels()'), ['[]']);
 });
 
-test('a native file that stayed inside an archive is not loaded from there', async (t) => {
-  const message = await loadFailure(copyPackage(t, 'app.asar/node_modules'));
-  for (const part of ['app.asar.unpacked', 'keep the folder "prebuilds"'])
-    assert.ok(message.includes(part), message);
+test('the example cleans each channel, in step with the original', (t) => {
+  const cwd = temporaryFolder(t);
+  const sox = (...args) => execFileSync('sox', args, { cwd, env: { PATH: process.env.PATH } });
+  const recording = path.join(repository, 'examples/audio/noisy.flac');
+  sox(recording, '-b', '16', 'noisy.wav', 'remix', '1', '0'); // silence on the right
+  const program = path.join(repository, 'examples/node/denoise.mjs');
+  const example = (...files) =>
+    execFileSync(process.execPath, [program, ...files], { cwd, stdio: 'pipe' });
+  assert.match(`${example('noisy.wav', 'clean.wav')}`, /clean\.wav: 10\.0 s cleaned/);
+  const [noisy, clean] = ['noisy.wav', 'clean.wav'].map((name) => {
+    const bytes = readFileSync(path.join(cwd, name));
+    return new Int16Array(
+      bytes.buffer.slice(bytes.byteOffset + 44, bytes.byteOffset + bytes.length),
+    );
+  });
+  assert.equal(clean.length, noisy.length);
+  assert.ok(clean.every((sample, i) => i % 2 === 0 || sample === 0));
+  const product = (a, b) => a.reduce((sum, sample, i) => sum + sample * b[i], 0);
+  assert.ok(product(clean, noisy) > 0.7 * Math.sqrt(product(clean, clean) * product(noisy, noisy)));
+  assert.ok(product(clean, clean) < 0.9 * product(noisy, noisy));
+  assert.throws(() => example(program, 'clean.wav'), /no chunk "fmt "/);
 });

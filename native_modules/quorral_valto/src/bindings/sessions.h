@@ -12,9 +12,12 @@
 //   processVad(session, input): number          the voice score, negative on failure
 //   latency(session): number                    delay of a noise-cancellation session, in samples
 //   close(session): undefined                   repeated calls do nothing
+//   weightFiles: string[]                       names, in the order of the start-up codes -5, -6,
+//   ...
 // These are for the package's own loader, which checks arguments and words the errors.
 // Thread rule: the thread of the script environment; a session belongs to the environment that
-// opened it and is closed when it is collected.
+// opened it. A session that script has forgotten is closed on the turn of the event loop after its
+// collection, or when the next one is opened.
 #pragma once
 
 #include <node_api.h>

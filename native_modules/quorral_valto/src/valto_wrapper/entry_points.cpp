@@ -11,7 +11,6 @@
 
 #include "morva-sdk/morva-sdk.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
-#include "native_modules/quorral_valto/src/valto_wrapper/process_gate.h"
 
 namespace quorral {
 namespace {
@@ -21,12 +20,6 @@ constexpr int kDefaultRateHz = 16000;
 // 15 and 32 pass here although the engine refuses them: the caller then gets null.
 constexpr std::array kDurationsMs{10, 15, 20, 30, 32, 40};
 constexpr int kDefaultDurationMs = 10;
-
-// What a call returns when the process is ending: the engine's codes for a session it does not
-// know.
-constexpr int kNoSession = 2;
-constexpr int kNothingToClose = -3;
-constexpr float kNoVoiceSession = -4.0F;
 
 MorvaSamplingRate AcceptRate(int rateHz) {
     if (std::ranges::count(kRatesHz, rateHz) == 0) {
@@ -57,11 +50,7 @@ std::string ModelFor(int rateHz) {
 }  // namespace
 }  // namespace quorral
 
-using quorral::ProcessGate;
-
 void* ValtoNCSetup(int samplingRate, int frameDurationMs) {
-    const ProcessGate::Pass pass;
-    if (!pass) return nullptr;
     const std::lock_guard guard(quorral::ModelsLock());
     const std::string model = quorral::ModelFor(samplingRate);
     if (model.empty()) return nullptr;
@@ -74,19 +63,14 @@ void* ValtoNCSetup(int samplingRate, int frameDurationMs) {
 
 int ValtoNCProcess(void* session, const short* input, unsigned int inputSize, short* output,
                    unsigned int outputSize) {
-    const ProcessGate::Pass pass;
-    if (!pass) return quorral::kNoSession;
     return Morva_NC_CleanAmbientNoiseInt16(session, input, inputSize, output, outputSize);
 }
 
 int ValtoNCReset(void* session) {
-    const ProcessGate::Pass pass;
-    return pass ? Morva_NC_CloseSession(session) : quorral::kNothingToClose;
+    return Morva_NC_CloseSession(session);
 }
 
 void* ValtoVADSetup(int samplingRate, int frameDurationMs) {
-    const ProcessGate::Pass pass;
-    if (!pass) return nullptr;
     const std::lock_guard guard(quorral::ModelsLock());
     const MorvaSamplingRate rate = quorral::AcceptRate(samplingRate);
     const MorvaFrameDuration duration = quorral::AcceptDuration(frameDurationMs);
@@ -95,11 +79,9 @@ void* ValtoVADSetup(int samplingRate, int frameDurationMs) {
 }
 
 float ValtoVADProcess(void* session, const short* input, unsigned int inputSize) {
-    const ProcessGate::Pass pass;
-    return pass ? Morva_VAD_FrameInt16(session, input, inputSize) : quorral::kNoVoiceSession;
+    return Morva_VAD_FrameInt16(session, input, inputSize);
 }
 
 int ValtoVADReset(void* session) {
-    const ProcessGate::Pass pass;
-    return pass ? Morva_VAD_CloseSession(session) : quorral::kNothingToClose;
+    return Morva_VAD_CloseSession(session);
 }

@@ -1,8 +1,6 @@
 // Start-up in the order of the printed codes: processor, engine, weight files.
 #include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
 
-#include <array>
-#include <cstdint>
 #include <cstdio>
 #include <exception>
 #include <mutex>
@@ -24,20 +22,6 @@ constexpr int kFirstWeightMissing = -5;
 // The engine runs one thread of the math library per call.
 constexpr unsigned kEngineThreads = 1;
 
-struct ShippedNcModel {
-    const wchar_t* file;
-    const char* name;
-    std::int32_t maxSampleRate;
-};
-
-constexpr std::array kShippedNcModels{
-    ShippedNcModel{L"./NC_small_8k.mvw", "small_NC_8k", 8000},
-    ShippedNcModel{L"./NC_small_16k.mvw", "small_NC", 16000},
-    ShippedNcModel{L"./c6.xs.f.ca03f4.mvw", "full_NC-ca03f4", 96000},
-};
-constexpr const wchar_t* kShippedVadFile = L"./VAD_weight.mvw";
-constexpr const char* kShippedVadModel = "default_VAD";
-
 Optional<int> gInitializeResult;
 
 void PrintLine(const char* line) {
@@ -45,12 +29,26 @@ void PrintLine(const char* line) {
     std::fflush(stdout);
 }
 
-bool RegisterWeight(const wchar_t* file, const std::string& name, const std::string& directory) {
-    if (Morva_SDK_SetModel(file, name.c_str()) == 0) return true;
+bool RegisterWeight(const std::wstring& file, const std::string& name,
+                    const std::string& directory) {
+    if (Morva_SDK_SetModel(file.c_str(), name.c_str()) == 0) return true;
     std::printf("Failed to load Morva weight file: %s with working directory: %s\n",
                 util::ToUTF8(file).c_str(), directory.c_str());
     std::fflush(stdout);
     return false;
+}
+
+bool Register(const morva::ShippedModel& model, const std::string& directory) {
+    const bool isVad = model.kind == morva::ShippedKind::VAD;
+    if (isVad) gVadModel = model.name;
+    const std::wstring file = util::ToUTF16(std::string("./") + model.file);
+    if (!RegisterWeight(file, model.name, directory)) return false;
+    if (isVad) {
+        gVadModels.emplace_back(model.name);
+    } else {
+        gNcModels.push_back({.name = model.name, .maxSampleRate = model.maxRateHz});
+    }
+    return true;
 }
 
 // The result of the registration; the engine exists when this is called. The code counts down with
@@ -58,14 +56,11 @@ bool RegisterWeight(const wchar_t* file, const std::string& name, const std::str
 int RegisterShippedModels(const std::string& directory) {
     int code = kFirstWeightMissing;
     try {
-        for (const auto& shipped : kShippedNcModels) {
-            if (!RegisterWeight(shipped.file, shipped.name, directory)) return code;
-            gNcModels.push_back({.name = shipped.name, .maxSampleRate = shipped.maxSampleRate});
+        for (const auto& model : morva::shippedModels) {
+            if (!IsHosted(model)) continue;
+            if (!Register(model, directory)) return code;
             --code;
         }
-        gVadModel = kShippedVadModel;
-        if (!RegisterWeight(kShippedVadFile, gVadModel, directory)) return code;
-        gVadModels.push_back(gVadModel);
     } catch (const std::bad_alloc&) {
         return code;
     }

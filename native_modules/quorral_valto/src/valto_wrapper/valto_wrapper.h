@@ -4,11 +4,17 @@
 
 #include "native/node_api/optional.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/cpu_features.h"
+#include "shipped_models.h"
 
 namespace quorral {
 
+// Which of the shipped models a host is offered.
+constexpr bool IsHosted(const morva::ShippedModel& model) {
+    return model.kind != morva::ShippedKind::NoiseDB;
+}
+
 // 0 on success; -1 no SSE 4.1, -2 no AVX2, -4 the engine cannot be created (or exists already),
-// -5 to -8 the first to fourth weight file cannot be registered. Each failure but a lack of memory
+// -5 to -8 the first to fourth hosted model cannot be registered. Each failure but a lack of memory
 // prints one line on standard output. What was registered before a failure stays.
 int ValtoInitialize();
 int ValtoInitialize(CpuFeatureQuery query);

@@ -1,60 +1,99 @@
-// Where the package under test lies, copies of its binary for tests that damage it, test modules.
-import { cpSync, existsSync, mkdirSync, mkdtempSync, rmSync } from 'node:fs';
+// Where the package under test and the probe lie, copies for tests that damage them, and scripts that run
+// in a process of their own.
+import assert from 'node:assert/strict';
+import { spawn } from 'node:child_process';
+import { once } from 'node:events';
+import {
+  cpSync,
+  existsSync,
+  mkdirSync,
+  mkdtempSync,
+  readdirSync,
+  rmSync,
+  symlinkSync,
+} from 'node:fs';
 import { createRequire } from 'node:module';
 import os from 'node:os';
 import path from 'node:path';
 import { fileURLToPath } from 'node:url';
 
 export const require = createRequire(import.meta.url);
-const here = path.dirname(fileURLToPath(import.meta.url));
+export const packageDir = fileURLToPath(new URL('../..', import.meta.url));
+export const repository = path.join(packageDir, '../..');
 
-export const testDir = path.join(here, '..');
-export const packageDir = path.dirname(require.resolve('quorral_valto'));
-
-const build = path.resolve(
-  process.env.QUORRAL_VALTO_BUILD ?? path.join(packageDir, '../../build/release/quorral_valto'),
-);
-const packaged = path.join(packageDir, 'prebuilds', 'linux-x64');
-export const binaryDir = existsSync(packaged) ? packaged : build;
+const build = path.join(repository, 'build/release');
+const packaged = path.join(packageDir, 'prebuilds/linux-x64');
+export const binaryDir = existsSync(packaged) ? packaged : path.join(build, 'quorral_valto');
 export const binaryFile = path.join(binaryDir, 'quorral_valto.node');
-
-const addons = process.env.QUORRAL_VALTO_TEST_ADDONS ?? path.join(build, '..', 'test_addons');
-export const enginePath = path.join(addons, 'valto_engine_probe.node');
-export const bindingPath = path.join(addons, 'binding_probe.node');
-export const failingPath = path.join(addons, 'failing', 'quorral_valto.node');
+const addons = process.env.QUORRAL_VALTO_TEST_ADDONS ?? path.join(build, 'test_addons');
+export const probePath = path.join(addons, 'probe.node');
 
 export const underSanitizer = (process.env.LD_PRELOAD ?? '').includes('asan');
 
-export const NC_MODELS = ['small_NC_8k', 'small_NC', 'full_NC-ca03f4'];
-export const VAD_MODELS = ['default_VAD'];
-export const WEIGHTS = [
-  'NC_small_8k.mvw',
-  'NC_small_16k.mvw',
-  'c6.xs.f.ca03f4.mvw',
-  'VAD_weight.mvw',
-];
+const shipped = require('../../../../models/shipped.json');
+const namesOf = (wanted) => shipped.filter(({ kind }) => kind === wanted).map(({ name }) => name);
+export const NC_MODELS = namesOf('NC');
+export const VAD_MODELS = namesOf('VAD');
+export const WEIGHTS = shipped.filter(({ kind }) => kind !== 'NoiseDB').map(({ file }) => file);
 
 /** A fresh folder that is removed when the test ends. */
-export function temporaryFolder(t, name = 'quorral-') {
-  const folder = mkdtempSync(path.join(os.tmpdir(), name));
+export function temporaryFolder(t) {
+  const folder = mkdtempSync(path.join(os.tmpdir(), 'quorral-'));
   t.after(() => rmSync(folder, { recursive: true, force: true }));
   return folder;
 }
 
-/** A copy of the binary with its weights in a folder of the given name; the path of the module. */
-export function copyBinary(t, name = 'copy') {
-  const folder = path.join(temporaryFolder(t), name);
-  mkdirSync(folder, { recursive: true });
-  cpSync(binaryDir, folder, { recursive: true });
-  return path.join(folder, 'quorral_valto.node');
-}
-
-/** A copy of the whole package, as it would lie in another node_modules. */
+/** A copy of the whole package, as it would lie in another node_modules; its weights are links. */
 export function copyPackage(t, name = 'copy') {
   const folder = path.join(temporaryFolder(t), name, 'quorral_valto');
   for (const entry of ['package.json', 'index.cjs', 'index.mjs', 'lib']) {
     cpSync(path.join(packageDir, entry), path.join(folder, entry), { recursive: true });
   }
-  cpSync(binaryDir, path.join(folder, 'prebuilds', 'linux-x64'), { recursive: true });
+  const target = path.join(folder, 'prebuilds/linux-x64');
+  mkdirSync(target, { recursive: true });
+  for (const file of readdirSync(binaryDir)) {
+    const [from, to] = [binaryDir, target].map((each) => path.join(each, file));
+    if (WEIGHTS.includes(file)) symlinkSync(from, to);
+    else cpSync(from, to);
+  }
   return folder;
+}
+
+// What every child finds defined: the package, the raw module, the probe, workers that start with the same
+// names.
+const PRELUDE = `
+const { Worker, parentPort, workerData } = require('node:worker_threads');
+const { once } = require('node:events');
+const { setTimeout: sleep } = require('node:timers/promises');
+const BINARY = ${JSON.stringify(binaryFile)};
+const PACKAGE = ${JSON.stringify(packageDir)};
+const loadRaw = () => require(BINARY);
+const loadProbe = () => require(${JSON.stringify(probePath)});
+const again = (file) => { const m = { exports: {} }; process.dlopen(m, file); return m.exports; };
+const startWorker = (code, options = {}) => new Worker(PRELUDE + code, { eval: true, ...options });
+`;
+const WITH_WORKERS = `const PRELUDE = ${JSON.stringify(PRELUDE)} + 'const PRELUDE = "";';\n`;
+
+// Lines that the engine itself prints while it registers weight files.
+const REGISTRATION =
+  /^(WEIGHT |WARNING weight isn't loaded| weigth file:|Warning Weight name|ERROR )/;
+
+/** { stdout, stderr } of a script that is expected to end with that code; no registration lines. */
+export async function run(script, { execArgv = [], env = {}, code = 0 } = {}) {
+  const child = spawn(
+    process.execPath,
+    [...execArgv, '-e', `'use strict';${WITH_WORKERS}${PRELUDE}${script}`],
+    { env: { ...process.env, ...env }, stdio: ['ignore', 'pipe', 'pipe'], timeout: 120_000 },
+  );
+  const output = { stdout: '', stderr: '' };
+  for (const name of ['stdout', 'stderr']) {
+    child[name].setEncoding('utf8').on('data', (text) => {
+      output[name] += text;
+    });
+  }
+  const ended = await once(child, 'close');
+  assert.deepEqual(ended, [code, null], `${output.stdout}\n${output.stderr}`);
+  assert.doesNotMatch(output.stderr, /Sanitizer|runtime error/);
+  const lines = output.stdout.split('\n').filter((line) => !REGISTRATION.test(line));
+  return { ...output, stdout: lines.join('\n') };
 }

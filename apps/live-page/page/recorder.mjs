@@ -46,7 +46,7 @@ export class Recorder {
     const context = this.#context;
     const microphone = await openMicrophone();
     try {
-      await context.audioWorklet.addModule('worklets.mjs'); // repeated calls load it once
+      await context.audioWorklet.addModule(new URL('worklets.mjs', import.meta.url)); // repeated calls load it once
       await context.resume();
       const source = context.createMediaStreamSource(microphone);
       const capture = new AudioWorkletNode(context, 'capture', { channelCount: 1 });

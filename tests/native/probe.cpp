@@ -1,9 +1,12 @@
-// Test module: the script binding layer driven from native threads and between environments, and
-// with allocations that fail.
+// Test module: the script binding layer driven from native threads and between environments, an
+// audio engine that finds the host module's entry points in the same process, and allocations that
+// fail. Asked for sessions, it is a copy of the host module in which these fail, too.
+#include <dlfcn.h>
 #include <node_api.h>
 
 #include <chrono>
 #include <cstddef>
+#include <cstdint>
 #include <exception>
 #include <mutex>
 #include <new>
@@ -16,29 +19,23 @@
 #include "native/node_api/environment.h"
 #include "native/node_api/native_value.h"
 #include "native/node_api/trampoline.h"
+#include "native_modules/quorral_valto/include/quorral_valto.h"
+#include "native_modules/quorral_valto/src/bindings/sessions.h"
 
 namespace {
 
-using quorral::node_api::BindFunction;
-using quorral::node_api::Callback;
-using quorral::node_api::Environment;
-using quorral::node_api::InvokeCallback;
-using quorral::node_api::NativeValue;
-using quorral::node_api::Object;
-using quorral::node_api::Value;
-using quorral::node_api::WrapCallback;
+using namespace quorral::node_api;
 using Names = std::vector<std::string>;
 
-constexpr int kDeliveries = 100;
-constexpr int kThreads = 4;
+std::string TextOf(const Value& value) {
+    return NativeValue<std::string>::Get(value).value_or("not a string");
+}
 
-// Calls back kDeliveries times from each of several threads with [thread, count].
+// Calls back 100 times from each of 4 threads with [thread, count].
 void DeliverFromThreads(Callback callback) {
-    for (int thread = 0; thread < kThreads; ++thread) {
+    for (int thread = 0; thread < 4; ++thread) {
         std::thread([deliver = WrapCallback<Names>(callback), thread] {
-            for (int i = 0; i < kDeliveries; ++i) {
-                deliver({std::to_string(thread), std::to_string(i)});
-            }
+            for (int i = 0; i < 100; ++i) deliver({std::to_string(thread), std::to_string(i)});
         }).detach();
     }
 }
@@ -71,24 +68,11 @@ void Keep(Callback callback) {
 }
 
 void CallAndDropKept() {
-    std::vector<Callback> kept;
-    {
+    std::thread([] {
         const std::lock_guard guard(gKeptLock);
-        kept.swap(gKept);
-    }
-    std::thread([kept = std::move(kept)]() mutable {
-        for (const auto& callback : kept) InvokeCallback<Names>(callback, {"late"});
-        kept.clear();
+        for (const auto& callback : gKept) InvokeCallback<Names>(callback, {"late"});
+        gKept.clear();
     }).join();
-}
-
-void ThrowTwice() {
-    Environment::Throw("first ", 1);
-    Environment::Throw("second ", 2);
-}
-
-void ThrowNative() {
-    throw std::runtime_error("native failure");
 }
 
 // Answers with the number of environment records in the process.
@@ -96,31 +80,58 @@ void CountEnvironments(Callback callback) {
     InvokeCallback<Names>(callback, {std::to_string(Environment::LiveCount())});
 }
 
-// Throws the text that came in, between brackets: the round trip of a string.
+// Throws the text that came in, between brackets: the round trip of a string. The first error wins.
 void Echo(Value value) {
-    const auto text = NativeValue<std::string>::Get(value);
-    Environment::Throw("[", text.value_or("not a string"), "]");
+    Environment::Throw("[", TextOf(value), "]");
+    Environment::Throw("second ", 2);
 }
 
 // Counts down to the allocation of this thread that fails; 0 when none is to fail.
 thread_local unsigned tFailingAllocation = 0;
 
-// Arms the n-th allocation from now on, n given as text.
+// Arms the n-th allocation from now on, n given as text; throws when the one before has not come.
 void FailAllocation(Value value) {
-    const auto count = NativeValue<std::string>::Get(value);
-    tFailingAllocation = count ? static_cast<unsigned>(std::stoul(*count)) : 0;
-}
-
-// Throws when the armed allocation has not come yet, and disarms it.
-void Disarm() {
-    const bool waiting = tFailingAllocation != 0;
-    tFailingAllocation = 0;
-    if (waiting) Environment::Throw("not reached");
+    const unsigned next = static_cast<unsigned>(std::stoul(TextOf(value)));
+    if (std::exchange(tFailingAllocation, next) != 0) Environment::Throw("not reached");
 }
 
 // The whole way of a result: wrapped callback, queued task, delivery.
 void Deliver(Callback callback) {
     WrapCallback<Names>(std::move(callback))({"one", "two"});
+}
+
+void* gModule = nullptr;
+
+// Finds the loaded module whose path is given.
+void Attach(Value path) {
+    gModule = dlopen(TextOf(path).c_str(), RTLD_NOW | RTLD_NOLOAD);
+    if (gModule == nullptr) throw std::runtime_error("the module is not loaded");
+}
+
+template <class F>
+F Find(const char* name) {
+    return reinterpret_cast<F>(dlsym(gModule, name));
+}
+
+// An audio engine's threads: one opens, feeds and closes voice sessions, both feed a cleaning
+// session, until the process is gone.
+void RunForever() {
+    for (const bool cleansOnly : {false, true}) {
+        std::thread([cleansOnly] {
+            constexpr unsigned kFrame = 480;
+            std::vector<std::int16_t> frame(kFrame);
+            void* const cleaner = Find<ValtoNCSetupFn>("ValtoNCSetup")(48000, 10);
+            for (unsigned n = 0;; ++n) {
+                for (auto& sample : frame) sample = static_cast<std::int16_t>(n++ * 7919U);
+                Find<ValtoNCProcessFn>("ValtoNCProcess")(cleaner, frame.data(), kFrame,
+                                                         frame.data(), kFrame);
+                if (cleansOnly) continue;
+                void* const detector = Find<ValtoVADSetupFn>("ValtoVADSetup")(48000, 10);
+                Find<ValtoVADProcessFn>("ValtoVADProcess")(detector, frame.data(), kFrame);
+                Find<ValtoVADResetFn>("ValtoVADReset")(detector);
+            }
+        }).detach();
+    }
 }
 
 }  // namespace
@@ -138,6 +149,10 @@ void* __wrap__Znwm(std::size_t size) {
 
 NAPI_MODULE_INIT() {
     try {
+        if (const napi_value sessions = quorral::RequestedSessions(env, exports)) {
+            quorral::InstallSessions(env, sessions);
+            return exports;
+        }
         Environment::Initialize(env);
         const Object target(exports);
         BindFunction(target, "deliverFromThreads", DeliverFromThreads);
@@ -145,13 +160,12 @@ NAPI_MODULE_INIT() {
         BindFunction(target, "deliverForever", DeliverForever);
         BindFunction(target, "keep", Keep);
         BindFunction(target, "callAndDropKept", CallAndDropKept);
-        BindFunction(target, "throwTwice", ThrowTwice);
-        BindFunction(target, "throwNative", ThrowNative);
         BindFunction(target, "countEnvironments", CountEnvironments);
         BindFunction(target, "echo", Echo);
         BindFunction(target, "failAllocation", FailAllocation);
-        BindFunction(target, "disarm", Disarm);
         BindFunction(target, "deliver", Deliver);
+        BindFunction(target, "attach", Attach);
+        BindFunction(target, "runForever", RunForever);
     } catch (const std::exception& failure) {
         napi_throw_error(env, nullptr, failure.what());
     }

@@ -5,10 +5,9 @@ const FADE_SECONDS = 0.015;
 
 function audioBuffer(context, samples, rate) {
   const buffer = context.createBuffer(1, Math.max(1, samples.length), rate);
-  buffer.copyToChannel(
-    Float32Array.from(samples, (sample) => sample / 32768),
-    0,
-  );
+  const channel = buffer.getChannelData(0);
+  // A plain loop: one callback a sample holds up the page for seconds.
+  for (let i = 0; i < samples.length; ++i) channel[i] = samples[i] / 32768;
   return buffer;
 }
 

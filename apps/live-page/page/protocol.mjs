@@ -1,21 +1,23 @@
-// What page and server say to each other over the WebSocket; both import this file.
+// What the page and whatever cleans its sound say to each other, over a WebSocket or otherwise; both
+// import this file.
 //
 // Text messages are JSON objects with a `type`:
-//   page -> server   start { stream, sampleRate, model }   a new sound; replaces the one that runs
+//   page -> engine   start { stream, sampleRate, model }   a new sound; replaces the one that runs
 //                    model { name }                        another model from the next frame on
 //                    stop                                  no more sound; the tail comes back
-//   server -> page   hello { models, sampleRates, maxSeconds, hasExample }
+//   engine -> page   hello { models, sampleRates, maxSeconds, example }
+//                    models: { name, rate } each; example: address of a recording, or null
 //                    started { stream, latency }           delay in samples that is taken out
 //                    model { stream, name }                the new model is in use
 //                    done { stream, samples }              everything has come back
 //                    error { code, message }               the connection closes after it
-// Binary messages: to the server 16-bit mono samples; to the page a result as laid out below. Cleaned
+// Binary messages: to the engine 16-bit mono samples; to the page a result as laid out below. Cleaned
 // samples are in step with what went in: the n-th sample back belongs to the n-th sample sent.
 
 /** Frame that the meters refer to, milliseconds. */
 export const FRAME_MS = 10;
 
-/** Most bytes that the server takes in one message. */
+/** Most bytes that the other side takes in one message. */
 export const MAX_MESSAGE_BYTES = 256 * 1024;
 
 const HEADER_BYTES = 12;

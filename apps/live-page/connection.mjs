@@ -34,18 +34,19 @@ function parse(text) {
 export class Connection {
   #socket;
   #worker;
-  #hasExample;
+  #example;
   #hello = null;
   #underWay = 0;
   #samplesLeft = 0;
   #running = false;
 
-  constructor(socket, { hasExample }) {
+  /** @param {string | null} example address of the recording that the page offers */
+  constructor(socket, example) {
     this.#socket = socket;
-    this.#hasExample = hasExample;
+    this.#example = example;
     this.#worker = new Worker(new URL('./session-worker.mjs', import.meta.url));
     this.#worker.on('message', (message) => this.#fromWorker(message));
-    this.#worker.on('error', (error) => this.#fail('ERR_DEMO_WORKER', error.message));
+    this.#worker.on('error', (error) => this.#fail('ERR_LIVE_WORKER', error.message));
     socket.on('message', (data, isBinary) => this.#fromPage(data, isBinary));
     socket.on('error', () => {}); // followed by 'close'
     socket.on('close', () => this.#worker.terminate());
@@ -79,23 +80,26 @@ export class Connection {
   }
 
   #command(message) {
-    const { models, sampleRates } = this.#hello;
     if (message.type === 'start') {
       const { stream, sampleRate, model } = message;
       requireThat(Number.isInteger(stream) && stream >= 0 && stream < 2 ** 32, 'bad stream');
-      requireThat(sampleRates.includes(sampleRate), 'no such sampling rate');
-      requireThat(models.includes(model), 'no such model');
+      requireThat(this.#hello.sampleRates.includes(sampleRate), 'no such sampling rate');
+      requireThat(this.#knows(model), 'no such model');
       this.#running = true;
       this.#samplesLeft = MAX_SECONDS * sampleRate;
       return { type: 'start', stream, sampleRate, model };
     }
     if (message.type === 'model') {
-      requireThat(models.includes(message.name), 'no such model');
+      requireThat(this.#knows(message.name), 'no such model');
       return { type: 'model', name: message.name };
     }
     requireThat(message.type === 'stop', 'no such message type');
     this.#running = false;
     return { type: 'stop' };
+  }
+
+  #knows(model) {
+    return this.#hello.models.some(({ name }) => name === model);
   }
 
   #toWorker(message) {
@@ -107,7 +111,7 @@ export class Connection {
   #fromWorker(message) {
     if (message.kind === 'ready') {
       const { models, sampleRates } = message;
-      this.#hello = { models, sampleRates, maxSeconds: MAX_SECONDS, hasExample: this.#hasExample };
+      this.#hello = { models, sampleRates, maxSeconds: MAX_SECONDS, example: this.#example };
       this.#send(JSON.stringify({ type: 'hello', ...this.#hello }));
     } else if (message.kind === 'bytes') {
       // Counted until it has left, so that a page that does not read is not read either.

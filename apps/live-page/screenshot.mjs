@@ -1,14 +1,14 @@
-// Takes the picture of the live page for the documents: npm run demo:screenshot -- FILE.png
+// Takes the picture of the live page for the documents: node apps/live-page/screenshot.mjs FILE.png
 // A headless browser opens the bundled recording and stops in the middle of listening to it.
 import { execFileSync } from 'node:child_process';
 import { mkdtempSync, rmSync, writeFileSync } from 'node:fs';
 import os from 'node:os';
 import path from 'node:path';
-import { findChromium, openBrowser, openPage } from '../test/support/browser.mjs';
-import { startDemo } from './server.mjs';
+import { startServer } from './server.mjs';
+import { findChromium, openBrowser, openPage } from './test/harness.mjs';
 
 const [target] = process.argv.slice(2);
-if (!target) throw new Error('usage: npm run demo:screenshot -- FILE.png');
+if (!target) throw new Error('usage: node apps/live-page/screenshot.mjs FILE.png');
 if (findChromium() === null) throw new Error('No Chromium found: set CHROMIUM or install it.');
 
 // A picture of noise hardly shrinks; 256 colours, undithered, are a third of the size.
@@ -21,9 +21,9 @@ picture.save(sys.argv[1], optimize=True)
 
 const folder = mkdtempSync(path.join(os.tmpdir(), 'quorral-page-'));
 const browser = await openBrowser(folder);
-const demo = await startDemo();
+const server = await startServer();
 try {
-  const { page } = await openPage(browser, demo.url, { colorScheme: 'light' });
+  const { page } = await openPage(browser, server.url, { colorScheme: 'light' });
   await page.click('#example');
   await page.locator('#save:enabled').waitFor();
   // A place between the two sentences would show little: in the middle of a word.
@@ -35,6 +35,6 @@ try {
   console.log(`${target} written`);
 } finally {
   await browser.close();
-  await demo.close();
+  await server.close();
   rmSync(folder, { recursive: true });
 }

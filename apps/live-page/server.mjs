@@ -1,20 +1,22 @@
-// The live page's server: node demo/server.mjs [--port N] [--open]
+// The live page's server: node apps/live-page/server.mjs [--port N] [--open]
 // Listens on the loopback interface only, serves a fixed list of files, and takes WebSocket connections
 // from its own page alone.
 import { spawn } from 'node:child_process';
-import { existsSync, readFileSync } from 'node:fs';
+import { existsSync, readdirSync, readFileSync } from 'node:fs';
 import { createServer } from 'node:http';
 import path from 'node:path';
 import { fileURLToPath } from 'node:url';
 import { parseArgs } from 'node:util';
-import { WebSocketServer } from 'ws';
 import { Connection } from './connection.mjs';
+import { require } from './dependencies.mjs';
 import { MAX_MESSAGE_BYTES } from './page/protocol.mjs';
 
+const { WebSocketServer } = require('ws');
 const HOST = '127.0.0.1';
 const MAX_CONNECTIONS = 8;
 const here = fileURLToPath(new URL('.', import.meta.url));
-const bundledExample = path.join(here, '../../../examples/audio/noisy.flac');
+const recording = path.join(here, '../../examples/audio/noisy.flac');
+const EXAMPLE = '/example.flac';
 
 const TYPES = {
   '.html': 'text/html; charset=utf-8',
@@ -22,23 +24,6 @@ const TYPES = {
   '.mjs': 'text/javascript; charset=utf-8',
   '.svg': 'image/svg+xml',
 };
-const PAGE = [
-  'index.html',
-  'style.css',
-  'icon.svg',
-  'main.mjs',
-  'audio-files.mjs',
-  'link.mjs',
-  'picture.mjs',
-  'player.mjs',
-  'protocol.mjs',
-  'recorder.mjs',
-  'spectra.mjs',
-  'strip.mjs',
-  'take.mjs',
-  'view.mjs',
-  'worklets.mjs',
-];
 const HEADERS = {
   'Content-Security-Policy':
     "default-src 'none'; script-src 'self'; style-src 'self'; img-src 'self'; connect-src 'self'; " +
@@ -49,15 +34,15 @@ const HEADERS = {
 };
 
 /** Everything that can be asked for, by its exact address, as it was when the server started. */
-function readFiles(example) {
+function readFiles() {
   const files = new Map();
-  for (const name of PAGE) {
+  for (const name of readdirSync(path.join(here, 'page'))) {
     const body = readFileSync(path.join(here, 'page', name));
     files.set(`/${name}`, { body, type: TYPES[path.extname(name)] });
   }
   files.set('/', files.get('/index.html'));
-  if (existsSync(example)) {
-    files.set('/example.flac', { body: readFileSync(example), type: 'audio/flac' });
+  if (existsSync(recording)) {
+    files.set(EXAMPLE, { body: readFileSync(recording), type: 'audio/flac' });
   }
   return files;
 }
@@ -78,13 +63,25 @@ function answer(request, response, files) {
   response.end(request.method === 'HEAD' ? undefined : file.body);
 }
 
+/** What a browser calls this server in `Host`, and in `Origin` behind "http://". */
+export function namesOf(port) {
+  // Left to the address parser, since the usual port is not named.
+  return new Set([HOST, 'localhost'].map((name) => new URL(`http://${name}:${port}`).host));
+}
+
+/** Ends a connection that is not taken. The other side may have gone, or may never close its half. */
+function refuse(socket, status) {
+  socket.on('error', () => {});
+  socket.once('finish', () => socket.destroy());
+  socket.end(`HTTP/1.1 ${status}\r\nConnection: close\r\n\r\n`);
+}
+
 /**
- * @param {{ port?: number, example?: string }} [options] port 0: any free one; `example`: a recording
- *   that the page offers
+ * @param {{ port?: number }} [options] port 0: any free one
  * @returns {Promise<{ url: string, close: () => Promise<void> }>}
  */
-export async function startDemo({ port = 0, example = bundledExample } = {}) {
-  const files = readFiles(example);
+export async function startServer({ port = 0 } = {}) {
+  const files = readFiles();
   const server = createServer();
   const sockets = new WebSocketServer({
     noServer: true,
@@ -95,7 +92,7 @@ export async function startDemo({ port = 0, example = bundledExample } = {}) {
     server.once('error', reject).listen(port, HOST, resolve);
   });
   const bound = server.address().port;
-  const hosts = new Set([`${HOST}:${bound}`, `localhost:${bound}`]);
+  const hosts = namesOf(bound);
 
   server.on('request', (request, response) => {
     // Another name in "Host" is another site's page that had its name pointed here.
@@ -105,13 +102,13 @@ export async function startDemo({ port = 0, example = bundledExample } = {}) {
   server.on('upgrade', (request, socket, head) => {
     const isOurs = hosts.has(request.headers.origin?.replace(/^http:\/\//, ''));
     if (request.url !== '/audio' || !isOurs || !hosts.has(request.headers.host)) {
-      return socket.end('HTTP/1.1 403 Forbidden\r\nConnection: close\r\n\r\n');
+      return refuse(socket, '403 Forbidden');
     }
     if (sockets.clients.size >= MAX_CONNECTIONS) {
-      return socket.end('HTTP/1.1 503 Service Unavailable\r\nConnection: close\r\n\r\n');
+      return refuse(socket, '503 Service Unavailable');
     }
     sockets.handleUpgrade(request, socket, head, (accepted) => {
-      accepted.connection = new Connection(accepted, { hasExample: files.has('/example.flac') });
+      accepted.connection = new Connection(accepted, files.has(EXAMPLE) ? EXAMPLE : null);
     });
   });
 
@@ -143,19 +140,19 @@ function readOptions() {
 async function main() {
   const options = readOptions();
   if (options.help) {
-    console.log('usage: npm run demo -- [--port N] [--open]');
+    console.log('usage: node apps/live-page/server.mjs [--port N] [--open]');
     return;
   }
-  const demo = await startDemo(options);
-  console.log(`Live page: ${demo.url}  (Ctrl+C ends it)`);
+  const running = await startServer(options);
+  console.log(`Live page: ${running.url}  (Ctrl+C ends it)`);
   if (options.open) {
-    spawn('xdg-open', [demo.url], { stdio: 'ignore', detached: true })
+    spawn('xdg-open', [running.url], { stdio: 'ignore', detached: true })
       .on('error', () => console.error('No program opens pages here; open the address yourself.'))
       .unref();
   }
   for (const signal of ['SIGINT', 'SIGTERM']) {
     process.once(signal, async () => {
-      await demo.close();
+      await running.close();
       process.exit(0);
     });
   }

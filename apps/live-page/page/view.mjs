@@ -2,7 +2,7 @@
 // seconds scroll by; otherwise the whole take is shown.
 import { Picture } from './picture.mjs';
 import { FRAME_MS } from './protocol.mjs';
-import { axisPlace } from './spectra.mjs';
+import { axisPlace } from './spectrum.mjs';
 import { Strip } from './strip.mjs';
 
 const LIVE_SECONDS = 10;

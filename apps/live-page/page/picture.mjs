@@ -1,32 +1,6 @@
 // Draws spectra on a canvas: a stretch of time across its width, low frequencies at the bottom.
-import { ROWS } from './spectra.mjs';
+import { COLOURS, ROWS } from './spectrum.mjs';
 
-// Dark to bright with evenly rising lightness, so that it also reads in grey.
-const STOPS = [
-  [10, 12, 32],
-  [42, 24, 92],
-  [104, 32, 130],
-  [176, 50, 122],
-  [232, 92, 86],
-  [252, 160, 78],
-  [254, 220, 128],
-  [255, 252, 226],
-];
-
-function colourTable() {
-  const colours = new Uint32Array(256);
-  for (let i = 0; i < 256; ++i) {
-    const place = (i / 255) * (STOPS.length - 1);
-    const index = Math.min(Math.floor(place), STOPS.length - 2);
-    const [r, g, b] = STOPS[index].map((value, channel) => {
-      return Math.round(value + (STOPS[index + 1][channel] - value) * (place - index));
-    });
-    colours[i] = (255 << 24) | (b << 16) | (g << 8) | r;
-  }
-  return colours;
-}
-
-const COLOURS = colourTable();
 const NOTHING = COLOURS[0];
 
 /** Gives a canvas as many pixels as it covers on the screen. */

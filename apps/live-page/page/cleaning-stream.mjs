@@ -3,8 +3,10 @@
 //
 // Every model has a delay of its own. All are brought to the longest one, so that a change of model does
 // not move the sound, and that delay is taken out of what comes back.
-import { NoiseCanceller, VoiceActivityDetector } from 'quorral_valto';
-import { FRAME_MS } from './page/protocol.mjs';
+//
+// The engine is a parameter: an object with the classes `NoiseCanceller` and `VoiceActivityDetector` of the
+// npm package's shape, wherever it runs.
+import { FRAME_MS } from './protocol.mjs';
 
 const HISTORY_FRAMES = 100; // what a model hears before it takes over
 const SMOOTHING_MS = 1000;
@@ -34,8 +36,8 @@ class DelayedCanceller {
   #session;
   #padding;
 
-  constructor(options, latency) {
-    this.#session = new NoiseCanceller(options);
+  constructor(engine, options, latency) {
+    this.#session = new engine.NoiseCanceller(options);
     this.#padding = new DelayLine(latency - this.#session.latency, this.#session.frameSize);
   }
 
@@ -69,9 +71,9 @@ function crossFade(from, to) {
 }
 
 /** The longest delay among models at a rate, in samples. */
-export function commonLatency(models, sampleRate) {
+function commonLatency(engine, models, sampleRate) {
   const latencies = models.map((model) => {
-    const session = new NoiseCanceller({ sampleRate, frameMs: FRAME_MS, model });
+    const session = new engine.NoiseCanceller({ sampleRate, frameMs: FRAME_MS, model });
     session.close();
     return session.latency;
   });
@@ -79,6 +81,7 @@ export function commonLatency(models, sampleRate) {
 }
 
 export class CleaningStream {
+  #engine;
   #options;
   #current;
   #next = null;
@@ -97,12 +100,13 @@ export class CleaningStream {
    * @param {{ sampleRate: number, model: string, models: string[] }} options `models`: all that
    *   `switchModel` may be asked for
    */
-  constructor({ sampleRate, model, models }) {
+  constructor(engine, { sampleRate, model, models }) {
+    this.#engine = engine;
     this.#options = { sampleRate, frameMs: FRAME_MS };
-    this.latency = commonLatency(models, sampleRate);
+    this.latency = commonLatency(engine, models, sampleRate);
     this.#current = this.#open(model);
     try {
-      this.#detector = new VoiceActivityDetector(this.#options);
+      this.#detector = new engine.VoiceActivityDetector(this.#options);
     } catch (failure) {
       this.#current.close();
       throw failure;
@@ -113,7 +117,7 @@ export class CleaningStream {
   }
 
   #open(model) {
-    return new DelayedCanceller({ ...this.#options, model }, this.latency);
+    return new DelayedCanceller(this.#engine, { ...this.#options, model }, this.latency);
   }
 
   /** Samples taken so far. */

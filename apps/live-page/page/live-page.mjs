@@ -1,27 +1,24 @@
 // The page: what the buttons do, and in which of these states it is.
-//   idle       nothing to hear or save         opening    the microphone is being asked for
+//   idle       nothing to hear or save         opening    a microphone or file is being opened
 //   recording  it runs through the engine      cleaning   the rest, or a whole take, runs through
 //   ready      a take can be heard and saved
+// Where the sound is cleaned is the link's business: `startPage` is given one.
 import { readSoundFile, wavFile } from './audio-files.mjs';
-import { Link } from './link.mjs';
 import { Player } from './player.mjs';
 import { Recorder } from './recorder.mjs';
 import { Take } from './take.mjs';
 import { clock, View } from './view.mjs';
 
 const PREFERRED_RATE = 48000;
-const MODEL_HINTS = {
-  'full_NC-ca03f4': '32 kHz',
-  small_NC: '16 kHz',
-  small_NC_8k: '8 kHz',
-};
+const PIECE_SECONDS = 5; // of a file between two looks at what the person does
 
 const element = (id) => document.getElementById(id);
 const [recordButton, playButton, modelList] = ['record', 'play', 'model'].map(element);
 const [positionSlider, fileInput] = ['position', 'file'].map(element);
 
-const link = new Link();
-let server = null; // what it said in its hello
+/** @type {import('./link.mjs').Link} */
+let link = null;
+let engine = null; // what the link's other side said in its hello
 let sound = null; // { context, recorder, player }, made when first needed
 let take = null;
 let state = 'idle';
@@ -52,11 +49,11 @@ function enter(next) {
   document.body.classList.toggle('recording', state === 'recording');
   element('record-label').textContent = state === 'recording' ? 'Stop' : 'Record';
   element('progress').hidden = state !== 'cleaning';
-  const isUp = server !== null;
+  const isUp = engine !== null;
   recordButton.disabled = !isUp || state === 'cleaning' || state === 'opening';
   const isBusy = state === 'recording' || state === 'opening';
-  for (const id of ['choose', 'example', 'model']) element(id).disabled = !isUp;
-  for (const id of ['choose', 'example']) element(id).disabled ||= isBusy;
+  for (const id of ['choose', 'example']) element(id).disabled = !isUp || isBusy;
+  modelList.disabled = !isUp || state === 'opening';
   const canListen = (sound?.player.duration ?? 0) > 0 && !isBusy;
   for (const button of [playButton, positionSlider]) button.disabled = !canListen;
   for (const id of ['save', 'save-original']) element(id).disabled = state !== 'ready';
@@ -88,7 +85,7 @@ const restingState = () => (take?.isComplete ? 'ready' : 'idle');
 function needSound() {
   if (sound !== null) return sound;
   let context = new AudioContext();
-  if (!server.sampleRates.includes(context.sampleRate)) {
+  if (!engine.sampleRates.includes(context.sampleRate)) {
     context.close();
     context = new AudioContext({ sampleRate: PREFERRED_RATE });
   }
@@ -119,11 +116,11 @@ async function record() {
       if (state !== 'recording') return;
       take.addOriginal(samples);
       link.send(samples);
-      if (take.seconds >= server.maxSeconds - 1) stopRecording();
+      if (take.seconds >= engine.maxSeconds - 1) stopRecording();
     },
     onEnded: stopRecording,
   });
-  if (server === null) return recorder.stop(); // lost while the person was asked
+  if (engine === null) return recorder.stop(); // lost while the person was asked
   beginTake('recording');
   startStream();
   enter('recording');
@@ -152,20 +149,31 @@ async function cleanTake() {
   await link.sendAll(take.before.samples.values);
 }
 
+/** A long sound takes seconds to analyse: in pieces, or the page would stand still. */
+async function addOriginal(whole, samples) {
+  const step = PIECE_SECONDS * whole.rate;
+  for (let at = 0; at < samples.length; at += step) {
+    whole.addOriginal(samples.subarray(at, at + step));
+    await new Promise((resolve) => setTimeout(resolve));
+  }
+}
+
 async function openFile(file, name) {
-  if (state === 'recording' || state === 'opening' || server === null) return;
+  if (state === 'recording' || state === 'opening' || engine === null) return;
   settle();
+  enter('opening');
   say(`Reading ${name} …`);
   const { context } = needSound();
-  const { samples } = await readSoundFile(file, name, context, server.maxSeconds);
+  const { samples } = await readSoundFile(file, name, context, engine.maxSeconds);
   if (samples.length === 0) throw new Error(`"${name}" holds no sound.`);
   beginTake(name);
-  take.addOriginal(samples);
-  await cleanTake();
+  const begun = take;
+  await addOriginal(begun, samples);
+  if (take === begun) await cleanTake();
 }
 
 async function openExample() {
-  const response = await fetch('example.flac');
+  const response = await fetch(engine.example);
   if (!response.ok) throw new Error(`The example cannot be read: ${response.status}`);
   await openFile(await response.blob(), 'example.flac');
 }
@@ -196,49 +204,50 @@ function save(samples, suffix) {
   setTimeout(() => URL.revokeObjectURL(anchor.href), 60_000);
 }
 
-// ---- from the server ----------------------------------------------------------------------------
+// ---- from the engine ----------------------------------------------------------------------------
 
-link.addEventListener('hello', ({ detail }) => {
-  server = detail;
-  const chosen = modelList.value || server.models.at(-1);
-  modelList.replaceChildren(
-    ...server.models.map((name) => {
-      const hint = MODEL_HINTS[name];
-      return new Option(hint ? `${name} · ${hint}` : name, name, false, name === chosen);
-    }),
-  );
-  element('example').hidden = !server.hasExample;
-  settle();
-  if (take === null) say('Ready. Record, drop a file anywhere, or choose one.');
-  enter(state);
-});
+function listen() {
+  link.addEventListener('hello', ({ detail }) => {
+    engine = detail;
+    const chosen = modelList.value || engine.models.at(-1).name;
+    modelList.replaceChildren(
+      ...engine.models.map(({ name, rate }) => {
+        return new Option(`${name} · ${rate / 1000} kHz`, name, false, name === chosen);
+      }),
+    );
+    element('example').hidden = !engine.example;
+    settle();
+    if (take === null) say('Ready. Record, drop a file anywhere, or choose one.');
+    enter(state);
+  });
 
-link.addEventListener('started', ({ detail }) => {
-  showModels();
-  element('latency').textContent = `${((1000 * detail.latency) / take.rate).toFixed(1)} ms`;
-});
+  link.addEventListener('started', ({ detail }) => {
+    showModels();
+    element('latency').textContent = `${((1000 * detail.latency) / take.rate).toFixed(1)} ms`;
+  });
 
-link.addEventListener('model', ({ detail }) => {
-  take.models.push(detail.name);
-  showModels();
-});
+  link.addEventListener('model', ({ detail }) => {
+    take.models.push(detail.name);
+    showModels();
+  });
 
-link.addEventListener('result', ({ detail }) => {
-  take.addResult(detail);
-  if (state === 'recording') sound.recorder.hear(detail.samples);
-  element('progress').value = take.after.samples.length / Math.max(1, take.before.samples.length);
-  view.refresh();
-});
+  link.addEventListener('result', ({ detail }) => {
+    take.addResult(detail);
+    if (state === 'recording') sound.recorder.hear(detail.samples);
+    element('progress').value = take.after.samples.length / Math.max(1, take.before.samples.length);
+    view.refresh();
+  });
 
-link.addEventListener('done', finishTake);
+  link.addEventListener('done', finishTake);
 
-link.addEventListener('lost', ({ detail }) => {
-  if (state === 'recording') sound.recorder.stop();
-  server = null;
-  say('Not connected.');
-  complain(new Error(detail));
-  enter(restingState());
-});
+  link.addEventListener('lost', ({ detail }) => {
+    if (state === 'recording') sound.recorder.stop();
+    engine = null;
+    say('Not connected.');
+    complain(new Error(detail));
+    enter(restingState());
+  });
+}
 
 // ---- from the person ----------------------------------------------------------------------------
 
@@ -297,7 +306,7 @@ for (const input of document.getElementsByName('side')) {
 }
 
 function listenTo(side) {
-  if (server === null && sound === null) return;
+  if (engine === null && sound === null) return;
   needSound().player.listenTo(side);
 }
 
@@ -335,5 +344,10 @@ async function reconnect() {
   if (take !== null && take.seconds > 0 && !take.isComplete) await cleanTake();
 }
 
-showPosition();
-attempt(reconnect)();
+/** @param {import('./link.mjs').Link} given what cleans the sound */
+export function startPage(given) {
+  link = given;
+  listen();
+  showPosition();
+  attempt(reconnect)();
+}

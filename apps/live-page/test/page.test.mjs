@@ -1,0 +1,281 @@
+// The live page in a headless browser whose microphone plays the bundled noisy recording.
+import assert from 'node:assert/strict';
+import { execFileSync } from 'node:child_process';
+import { mkdtempSync, readFileSync, rmSync } from 'node:fs';
+import os from 'node:os';
+import path from 'node:path';
+import { after, before, test } from 'node:test';
+import { findChromium, openBrowser, openPage, serve } from './harness.mjs';
+
+const underSanitizer = (process.env.LD_PRELOAD ?? '').includes('asan');
+const skip =
+  (findChromium() === null && 'no Chromium found: set CHROMIUM or install it') ||
+  (underSanitizer && 'the sanitized module is tested without a browser, by server.test.mjs');
+
+let browser;
+let folder;
+before(async () => {
+  if (skip) return;
+  folder = mkdtempSync(path.join(os.tmpdir(), 'quorral-page-'));
+  browser = await openBrowser(folder);
+});
+after(async () => {
+  await browser?.close();
+  if (folder) rmSync(folder, { recursive: true });
+});
+
+/** A page of its own with a server of its own. */
+async function visit(t, options = {}) {
+  const server = await serve(t);
+  const { page, complaints } = await openPage(browser, server.url, options);
+  t.after(() => page.close());
+  await page.locator('#record:enabled').waitFor();
+  const problem = (hasText) => page.locator('#problem-text', { hasText }).waitFor();
+  return { page, server, complaints, problem };
+}
+
+/** A mono 16-bit WAV file that a button downloads. */
+async function download(page, button) {
+  const [file] = await Promise.all([page.waitForEvent('download'), page.click(button)]);
+  const bytes = readFileSync(await file.path());
+  assert.equal(bytes.toString('latin1', 0, 4), 'RIFF');
+  assert.equal(bytes.readUInt32LE(40), bytes.length - 44);
+  const samples = new Int16Array(
+    bytes.buffer.slice(bytes.byteOffset + 44, bytes.byteOffset + bytes.length),
+  );
+  return { name: file.suggestedFilename(), samples, rate: bytes.readUInt32LE(24) };
+}
+
+/** Waits until a take is finished; what it gives away: { original, cleaned, seconds }. */
+async function finished(page) {
+  await page.locator('#save:enabled').waitFor();
+  const original = await download(page, '#save-original');
+  const cleaned = await download(page, '#save');
+  assert.equal(cleaned.samples.length, original.samples.length);
+  return { original, cleaned, seconds: original.samples.length / original.rate };
+}
+
+/** The page's own figure: the pauses are at least ten decibels quieter. */
+const pausesAreQuiet = async (page) =>
+  assert.match(await page.locator('#pauses').textContent(), /^−[1-5]\d dB$/);
+
+/** A sound file that sox makes. */
+function made(name, channels, options, effects) {
+  const file = path.join(folder, name);
+  const words = `-n ${options} -c ${channels}`.split(' ');
+  execFileSync('sox', [...words, file, ...effects.split(' ')]);
+  return file;
+}
+
+/** Waits until the take has that many seconds. */
+const recorded = (page, seconds) =>
+  page.waitForFunction((least) => {
+    return Number.parseFloat(document.getElementById('length').textContent) > least;
+  }, seconds);
+
+// Tells, per audio context, how loud everything is that reaches the loudspeaker.
+const TAP = `
+  const connect = AudioNode.prototype.connect;
+  AudioNode.prototype.connect = function (target, ...rest) {
+    if (target instanceof AudioDestinationNode) {
+      globalThis.loudspeaker ??= new AnalyserNode(target.context, { fftSize: 8192 });
+      connect.call(this, globalThis.loudspeaker);
+    }
+    return connect.call(this, target, ...rest);
+  };
+  globalThis.loudness = (last = new Float32Array(8192)) => {
+    globalThis.loudspeaker.getFloatTimeDomainData(last);
+    return Math.max(...last.map(Math.abs));
+  };`;
+
+test('a recording comes back cleaner while the meters move; it is heard when asked', {
+  skip,
+}, async (t) => {
+  const { page, complaints } = await visit(t, { prelude: TAP });
+  await page.click('#record');
+  await page.locator('.recording').waitFor();
+  for (const range of ['0.01 0.5', '0.5 1']) {
+    await page.waitForFunction((text) => {
+      const [low, high] = text.split(' ').map(Number);
+      const { value } = document.getElementById('voice');
+      return value > low && value <= high;
+    }, range);
+  }
+  await recorded(page, 3);
+  assert.equal(await page.evaluate(() => globalThis.loudness()), 0);
+  await page.check('#monitor');
+  await page.waitForFunction(() => globalThis.loudness() > 0.01);
+  await page.uncheck('#monitor');
+  await page.waitForFunction(() => globalThis.loudness() === 0);
+  await recorded(page, 6);
+  const noiseLevel = await page.locator('#noise').evaluate((meter) => meter.value);
+  assert.ok(noiseLevel > -60 && noiseLevel < -15, `${noiseLevel} dB`);
+  await page.selectOption('#model', 'small_NC_8k');
+  await page.getByText('then small_NC_8k').waitFor();
+  await page.click('#record');
+  assert.ok((await finished(page)).seconds > 6);
+  await pausesAreQuiet(page);
+  assert.deepEqual(complaints, []);
+});
+
+test('a dropped file comes back cleaned, as long, and drawn; another model cleans it again', {
+  skip,
+}, async (t) => {
+  const { page, complaints } = await visit(t);
+  // As a person would drop it.
+  await page.evaluate(async () => {
+    const bytes = await (await fetch('example.flac')).arrayBuffer();
+    const dataTransfer = new DataTransfer();
+    dataTransfer.items.add(new File([bytes], 'meeting.notes.flac', { type: 'audio/flac' }));
+    for (const type of ['dragover', 'drop']) {
+      document.body.dispatchEvent(new DragEvent(type, { dataTransfer, bubbles: true }));
+    }
+  });
+  const first = await finished(page);
+  assert.equal(first.cleaned.name, 'meeting.notes-cleaned.wav');
+  assert.ok(Math.abs(first.seconds - 10) < 1e-4); // the browser brings it to its own rate
+  await pausesAreQuiet(page);
+  // Drawn with the next refresh of the screen.
+  await page.waitForFunction(() => {
+    const [noisy, cleaned] = ['before', 'after'].map((id) => {
+      const canvas = document.getElementById(id);
+      const { width, height } = canvas;
+      const pixels = canvas.getContext('2d').getImageData(0, 0, width, height).data;
+      return pixels.reduce((sum, value, i) => sum + (i % 4 === 3 ? 0 : value), 0) / width / height;
+    });
+    return cleaned > 60 && noisy > 1.5 * cleaned;
+  });
+
+  await page.click('#play');
+  await page.selectOption('#model', 'small_NC_8k');
+  await page.getByText('cleaned with small_NC_8k').waitFor();
+  const second = await finished(page);
+  assert.deepEqual(second.original.samples, first.original.samples);
+  assert.notDeepEqual(second.cleaned.samples, first.cleaned.samples);
+  await pausesAreQuiet(page);
+  assert.deepEqual(complaints, []);
+});
+
+test('before and after are heard at the same position', { skip }, async (t) => {
+  const { page, complaints } = await visit(t);
+  // Two ramps, one the other's negative: what is heard tells side and position.
+  const heard = await page.evaluate(async () => {
+    const { Player } = await import('./player.mjs');
+    const context = new AudioContext();
+    const tap = new AnalyserNode(context);
+    tap.connect(context.destination);
+    Object.defineProperty(context, 'destination', { value: tap });
+    const player = new Player(context);
+    const before = Int16Array.from({ length: 32000 }, (_, i) => 3000 + i / 4);
+    const after = before.map((sample) => -sample);
+    // One callback a sample would hold up the page for seconds when a take is long.
+    Float32Array.from = () => {
+      throw new Error('a callback for every sample');
+    };
+    player.load({ before, after, rate: 8000 });
+    await player.play();
+    const values = [];
+    const last = new Float32Array(tap.fftSize);
+    for (const side of ['after', 'before', 'after', 'before']) {
+      player.listenTo(side);
+      const started = context.currentTime;
+      while (context.currentTime < started + 0.25) {
+        await new Promise((resolve) => setTimeout(resolve, 20));
+      }
+      tap.getFloatTimeDomainData(last);
+      values.push(last.at(-1) * 32768);
+    }
+    player.pause();
+    return values;
+  });
+  assert.deepEqual(heard.map(Math.sign), [-1, 1, -1, 1]);
+  const positions = heard.map(Math.abs);
+  assert.deepEqual(
+    positions,
+    positions.toSorted((a, b) => a - b),
+  );
+  assert.ok(positions[0] > 3000);
+  assert.deepEqual(complaints, []);
+});
+
+test('what cannot be opened is put in words, and the page still works', { skip }, async (t) => {
+  const { page, complaints, problem } = await visit(t, {
+    prelude: `MediaDevices.prototype.getUserMedia = async () => {
+      throw new DOMException('x', globalThis.reason);
+    };`,
+  });
+  for (const [reason, pattern] of [
+    ['NotAllowedError', /may not use the microphone/],
+    ['NotFoundError', /No microphone was found/],
+    ['AbortError', /cannot be opened: x/],
+  ]) {
+    await page.evaluate((name) => {
+      globalThis.reason = name;
+    }, reason);
+    await page.click('#record');
+    await problem(pattern);
+  }
+  await page.setInputFiles('#file', made('long.wav', 1, '-r 8000 -b 8', 'trim 0 601'));
+  await problem(/"long\.wav" lasts about 11 minutes; this page takes up to 10 minutes/);
+  const text = { name: 'x.mp3', mimeType: 'audio/mpeg', buffer: Buffer.from('hello') };
+  await page.setInputFiles('#file', text);
+  await problem(/"x\.mp3" is no sound/);
+  await page.setInputFiles('#file', made('s.ogg', 2, '-r 22050', 'synth 1.5 pinknoise'));
+  assert.ok(Math.abs((await finished(page)).seconds - 1.5) < 0.05);
+  assert.ok(await page.locator('#problem').isHidden());
+  assert.deepEqual(complaints, []);
+});
+
+test('a lost connection is said, and what was recorded is cleaned after a new one', {
+  skip,
+}, async (t) => {
+  const { page, server, problem } = await visit(t);
+  await page.click('#record');
+  await recorded(page, 1.5);
+  await server.close();
+  await problem('the server ends');
+  assert.equal(await page.locator('#status').textContent(), 'Not connected.');
+  await page.click('#retry');
+  await problem('Is it still running?');
+  await serve(t, { port: Number(new URL(server.url).port) });
+  await page.click('#retry');
+  assert.ok((await finished(page)).seconds > 1.5);
+});
+
+// A page without a server: it lets half of everything through by itself.
+const HALVING_PAGE = `
+  import { Link } from './link.mjs';
+  import { startPage } from './live-page.mjs';
+  import { encodeResult } from './protocol.mjs';
+
+  const HELLO = { models: [{ name: 'half', rate: 48000 }], sampleRates: [44100, 48000], maxSeconds: 60 };
+  class InThisPage extends Link {
+    isOpen = true;
+    connect() {
+      this.receive(JSON.stringify({ type: 'hello', ...HELLO }));
+    }
+    post(message) {
+      if (typeof message !== 'string') {
+        const samples = message.map((sample) => sample / 2);
+        return setTimeout(() => this.receive(encodeResult({ stream: this.id, samples, voice: [], noise: [] })));
+      }
+      const { type, stream = this.id } = JSON.parse(message);
+      this.id = stream;
+      const answer = { start: { type: 'started', stream, latency: 0 }, stop: { type: 'done', stream } }[type];
+      setTimeout(() => this.receive(JSON.stringify(answer)));
+    }
+  }
+  startPage(new InThisPage());`;
+
+test('another link cleans the sound elsewhere', { skip }, async (t) => {
+  const { page, complaints } = await visit(t, { main: HALVING_PAGE });
+  await page.setInputFiles('#file', made('tone.wav', 1, '-r 48000', 'synth 12 sine 440'));
+  const { original, cleaned, seconds } = await finished(page);
+  assert.ok(Math.abs(seconds - 12) < 1e-3);
+  assert.ok(Math.max(...original.samples.subarray(0, 1000)) > 10000);
+  assert.deepEqual(
+    cleaned.samples,
+    original.samples.map((sample) => sample / 2),
+  );
+  assert.deepEqual(complaints, []);
+});

@@ -1,0 +1,235 @@
+// The live page's server: what it gives away, what it refuses, and that the sound that comes back is the
+// package's own, in step with what was sent.
+import assert from 'node:assert/strict';
+import { once } from 'node:events';
+import { cpSync, mkdtempSync, rmSync, writeFileSync } from 'node:fs';
+import net from 'node:net';
+import os from 'node:os';
+import path from 'node:path';
+import { test } from 'node:test';
+import { setTimeout as sleep } from 'node:timers/promises';
+import { noise, randomSource } from '../../../native_modules/quorral_valto/test/support/audio.mjs';
+import { require } from '../dependencies.mjs';
+import { decodeResult, MAX_MESSAGE_BYTES } from '../page/protocol.mjs';
+import { namesOf } from '../server.mjs';
+import { ask, connect, greeted, heard, serve } from './harness.mjs';
+
+const { initialize, NoiseCanceller, SAMPLE_RATES, VoiceActivityDetector } =
+  require('quorral_valto');
+const MODELS = require('../../models/shipped.json')
+  .filter(({ kind }) => kind === 'NC')
+  .map(({ name }) => name);
+
+test('serves its page and nothing else', async (t) => {
+  const { url } = await serve(t);
+  const page = await ask(url);
+  assert.equal(page.status, 200);
+  assert.match(page.headers['content-security-policy'], /default-src 'none'/);
+  for (const [, name] of page.body.toString().matchAll(/(?:href|src)="([^"]+)"/g)) {
+    assert.equal((await ask(url, { path: `/${name}` })).status, 200, name);
+  }
+  assert.equal((await ask(url, { method: 'HEAD' })).body.length, 0);
+  for (const wrong of [
+    '/../server.mjs',
+    '/%2e%2e/server.mjs',
+    '//etc/passwd',
+    '/main.mjs?x',
+    '/audio',
+  ])
+    assert.equal((await ask(url, { path: wrong })).status, 404, wrong);
+  assert.equal((await ask(url, { method: 'POST' })).status, 405);
+  assert.equal((await ask(url, { headers: { host: 'example.org' } })).status, 421);
+  // A browser does not name the usual port.
+  assert.deepEqual([...namesOf(80)], ['127.0.0.1', 'localhost']);
+});
+
+test('takes connections from its own page only, up to a number', async (t) => {
+  const server = await serve(t);
+  const refusal = async (options) => {
+    const [error] = await once(connect(server.url, options), 'error');
+    return error.message;
+  };
+  for (const options of [{ origin: 'http://example.org' }, { path: 'other' }, { origin: '' }]) {
+    assert.match(await refusal(options), /403/);
+  }
+  for (let i = 0; i < 8; ++i) await greeted(t, server.url);
+  assert.match(await refusal(), /503/);
+
+  // One refused client resets its connection, another keeps its half of it: the server bears the first
+  // and lets go of the second, which is told when it writes.
+  const refused = async () => {
+    const { port, host } = new URL(server.url);
+    const socket = net.connect({ port, host: '127.0.0.1', allowHalfOpen: true });
+    t.after(() => socket.destroy());
+    const upgrade = 'Connection: Upgrade\r\nUpgrade: websocket\r\n\r\n';
+    socket.write(`GET /audio HTTP/1.1\r\nHost: ${host}\r\n${upgrade}`);
+    assert.match(`${(await once(socket, 'data'))[0]}`, /403/);
+    return socket;
+  };
+  (await refused()).resetAndDestroy();
+  const half = (await refused()).on('error', () => {});
+  const patience = AbortSignal.timeout(20_000);
+  while (!half.destroyed) {
+    patience.throwIfAborted();
+    half.write('x');
+    await sleep(10);
+  }
+});
+
+test('a message that breaks the rules ends its connection with a reason', async (t) => {
+  const { url } = await serve(t);
+  const start = { type: 'start', stream: 1, sampleRate: 8000, model: MODELS[0] };
+  const started = JSON.stringify(start);
+  const full = new Int16Array(MAX_MESSAGE_BYTES / 2);
+  const tooLong = Array(Math.ceil((600 * 8000 + 1) / full.length)).fill(full);
+  const cases = [
+    [['no JSON'], 1008, /JSON object/],
+    [['null'], 1008, /JSON object/],
+    [['{"type":"toString"}'], 1008, /message type/],
+    [[JSON.stringify({ ...start, stream: 0.5 })], 1008, /stream/],
+    [[JSON.stringify({ ...start, sampleRate: 12345 })], 1008, /sampling rate/],
+    [[JSON.stringify({ ...start, model: '../x' })], 1008, /model/],
+    [['{"type":"model","name":7}'], 1008, /model/],
+    [[full], 1008, /before "start"/],
+    [[started, new Uint8Array(3)], 1008, /16-bit/],
+    [[started, '{"type":"stop"}', full], 1008, /before "start"/],
+    [[started, new Uint8Array(MAX_MESSAGE_BYTES + 2)], 1009, /^/],
+    [[started, ...tooLong], 1009, /a recording may last 600 s/],
+  ];
+  const witness = await greeted(t, url);
+  for (const [messages, code, reason] of cases) {
+    const { socket } = await greeted(t, url);
+    for (const message of messages) socket.send(message);
+    const closed = await socket.closed;
+    assert.equal(closed.code, code, String(messages[0]));
+    assert.match(closed.reason, reason);
+  }
+  // The others go on; a new stream replaces the one that runs.
+  witness.say(start);
+  witness.socket.send(full);
+  witness.say({ ...start, stream: 2 });
+  witness.socket.send(new Int16Array(80));
+  witness.say({ type: 'stop' });
+  const done = await heard(witness.socket, 'done');
+  assert.deepEqual([done.stream, done.samples], [2, 80]);
+});
+
+/** What the package makes of a sound: cleaned samples, the delay taken out, and voice scores. */
+function directly(samples, sampleRate, model) {
+  const canceller = new NoiseCanceller({ sampleRate, frameMs: 10, model });
+  const detector = new VoiceActivityDetector({ sampleRate, frameMs: 10 });
+  const { frameSize, latency } = canceller;
+  const padded = new Int16Array(Math.ceil((samples.length + latency) / frameSize) * frameSize);
+  padded.set(samples);
+  const voice = [];
+  for (let at = 0; at < padded.length; at += frameSize) {
+    const frame = padded.subarray(at, at + frameSize);
+    if (at < samples.length) voice.push(detector.process(frame));
+    canceller.process(frame);
+  }
+  return { samples: padded.subarray(latency, latency + samples.length), voice };
+}
+
+/** The same by the server, in pieces; the model is switched in the middle when there is a second one. */
+async function byServer(t, url, samples, sampleRate, model, second = null) {
+  const { socket, say } = await greeted(t, url);
+  const random = randomSource(samples.length);
+  say({ type: 'start', stream: 9, sampleRate, model });
+  let switchedAt = null;
+  for (let at = 0; at < samples.length; ) {
+    const end = Math.min(samples.length, at + 1 + Math.floor(random() * 3000));
+    socket.send(samples.subarray(at, end));
+    at = end;
+    if (second === null || switchedAt !== null || at < samples.length / 2) continue;
+    switchedAt = at;
+    say({ type: 'model', name: second });
+  }
+  say({ type: 'stop' });
+  const done = await heard(socket, 'done');
+  assert.deepEqual([done.stream, done.samples], [9, samples.length]);
+  socket.close();
+  const results = socket.said.filter((each) => each instanceof ArrayBuffer).map(decodeResult);
+  const joined = (key) => results.flatMap((result) => Array.from(result[key]));
+  const levels = joined('noise');
+  return {
+    samples: Int16Array.from(joined('samples')),
+    voice: joined('voice'),
+    levels,
+    switchedAt,
+  };
+}
+
+test('the sound that comes back is the model’s, as long as the original and in step', async (t) => {
+  initialize();
+  const { url } = await serve(t);
+  for (const [i, sampleRate] of SAMPLE_RATES.entries()) {
+    const model = MODELS[i % MODELS.length];
+    const peak = 300 * (i + 1);
+    const samples = noise(Math.floor((1.5 + i / 17) * sampleRate), i, peak);
+    const back = await byServer(t, url, samples, sampleRate, model);
+    const expected = directly(samples, sampleRate, model);
+    const name = `${samples.length} samples at ${sampleRate} Hz, ${model}`;
+    assert.deepEqual(back.samples, expected.samples, name);
+    assert.deepEqual(back.voice, expected.voice, name);
+    assert.equal(back.levels.length, back.voice.length, name);
+    // Noise alone is removed nearly whole: its own level, uniform within the peak.
+    const level = 20 * Math.log10(peak / Math.sqrt(3) / 32768);
+    assert.ok(Math.abs(back.levels.at(-1) - level) < 2, `${back.levels.at(-1)} dB, not ${level}`);
+  }
+});
+
+test('another model takes over in the middle, and the sound does not move', async (t) => {
+  initialize();
+  const { url } = await serve(t);
+  const frame = 480;
+  const samples = noise(100 * frame, 31);
+  for (const pair of [[MODELS[0], MODELS[2]], MODELS.slice(1).reverse()]) {
+    const back = await byServer(t, url, samples, 48000, ...pair);
+    const [first, second] = pair.map((model) => directly(samples, 48000, model).samples);
+    // The cross-fade is one frame long and as late as the longest delay of the models, two frames.
+    const [last, next] = [back.switchedAt - 3 * frame, back.switchedAt + 2 * frame];
+    assert.deepEqual(back.samples.subarray(0, last), first.subarray(0, last));
+    assert.deepEqual(back.samples.subarray(next), second.subarray(next));
+    assert.notDeepEqual(first.subarray(next), second.subarray(next));
+  }
+});
+
+test('a page that does not read is not read either', async (t) => {
+  const { socket, say } = await greeted(t, (await serve(t)).url);
+  say({ type: 'start', stream: 1, sampleRate: 96000, model: MODELS[0] });
+  await heard(socket, 'started');
+  socket.pause();
+  const chunk = new Int16Array(MAX_MESSAGE_BYTES / 2);
+  const messages = 128; // more than sockets buffer
+  for (let i = 0; i < messages; ++i) socket.send(chunk);
+  let left;
+  do {
+    left = socket.bufferedAmount;
+    await sleep(1000);
+  } while (socket.bufferedAmount !== left);
+  assert.ok(left > 0, 'the server took everything');
+  socket.resume();
+  say({ type: 'stop' });
+  assert.equal((await heard(socket, 'done')).samples, messages * chunk.length);
+});
+
+test('a module that cannot be loaded is reported in words', async (t) => {
+  const root = mkdtempSync(path.join(os.tmpdir(), 'quorral-live-'));
+  t.after(() => rmSync(root, { recursive: true }));
+  const inside = (name) => path.join(root, name);
+  cpSync(new URL('..', import.meta.url), inside('apps/live-page'), { recursive: true });
+  const module = inside('native_modules/quorral_valto');
+  const ws = path.dirname(require.resolve('ws/package.json'));
+  cpSync(ws, path.join(module, 'node_modules/ws'), { recursive: true });
+  writeFileSync(
+    path.join(module, 'package.json'),
+    '{ "name": "quorral_valto", "exports": "./i.cjs" }',
+  );
+  writeFileSync(path.join(module, 'i.cjs'), 'throw Object.assign(Error("x"), { code: "ERR_Y" });');
+  const { startServer } = await import(inside('apps/live-page/server.mjs'));
+  const server = await startServer();
+  t.after(() => void server.close());
+  const socket = connect(server.url);
+  assert.deepEqual(await heard(socket, 'error'), { type: 'error', code: 'ERR_Y', message: 'x' });
+  assert.equal((await socket.closed).code, 1011);
+});

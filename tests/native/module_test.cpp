@@ -1,0 +1,248 @@
+// The host module without script: start-up, entry points, and both when memory runs out.
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <filesystem>
+#include <random>
+#include <sstream>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "morva-sdk/morva-sdk.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/models.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/util.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
+#include "support/allocation_counter.h"
+
+namespace quorral {
+namespace {
+
+using test_support::failingAllocation;
+using test_support::heldBytes;
+
+// First, since an engine that once was leaves the result of its start-up.
+TEST(StartUpTest, AnOldProcessorIsRefusedWithItsLineBeforeTheEngineExists) {
+    const std::string refusal = "Failed to initialize Morva SDK: CPU does not support ";
+    const auto refuse = [&](CpuFeatureQuery query, int code, const char* missing) {
+        testing::internal::CaptureStdout();
+        EXPECT_EQ(ValtoInitialize(query), code);
+        EXPECT_EQ(testing::internal::GetCapturedStdout(), refusal + missing);
+        EXPECT_FALSE(InitializeResult().has_value());
+        EXPECT_TRUE(NcModelNames().empty());
+        EXPECT_EQ(ValtoNCSetup(16000, 10), nullptr);
+        EXPECT_EQ(OpenNcSession(16000, 10, {}).status, OpenStatus::kNotInitialized);
+    };
+    refuse([] { return CpuFeatures{.sse41 = false, .avx2 = false}; }, -1, "SSE 4.1\n");
+    refuse([] { return CpuFeatures{.sse41 = false, .avx2 = true}; }, -1, "SSE 4.1\n");
+    refuse([] { return CpuFeatures{.sse41 = true, .avx2 = false}; }, -2, "AVX2\n");
+}
+
+TEST(TextTest, BothDirectionsAgreeOnlyWithinTheBasicPlane) {
+    const std::string text = "/home/J\u00fcrgen \u4f60\u597d/\u0416";
+    EXPECT_EQ(util::ToUTF8(util::ToUTF16(text)), text);
+    const std::wstring units = util::ToUTF16("a\xF0\x9F\x98\x80");
+    EXPECT_EQ(units, (std::wstring{L'a', wchar_t{0xD83D}, wchar_t{0xDE00}}));
+    EXPECT_EQ(util::ToUTF8(std::wstring{wchar_t{0x1F600}}), "\xF0\x9F\x98\x80");
+    EXPECT_THROW(util::ToUTF16("\xC3("), std::range_error);
+}
+
+TEST(ModuleBasePathTest, IsTheFolderOfThisProgram) {
+    const std::string path = util::ModuleBasePath();
+    EXPECT_TRUE(path.empty() || path.back() != '/');
+    const auto folder = std::filesystem::read_symlink("/proc/self/exe").parent_path();
+    EXPECT_TRUE(std::filesystem::equivalent(path.empty() ? "." : path, folder)) << path;
+}
+
+// The module as it was before its start-up.
+void ForgetEngine() {
+    Morva_SDK_GlobalDestroy();
+    gNcModels = {};
+    gNcModel = {};
+    gVadModels = {};
+    gVadModel = {};
+}
+
+class EntryPointsTest : public testing::Test {
+protected:
+    void SetUp() override { ASSERT_EQ(ValtoInitialize(), 0); }
+    void TearDown() override { ForgetEngine(); }
+};
+
+TEST_F(EntryPointsTest, ModelRateAndDurationOfASetUp) {
+    struct Case {
+        int rateHz, durationMs;
+        std::string model;  // none: no line at all
+        unsigned samples;   // of a frame; 0 when no session opens
+        bool otherRate = false, otherDuration = false;
+        const char* choice = "";
+    };
+    const std::vector<Case> cases{{8000, 10, "small_NC_8k", 80},
+                                  {12000, 20, "small_NC", 240},
+                                  {16000, 30, "small_NC", 480},
+                                  {24000, 40, "full_NC-ca03f4", 960},
+                                  {96000, 10, "full_NC-ca03f4", 960},
+                                  {48000, 10, "small_NC", 480, false, false, "small_NC"},
+                                  {192000, 10, "", 0},
+                                  {22050, 10, "full_NC-ca03f4", 160, true},
+                                  {48000, 25, "full_NC-ca03f4", 480, false, true},
+                                  {48000, 15, "full_NC-ca03f4", 0},
+                                  {48000, 32, "full_NC-ca03f4", 0},
+                                  {0, 0, "small_NC_8k", 160, true, true}};
+    for (const auto& [rateHz, durationMs, model, samples, otherRate, otherDuration, choice] :
+         cases) {
+        SCOPED_TRACE(testing::Message() << rateHz << " Hz, " << durationMs << " ms " << choice);
+        std::ostringstream lines;
+        if (!model.empty()) lines << "Setting Valto model: " << model << '\n';
+        if (otherRate) {
+            lines << "The input sampling rate " << rateHz
+                  << " is not supported; using default: 16000\n";
+        }
+        if (otherDuration) {
+            lines << "The input frame duration " << durationMs
+                  << " is not supported; using default: 10\n";
+        }
+        gNcModel = choice;
+        testing::internal::CaptureStdout();
+        void* const session = ValtoNCSetup(rateHz, durationMs);
+        EXPECT_EQ(testing::internal::GetCapturedStdout(), lines.str());
+        EXPECT_EQ(session != nullptr, samples != 0);
+        std::vector<short> frame(960);
+        EXPECT_EQ(ValtoNCProcess(session, frame.data(), samples, frame.data(), samples),
+                  samples == 0 ? 2 : 0);
+    }
+}
+
+TEST_F(EntryPointsTest, Codes) {
+    void* const cleaner = ValtoNCSetup(16000, 10);
+    void* const detector = ValtoVADSetup(16000, 10);
+    const std::vector<short> in(160, 1000);
+    std::vector<short> out(160);
+    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 160, out.data(), 160), 0);
+    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 159, out.data(), 160), 1);
+    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 160, out.data(), 159), 1);
+    EXPECT_EQ(ValtoNCProcess(cleaner, nullptr, 160, out.data(), 160), 1);
+    EXPECT_EQ(ValtoNCProcess(detector, in.data(), 160, out.data(), 160), 2);
+    EXPECT_GE(ValtoVADProcess(detector, in.data(), 160), 0.0F);
+    EXPECT_EQ(ValtoVADProcess(detector, in.data(), 161), -3.0F);
+    EXPECT_EQ(ValtoVADProcess(cleaner, in.data(), 160), -4.0F);
+    EXPECT_EQ(ValtoNCReset(detector), -3);
+    EXPECT_EQ(ValtoNCReset(cleaner), 0);
+    EXPECT_EQ(ValtoNCReset(cleaner), -3);
+    EXPECT_EQ(ValtoVADReset(detector), 0);
+    EXPECT_EQ(ValtoVADReset(detector), -3);
+}
+
+TEST_F(EntryPointsTest, AThreadCleansAsEverWhileOthersListAndSwitchModels) {
+    const auto clean = [](std::atomic<bool>& isSetUp) {
+        void* const cleaner = ValtoNCSetup(48000, 10);
+        void* const detector = ValtoVADSetup(48000, 10);
+        isSetUp = true;
+        std::vector<float> heard;
+        std::mt19937 random(7);
+        for (int n = 0; n < 300; ++n) {
+            std::vector<short> frame(480);
+            for (auto& sample : frame) sample = static_cast<short>(random() % 4096);
+            heard.push_back(ValtoVADProcess(detector, frame.data(), 480));
+            EXPECT_EQ(ValtoNCProcess(cleaner, frame.data(), 480, frame.data(), 480), 0);
+            heard.insert(heard.end(), frame.begin(), frame.end());
+        }
+        EXPECT_EQ(ValtoNCReset(cleaner), 0);
+        EXPECT_EQ(ValtoVADReset(detector), 0);
+        return heard;
+    };
+    std::atomic<bool> isSetUp{false};
+    const auto expected = clean(isSetUp);
+    isSetUp = false;
+    std::vector<float> heard;
+    std::atomic<bool> isDone{false};
+    std::jthread engine([&] {
+        heard = clean(isSetUp);
+        isDone = true;
+    });
+    while (!isSetUp) std::this_thread::yield();
+    do {
+        for (const auto& name : NcModelNames()) {
+            EXPECT_TRUE(ChooseNcModel(name));
+            ValtoNCReset(OpenNcSession(8000, 10, name).session);
+        }
+    } while (!isDone);
+    engine.join();
+    EXPECT_EQ(heard, expected);
+}
+
+// Fails the first, second, ... allocation of `work` until it gets by without reaching it; how often
+// it failed. What `work` has done must be taken back by itself, but for what is made once: a
+// repeated failure at the same place must find that there.
+template <class Work>
+int FailEach(Work work) {
+    for (int n = 1;; ++n) {
+        bool reached = true;
+        const auto kept = [&] {
+            const std::size_t before = heldBytes;
+            failingAllocation = static_cast<std::size_t>(n);
+            work();
+            reached = std::exchange(failingAllocation, 0) == 0;
+            return heldBytes - before;
+        };
+        int keeping = 0;
+        while (kept() != 0 && keeping < 4) ++keeping;
+        EXPECT_LT(keeping, 4) << "at allocation " << n;
+        if (!reached) return n - 1;
+    }
+}
+
+// What runs between the failing allocation and the next thing to be tried.
+template <class Work>
+void Undisturbed(Work work) {
+    const std::size_t armed = std::exchange(failingAllocation, 0);
+    work();
+    failingAllocation = armed;
+}
+
+TEST(MemoryTest, StartUpNamesTheStepAtWhichItRanOut) {
+    std::vector<int> codes;
+    codes.reserve(20);
+    const int failures = FailEach([&] {
+        const int code = ValtoInitialize();
+        if (codes.empty() || codes.back() != code) codes.push_back(code);
+        Undisturbed(ForgetEngine);
+    });
+    EXPECT_GT(failures, 50);
+    EXPECT_EQ(codes, (std::vector{-4, -5, -6, -7, -8, 0}));
+}
+
+TEST_F(EntryPointsTest, ASessionThatFindsNoMemoryIsRefusedOrWhole) {
+    std::vector<short> heard(480);
+    const auto listen = [&](void* session) {
+        for (int n = 0; n < 5; ++n) {
+            for (int i = 0; i < 480; ++i) heard[i] = static_cast<short>((n + i) * i * 7919);
+            EXPECT_EQ(ValtoNCProcess(session, heard.data(), 480, heard.data(), 480), 0);
+        }
+        return heard;
+    };
+    void* const first = ValtoNCSetup(48000, 10);
+    const std::vector<short> wanted = listen(first);
+    int whole = 0;
+    const int failures = FailEach([&] {
+        void* const session = ValtoNCSetup(48000, 10);
+        Undisturbed([&] {
+            if (session == nullptr) return;
+            ++whole;
+            EXPECT_EQ(listen(session), wanted);
+            ValtoNCReset(session);
+        });
+    });
+    EXPECT_GT(failures, 20);
+    EXPECT_LT(whole, 8);
+    EXPECT_GT(FailEach([] {
+                  if (void* const session = ValtoVADSetup(48000, 10)) ValtoVADReset(session);
+              }),
+              20);
+}
+
+}  // namespace
+}  // namespace quorral
