@@ -8,9 +8,7 @@ import pytest
 import soundfile
 
 import morva
-
-pytest.importorskip("distributed")
-from morva import batch  # noqa: E402
+from morva import batch
 
 
 @pytest.fixture
@@ -65,20 +63,3 @@ def test_plans_that_would_lose_something_are_refused(recordings, tmp_path, speec
     assert run(recordings, other.parent, "-o", tmp_path / "out") == 2
     assert run(recordings, "-o", recordings) == 2
     assert run(tmp_path / "nowhere", "-o", tmp_path / "out") == 2
-
-
-def kill_worker(job):
-    os._exit(9)
-
-
-def test_a_worker_that_dies_is_a_failure_not_an_end(recordings, tmp_path, monkeypatch):
-    monkeypatch.setattr(batch, "clean", kill_worker)
-    monkeypatch.setattr(batch, "RETRIES", 0)
-    jobs = batch.plan([recordings / "a.wav"], tmp_path / "out", {})
-    import dask
-
-    with dask.config.set({"distributed.scheduler.allowed-failures": 0}):
-        with batch.connect(None, 1) as client:
-            failures = batch.run(jobs, batch.Journal(tmp_path / "out"), client, progress=False)
-    assert list(failures) == [str(recordings / "a.wav")]
-    assert "KilledWorker" in failures[str(recordings / "a.wav")]
