@@ -11,8 +11,8 @@ import numpy as np
 import pytest
 import torch
 
-from morva_training import mvw, snapshot, together, train_noise, train_voice
-from morva_training.engine import NoiseLevelModel, NoiseModel, VoiceModel
+import morva
+from morva_training import mvw, together, train_noise, train_voice
 from morva_training.loop import Run, Schedule
 from morva_training.optimisers import orthogonalised
 
@@ -28,54 +28,50 @@ def entries(folder: Path, key: str) -> list[float]:
 
 
 def test_noise_model_learns_and_resumes(store: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
-    folder, out = tmp_path / "run", tmp_path / "model.mvw"
-    common = ("8k", "--store", store, "--out", out, "--batch", 6, "--hidden", 16, "--workers", 0)
-    run_main(train_noise, monkeypatch, *common, "--run", folder, "--steps", 12, "--rate", 0.01)
-    run_main(train_noise, monkeypatch, *common, "--run", folder, "--steps", 24, "--rate", 0.01)
+    folder, out, copy = tmp_path / "run", tmp_path / "model.mvw", tmp_path / "copy.mvw"
+    common = ("8k", "--store", store, "--batch", 6, "--hidden", 16, "--workers", 0, "--rate", 0.01)
+    for steps in (12, 24):
+        run_main(train_noise, monkeypatch, *common, "--run", folder, "--out", out, "--steps", steps)
     ratios = entries(folder, "dev_ratio_db")
     assert ratios[-1] > ratios[0] + 1.0, "24 steps on tones in white noise must help"
     assert torch.load(folder / "checkpoint.pt")["step"] == 24
-    assert NoiseModel(mvw.read(out)).process(np.zeros(800, np.float32)).shape == (800,)
+    assert len(morva.denoise(np.zeros(800, np.float32), 8000, model=str(out))) == 800
 
-    copy = tmp_path / "copy.mvw"
-    run_main(snapshot, monkeypatch, "8k", "--run", folder, "--out", copy)
+    run_main(train_noise, monkeypatch, *common, "--run", folder, "--out", copy, "--steps", 0)
     a, b = mvw.read(out), mvw.read(copy)
     assert all(np.array_equal(x, y) for x, y in zip(a["WeightLinear"], b["WeightLinear"]))
-    assert np.array_equal(a["WeightGRU"], a["WeightGRU"].astype(np.float16)), "the engine packs such matrices tighter"
 
-    wider = ("--start", out, "--hidden", 24, "--run", tmp_path / "other")
-    run_main(train_noise, monkeypatch, *common, *wider, "--steps", 0)
-    assert entries(tmp_path / "other", "dev_ratio_db")[0] == pytest.approx(ratios[-1], abs=0.5)
-    for steps in (4, 8):
-        run_main(train_noise, monkeypatch, *common, *wider, "--steps", steps, "--rate", 0.01)
-    assert entries(tmp_path / "other", "dev_ratio_db")[-1] > ratios[-1]
-    assert mvw.read(out)["WeightGRU"].shape[1] == 24
+    wider = (*common, "--start", out, "--hidden", 24, "--run", tmp_path / "other", "--out", copy)
+    for steps in (0, 8):
+        run_main(train_noise, monkeypatch, *wider, "--steps", steps)
+    others = entries(tmp_path / "other", "dev_ratio_db")
+    assert others[0] == pytest.approx(ratios[-1], abs=0.5) and others[-1] > ratios[-1]
+    assert mvw.read(copy)["WeightGRU"].shape[1] == 24
 
 
 def test_level_model(store: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
-    out = tmp_path / "level.mvw"
-    run_main(
-        train_noise, monkeypatch, "16k", "--plain", "--level", "--store", store, "--run", tmp_path / "run",
-        "--out", out, "--batch", 4, "--hidden", 8, "--steps", 3, "--workers", 0,
-    )  # fmt: skip
-    weight = mvw.read(out)
-    assert weight["Version"] == b"0.0.5" and "WeightGRU_reset" not in weight
-    model = NoiseLevelModel(weight)
-    levels = [model.level(np.zeros(160, np.float32)) for _ in range(5)]
-    assert levels == [pytest.approx(-60.0)] * 5
+    out, run = tmp_path / "level.mvw", tmp_path / "run"
+    arguments = ["16k", "--plain", "--level", "--store", store, "--run", run, "--out", out, "--hidden", 8, "--batch", 4]
+    run_main(train_noise, monkeypatch, *arguments, "--steps", 3, "--workers", 0)
+    assert mvw.read(out)["Version"] == b"0.0.5"
+    assert morva.noise_level(np.zeros(800), 16000, model=str(out)) == pytest.approx([-60.0] * 5)
+    arguments = [*map(str, arguments), "--ratio", "0.5", "--lost-speech", "7"]
+    weights = train_noise.NoiseTask(train_noise.parse(arguments)).criterion.mask_loss.weights
+    assert (weights.ratio, weights.lost_speech, weights.loudness) == (0.5, 7.0, 0.0)
 
 
 def test_voice_model(store: Path, tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
-    out = tmp_path / "voice.mvw"
-    run_main(
-        train_voice, monkeypatch, "--store", store, "--run", tmp_path / "run", "--out", out,
-        "--batch", 6, "--hidden", 12, "--layers", 3, "--steps", 12, "--rate", 0.01, "--workers", 0,
-    )  # fmt: skip
-    assert entries(tmp_path / "run", "dev_auc")[-1] > 0.6
+    run, out = tmp_path / "run", tmp_path / "voice.mvw"
+    common = ("--store", store, "--batch", 6, "--layers", 3, "--rate", 0.01, "--workers", 0)
+    run_main(train_voice, monkeypatch, *common, "--run", run, "--out", out, "--hidden", 12, "--steps", 12)
+    assert entries(run, "dev_auc")[-1] > 0.6
     weight = mvw.read(out)
     low, high = weight["Test_MINMAX"]
     assert low < weight["Test_BestF1"][0] < high
-    assert 0 < VoiceModel(weight).score(np.zeros(80, np.float32)) < 1
+    assert 0 < morva.voice(np.zeros(80), 8000, model=str(out))[0] < 1
+    grown = (*common, "--start", out, "--hidden", 16, "--bfloat16", "--run", tmp_path / "other")
+    run_main(train_voice, monkeypatch, *grown, "--steps", 1)
+    assert entries(tmp_path / "other", "dev_auc")[0] == pytest.approx(entries(run, "dev_auc")[-1], abs=0.1)
 
 
 def test_orthogonal_steps_are_even_in_all_directions() -> None:
@@ -91,28 +87,21 @@ def test_schedule() -> None:
     assert rates[1000] < 1e-6 and all(a >= b for a, b in zip(rates[60:], rates[61:]))
 
 
-def test_a_loss_that_is_not_finite_changes_nothing(tmp_path: Path) -> None:
-    network = torch.nn.Linear(2, 1)
-    before = [p.clone() for p in network.parameters()]
-    run = Run(network, tmp_path, Schedule(steps=3, checkpoint_every=1))
-
-    def loss_of(model, _):
-        return model(torch.ones(1, 2)).sum() * float("nan"), {}
-
-    run.train(iter([{}] * 3), loss_of)
-    assert all(torch.equal(a, b) for a, b in zip(before, network.parameters()))
+def trained(folder: Path, steps: int, targets: list[float]) -> torch.nn.Module:
+    """The average of a one-number network that is told the targets, one after the other."""
+    torch.manual_seed(1)
+    run = Run(torch.nn.Linear(1, 1), folder, Schedule(steps, peak=0.1, warm_up=1, average=0.9))
+    told = iter(targets)
+    run.train(iter([{}] * steps), lambda model, _: ((model(torch.ones(1, 1)) - next(told)).square().sum(), {}))
+    torch.save(run.network.state_dict(), folder / f"{together.rank()}.pt")
+    return run.averaged
 
 
-def test_the_average_follows_the_network(tmp_path: Path) -> None:
-    network = torch.nn.Linear(1, 1)
-    run = Run(network, tmp_path, Schedule(steps=200, peak=0.1, warm_up=1, average=0.9))
-
-    def loss_of(model, _):
-        return (model(torch.ones(1, 1)) - 3.0).square().sum(), {}
-
-    run.train(iter([{}] * 200), loss_of)
-    result = run.averaged(torch.ones(1, 1)).item()
-    assert abs(result - 3.0) < 0.1
+def test_the_average_follows_and_a_loss_that_is_not_finite_changes_nothing(tmp_path: Path) -> None:
+    assert trained(tmp_path / "good", 200, [3.0] * 200)(torch.ones(1, 1)).item() == pytest.approx(3.0, abs=0.1)
+    before, after = (trained(tmp_path / f"{n}", n, [float("nan")] * n).state_dict() for n in (0, 3))
+    assert all(torch.equal(before[name], after[name]) for name in before)
+    assert entries(tmp_path / "3", "ran_away") == [3]
 
 
 def train_with_others(number: int, port: int, folder: Path) -> None:
@@ -120,16 +109,7 @@ def train_with_others(number: int, port: int, folder: Path) -> None:
     for name, value in {"RANK": number, "WORLD_SIZE": 2, "MASTER_ADDR": "127.0.0.1", "MASTER_PORT": port}.items():
         patch.setenv(name, str(value))
     assert together.join() == number
-    torch.manual_seed(1)
-    network = torch.nn.Linear(1, 1)
-    run = Run(network, folder, Schedule(steps=300, peak=0.1, warm_up=1))
-    targets = iter([2.0 if number else float("nan"), *([2.0 if number else 4.0] * 299)])
-
-    def loss_of(model, _):
-        return (model(torch.ones(1, 1)) - next(targets)).square().sum(), {}
-
-    run.train(iter([{}] * 300), loss_of)
-    torch.save(network.state_dict(), folder / f"{number}.pt")
+    trained(folder, 300, [2.0 if number else float("nan"), *([2.0 if number else 4.0] * 299)])
 
 
 def test_two_processes_train_one_network(tmp_path: Path) -> None:
