@@ -6,6 +6,7 @@ from pathlib import Path
 
 import numpy as np
 import pytest
+import soundfile
 from conftest import write_wav
 
 from morva_training import corpus
@@ -17,16 +18,19 @@ def tables_of(*speech: corpus.Row) -> dict[str, list[corpus.Row]]:
 
 
 def test_a_rebuilt_store_is_heard_at_every_rate(tmp_path: Path) -> None:
-    """Low-rate copies are made on demand, and those of other recordings go with them."""
+    """Low-rate copies are made on demand, hold what fits below half their rate, and go with their recordings."""
+    time = np.arange(48000) / 48000
     for level in (0.1, 0.4):
-        write_wav(tmp_path / "a.wav", level * np.sin(np.arange(32000) * 0.05))
+        sound = level * np.sin(2 * np.pi * 300 * time) + 0.3 * np.sin(2 * np.pi * 14000 * time)
+        soundfile.write(tmp_path / "a.wav", sound, 48000, "PCM_16")
         corpus.build(tables_of({"path": "a.wav"}), tmp_path, tmp_path / "store")
-        for rate in (32000, 16000, 8000):
+        for rate, power in ((32000, level**2 + 0.3**2), (16000, level**2), (8000, level**2)):
             low = Corpus(tmp_path / "store", rate)
             samples = low.read(*low.clips("speech", "train"))
             assert len(samples) == rate
-            assert np.sqrt(2 * np.mean(samples**2)) == pytest.approx(level * 32768, rel=0.01)
-    assert len(list((tmp_path / "store").glob("speech-*"))) == 3
+            assert np.mean(samples**2) * 2 / 32768**2 == pytest.approx(power, rel=0.02)
+    contents = [file.stem.split("-")[2] for file in (tmp_path / "store").glob("speech-*")]
+    assert len(contents) == 3 and len(set(contents)) == 1, "of one store, and named so"
 
 
 def test_two_processes_may_make_the_same_copy(tmp_path: Path, monkeypatch: pytest.MonkeyPatch) -> None:
