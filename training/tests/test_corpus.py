@@ -21,7 +21,7 @@ def test_a_rebuilt_store_is_heard_at_every_rate(tmp_path: Path) -> None:
     """Low-rate copies are made on demand, hold what fits below half their rate, and go with their recordings."""
     time = np.arange(48000) / 48000
     for level in (0.1, 0.4):
-        sound = level * np.sin(2 * np.pi * 300 * time) + 0.3 * np.sin(2 * np.pi * 14000 * time)
+        sound = level * np.sin(2 * np.pi * 300 * time) + 0.3 * np.sin(2 * np.pi * 11000 * time)
         soundfile.write(tmp_path / "a.wav", sound, 48000, "PCM_16")
         corpus.build(tables_of({"path": "a.wav"}), tmp_path, tmp_path / "store")
         for rate, power in ((32000, level**2 + 0.3**2), (16000, level**2), (8000, level**2)):
