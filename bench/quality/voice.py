@@ -69,9 +69,8 @@ def remembered(scorer: Scorer) -> Scorer:
 
 def from_weight(path: Path) -> Scorer:
     def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
-        if rate not in morva.RATES:
-            samples, rate = metrics.at_rate(samples, rate, LABEL_RATE), LABEL_RATE
-        return morva.voice(samples, rate, frame_ms=10 * blocks, model=str(path.resolve()))
+        heard = metrics.at_rate(samples, rate, LABEL_RATE)  # its own rate, as peers get theirs
+        return morva.voice(heard, LABEL_RATE, frame_ms=10 * blocks, model=str(path.resolve()))
 
     return remembered(scores)
 

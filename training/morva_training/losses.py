@@ -26,8 +26,7 @@ SPEECH_SPL = 79.0  # dB, level at which P.862 listens
 TRUSTED_EDGE_HZ = 7000.0  # of recordings without content above 8 kHz
 HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.3  # what such recordings may say about the noise above
 SYLLABLE_HOPS = 32
-# Fitted to P.862.2 scores of noisy and cleaned recordings (correlation 0.96): the frames and bands
-# here are not quite the standard's.
+# Fitted to P.862.2 scores of noisy and cleaned recordings: frames and bands are not quite the standard's.
 OFFSET, SYMMETRIC, ASYMMETRIC = 4.41, 0.107, 0.0547
 DEEPEST_DB = -40.0
 

@@ -86,8 +86,8 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     return parser.parse_args(arguments)
 
 
-def main() -> None:
-    trainer.train(NoiseTask(parse()))
+def main(arguments: list[str] | None = None) -> None:
+    trainer.train(NoiseTask(parse(arguments)))
 
 
 if __name__ == "__main__":

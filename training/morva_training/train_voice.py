@@ -108,8 +108,8 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     return parser.parse_args(arguments)
 
 
-def main() -> None:
-    trainer.train(VoiceTask(parse()))
+def main(arguments: list[str] | None = None) -> None:
+    trainer.train(VoiceTask(parse(arguments)))
 
 
 if __name__ == "__main__":

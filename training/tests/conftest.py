@@ -16,18 +16,13 @@ import tree  # noqa: E402, F401
 from morva_training import corpus  # noqa: E402
 
 
-def voice_like(rng: np.random.Generator, seconds: float, rate: int = 32000) -> np.ndarray:
+def voice_like(rng: np.random.Generator, seconds: float) -> np.ndarray:
     """A gliding harmonic tone, switched on and off like syllables."""
-    time = np.arange(int(seconds * rate)) / rate
-    phase = 2 * np.pi * np.cumsum(rng.uniform(90, 250) * (1 + 0.1 * np.sin(2 * np.pi * 2 * time))) / rate
+    time = np.arange(int(seconds * 32000)) / 32000
+    phase = 2 * np.pi * np.cumsum(rng.uniform(90, 250) * (1 + 0.1 * np.sin(2 * np.pi * 2 * time))) / 32000
     tone = sum(np.sin(k * phase) / k for k in range(1, 25))
     syllables = np.clip(4 * np.sin(2 * np.pi * 1.7 * time + rng.uniform(0, 6)) + 1, 0, 1)
     return (0.15 * tone * syllables).astype(np.float32)
-
-
-def write_wav(path: Path, samples: np.ndarray) -> None:
-    path.parent.mkdir(parents=True, exist_ok=True)
-    soundfile.write(path, samples, 32000, "PCM_16")
 
 
 @pytest.fixture(scope="session")
@@ -36,21 +31,18 @@ def data(tmp_path_factory: pytest.TempPathFactory) -> tuple[Path, dict[str, list
     root, rng = tmp_path_factory.mktemp("audio"), np.random.default_rng(11)
     tables: dict[str, list[corpus.Row]] = {"speech": [], "noise": [], "rir": []}
 
-    def add(kind: str, name: str, samples: np.ndarray, **columns: str) -> None:
-        write_wav(root / kind / f"{name}.wav", samples)
-        tables[kind].append({"path": f"{kind}/{name}.wav", **columns})
+    def add(kind: str, n: int, samples: np.ndarray, last: int, **columns: str) -> None:
+        row = {"path": f"{kind}{n}x.wav", "split": "heldout" if n > last else "train", **columns}
+        soundfile.write(root / row["path"], samples, 32000, "PCM_16")
+        tables[kind].append(row)
 
     for n in range(8):
-        split = "heldout" if n > 5 else "train"
-        add("speech", f"s{n}", voice_like(rng, 6.0), speaker=f"s{n}", band=("full", "8k")[n % 2], split=split)
-    for n in range(14):
-        split = "heldout" if n > 11 else "train"
-        author = f"someone https://example.org/sounds/{n // 2}/"  # two clips of each recording
-        samples = 0.1 * rng.standard_normal(96000).astype(np.float32)
-        add("noise", f"n{n}x", samples, category=("fan", "music")[n % 2], author=author, split=split)
+        add("speech", n, voice_like(rng, 6.0), 5, speaker=f"s{n}", band=("full", "8k")[n % 2])
+    for n in range(14):  # two clips of each recording
+        link = f"someone https://example.org/sounds/{n // 2}/"
+        add("noise", n, 0.1 * rng.standard_normal(96000), 11, category=("fan", "music")[n % 2], author=link)
     for n in range(2):
-        response = np.concatenate([np.zeros(80), [0.9], 0.02 * rng.standard_normal(4000)])
-        add("rir", f"r{n}", response, split=("train", "heldout")[n])
+        add("rir", n, np.concatenate([np.zeros(80), [0.9], 0.02 * rng.standard_normal(4000)]), 0)
     return root, tables
 
 

@@ -1,4 +1,4 @@
-"""The bench: its scores where the right answer is known, and its programs end to end on synthetic material."""
+"""The bench: its scores where the right answer is known, its programs end to end, the shipped models in short."""
 
 from __future__ import annotations
 
@@ -17,9 +17,51 @@ import systems
 import voice
 from tree import ROOT
 
-from morva_training.measures import active_level, best_f1, pauses_of, quick_threshold, roc_auc, si_sdr
+from morva_training.measures import active_level, best_f1, block_labels, pauses_of, quick_threshold, roc_auc, si_sdr
 
-SUPPRESSORS = ("NC_small_8k", "NC_small_16k", "c6.xs.f.ca03f4")
+
+def noise(seconds: float, seed: int, rate: int = 16000) -> np.ndarray:
+    return 0.1 * np.random.default_rng(seed).standard_normal(int(seconds * rate)).astype(np.float32)
+
+
+@pytest.mark.parametrize("snr", [-5.0, 20.0])
+def test_si_sdr_is_the_ratio_and_ignores_scale_mean_and_delay(snr: float) -> None:
+    clean = noise(12, 1)
+    result = 0.1 * (clean + noise(12, 2) * 10 ** (-snr / 20))
+    assert si_sdr(clean, result + 5) == pytest.approx(snr, abs=0.1)
+    reference, shifted = metrics.aligned(clean, np.concatenate([np.zeros(320), result]), 16000)
+    assert len(reference) == len(clean) - 320 and si_sdr(reference, shifted) == pytest.approx(snr, abs=0.1)
+
+
+def test_pauses() -> None:
+    rate = 16000
+    speech = np.concatenate([np.zeros(rate, np.float32), noise(1, 3), np.zeros(rate, np.float32)])
+    changes = np.flatnonzero(np.diff(pauses_of(speech, rate).astype(int)))
+    assert changes.tolist() == [int(0.97 * rate) - 1, int(2.34 * rate) - 1]
+    noisy = speech + 0.1 * noise(3, 2)
+    result = np.where(np.arange(3 * rate) // rate == 1, noisy, 0.1 * noisy)
+    assert metrics.pause_attenuation(speech, noisy, result, rate) == pytest.approx(20, abs=0.5)
+    assert np.isnan(metrics.pause_attenuation(speech[rate : 2 * rate], noisy, noisy, rate))
+
+
+def test_areas_and_thresholds() -> None:
+    ties = np.array([0.9, 0.4, 0.4, 0.1]), np.array([True, True, False, False])
+    assert roc_auc(*ties) == pytest.approx(0.875) and best_f1(*ties) == (0.8, 0.4)
+    rising, labels = np.arange(100.0), np.arange(100) >= 50
+    assert [roc_auc(scores, labels) for scores in (rising, -rising)] == [1.0, 0.0]
+    assert [quick_threshold(rising, labels, slack) for slack in (0.0, 0.02)] == [50.0, 48.0]
+
+
+def test_voice_labels() -> None:
+    """Gaps are closed, islands dropped, and a hum below all voices, as loud as the words, is none."""
+    blocks = [0] * 60 + [1] * 20 + [0] * 5 + [1] * 10 + [0] * 30 + [1] + [0] * 60
+    gain = np.repeat(np.array(blocks, float), 80)
+    words = np.random.default_rng(1).standard_normal(len(gain)) * (3000 * gain + 1)
+    voice, weight = block_labels(words, 80)
+    assert np.flatnonzero(voice).tolist() == list(range(60, 95))
+    assert weight[60] == 2.0 and weight[0] == 1.0
+    humming, weight = block_labels(words + 3000 * np.sin(2 * np.pi * 30 / 8000 * np.arange(len(words))), 80)
+    assert not humming[:59].any() and (humming != voice).sum() <= 2 and weight[1:50].min() == 1.0
 
 
 @pytest.fixture(scope="module")
@@ -31,57 +73,15 @@ def pairs(store: Path, tmp_path_factory: pytest.TempPathFactory) -> Path:
     return out
 
 
-def noise(seconds: float, seed: int, rate: int = 16000) -> np.ndarray:
-    return 0.1 * np.random.default_rng(seed).standard_normal(int(seconds * rate)).astype(np.float32)
-
-
-@pytest.mark.parametrize("snr", [-5.0, 20.0])
-def test_si_sdr_is_the_ratio_and_ignores_scale_and_mean(snr: float) -> None:
-    clean, disturbance = noise(12, 1), noise(12, 2) * 10 ** (-snr / 20)
-    assert si_sdr(clean, 0.1 * (clean + disturbance) + 5) == pytest.approx(snr, abs=0.1)
-
-
-@pytest.mark.parametrize("delay", [0, 7, 320])
-def test_alignment_finds_the_delay(delay: int) -> None:
-    clean = noise(1, 3)
-    result = np.concatenate([np.zeros(delay, np.float32), 0.5 * clean])[: len(clean)]
-    reference, shifted = metrics.aligned(clean, result, 16000)
-    assert len(reference) == len(clean) - delay
-    assert np.allclose(shifted, 0.5 * reference)
-
-
-def test_pauses() -> None:
-    rate = 16000
-    speech = np.concatenate([np.zeros(rate, np.float32), noise(1, 3), np.zeros(rate, np.float32)])
-    quiet = np.flatnonzero(np.diff(pauses_of(speech, rate).astype(int)))
-    assert quiet.tolist() == [int(0.97 * rate) - 1, int(2.34 * rate) - 1]
-    noisy = speech + 0.1 * noise(3, 2)
-    result = np.where(np.arange(3 * rate) // rate == 1, noisy, 0.1 * noisy)
-    assert metrics.pause_attenuation(speech, noisy, result, rate) == pytest.approx(20, abs=0.5)
-    assert np.isnan(metrics.pause_attenuation(speech[rate : 2 * rate], noisy, noisy, rate))
-
-
-def test_areas_and_thresholds() -> None:
-    labels = np.array([True, True, False, False])
-    assert roc_auc(np.array([0.9, 0.4, 0.4, 0.1]), labels) == pytest.approx(0.875)
-    assert best_f1(np.array([0.9, 0.8, 0.4, 0.1]), labels) == (1.0, 0.8)
-    labels, rising = np.array([False] * 50 + [True] * 50), np.arange(100.0)
-    assert [roc_auc(scores, labels) for scores in (rising, -rising, 0 * rising)] == [1.0, 0.0, 0.5]
-    assert best_f1(rising, labels) == (1.0, 50.0)
-    assert [quick_threshold(rising, labels, slack) for slack in (0.0, 0.02)] == [50.0, 48.0]  # F1 98 of 100
-
-
 def test_pairs_have_the_named_ratio(pairs: Path) -> None:
     listing = json.loads((pairs / "pairs.json").read_text())
     assert [p["clean_only"] for p in listing] == [False] * 4 + [True]
     for pair in listing:
         noisy, clean = (soundfile.read(pairs / part / f"{pair['name']}.wav")[0] for part in ("noisy", "clean"))
-        assert len(noisy) == 256000 and np.abs(clean[:30000]).max() < 1e-4
-        if pair["clean_only"]:
-            assert np.array_equal(noisy, clean)
-        else:
-            ratio = 20 * np.log10(active_level(clean, 32000) / active_level(noisy - clean, 32000))
-            assert abs(ratio - pair["snr_db"]) < 0.5
+        assert len(noisy) == 256000 and np.abs(clean[:30000]).max() < 1e-4, "a second of noise before the first word"
+        noise = active_level(noisy - clean, 32000)
+        expected = active_level(clean, 32000) * 10 ** (-pair["snr_db"] / 20) if not pair["clean_only"] else 0.0
+        assert noise == pytest.approx(expected, rel=0.05)
 
 
 def test_tables(pairs: Path, capsys: pytest.CaptureFixture, monkeypatch: pytest.MonkeyPatch) -> None:
@@ -96,34 +96,33 @@ def test_tables(pairs: Path, capsys: pytest.CaptureFixture, monkeypatch: pytest.
     assert means == pytest.approx([float(rows[1][1]), float(rows[1][3])], abs=0.06), "one pair of each ratio"
 
 
-def test_digital_silence_is_scored_and_systems_are_compared_over_the_same_recordings(pairs: Path) -> None:
-    noisy, rate = soundfile.read(next((pairs / "noisy").glob("fan*.wav")), dtype="float32")
-    row = score.score_pair(noisy, soundfile.read(next((pairs / "clean").glob("fan*.wav")))[0], rate, lambda x, _: 0 * x)
-    assert np.isnan(row["pesq"]) and np.isnan(row["si_sdr"])
-    good = [{"name": "a", "pesq": 2.0}, {"name": "b", "pesq": 4.0}]
-    bad = [{"name": "a", "pesq": 1.0}, {"name": "b", "pesq": float("nan")}]
-    means = score.means({"good": good, "bad": bad})
-    assert means["good"]["pesq"] == 2.0 and means["bad"]["pesq"] == 1.0
-    assert score.omissions({"good": good, "bad": bad}) == ["bad has no PESQ on 1 recordings: b"]
+def test_systems_are_compared_over_the_same_recordings_digital_silence_or_not() -> None:
+    clean = noise(2, 1)
+    silent = score.score_pair(clean + noise(2, 2), clean, 16000, lambda samples, _rate: 0 * samples)
+    assert np.isnan(silent["pesq"]) and np.isnan(silent["si_sdr"])
+    results = {
+        "good": [{"name": "a", "pesq": 2.0}, {"name": "b", "pesq": 4.0}],
+        "bad": [{"name": "a", "pesq": 1.0}, {"name": "b", **silent}],
+    }
+    assert [values["pesq"] for values in score.means(results).values()] == [2.0, 1.0]
+    assert "bad has no PESQ on 1 recordings: b" in score.omissions(results)
 
 
-@pytest.mark.parametrize("stem", SUPPRESSORS)
-def test_shipped_suppressors_help_and_do_no_harm(stem: str) -> None:
+@pytest.mark.parametrize(("stem", "rate"), [("NC_small_8k", 8000), ("NC_small_16k", 16000), ("c6.xs.f.ca03f4", 32000)])
+def test_shipped_suppressors_help_and_do_no_harm(stem: str, rate: int) -> None:
     """On the bundled pair. The real figures come from bench/quality; here only what must never break is held."""
     _, process = systems.parse(f"ours={ROOT / 'models' / stem}.mvw")
-    rate = 8000 if stem == "NC_small_8k" else 16000
     noisy, clean = (score.read(ROOT / f"examples/audio/{name}.flac", rate)[0] for name in ("noisy", "clean"))
     row = score.score_pair(noisy, clean, rate, process)
     assert row["si_sdr_gain"] > 3 and row["pause"] > 15
     assert score.score_pair(clean, clean, rate, process)["clean_si_sdr"] > 15
 
 
-def test_noise_levels() -> None:
-    shipped = ROOT / "models/noise_level_16k.mvw"
-    for slope in (0.0, -0.5):
-        hiss = noise_level.coloured(np.random.default_rng(1), slope)
-        hiss *= 10 ** (45 / 20) / np.sqrt(np.mean(hiss**2))
-        assert noise_level.reported(shipped, hiss) == pytest.approx(45, abs=1)
+@pytest.mark.parametrize("slope", [0.0, -0.5])
+def test_the_shipped_level_of_steady_noise(slope: float) -> None:
+    hiss = noise_level.coloured(np.random.default_rng(1), slope)
+    hiss *= 10 ** (45 / 20) / np.sqrt(np.mean(hiss**2))
+    assert noise_level.reported(ROOT / "models/noise_level_16k.mvw", hiss) == pytest.approx(45, abs=1)
 
 
 def test_onset_is_counted_from_the_words_start() -> None:
@@ -134,27 +133,21 @@ def test_onset_is_counted_from_the_words_start() -> None:
     assert voice.rises(scores, blocks) == [True, True, False]
 
 
-def test_voice_tables(pairs: Path) -> None:
-    chosen = dict(
-        [voice.parse(f"ours={ROOT}/models/VAD_weight.mvw"), voice.parse("peer=printf 'time,score\n0,0.2\n4,0.7\n'")]
-    )
+def test_voice_tables(pairs: Path, tmp_path: Path) -> None:
+    """On pairs, and on recordings with labels of one's own."""
+    peer = "peer=printf 'time,score\n0,0.2\n4,0.7\n'"
+    chosen = dict([voice.parse(f"ours={ROOT}/models/VAD_weight.mvw"), voice.parse(peer)])
     recordings = voice.read_recordings(pairs, 2)
     text = voice.frame_table(chosen, recordings) + voice.snr_table(chosen, recordings)
-    assert all(f"| ours | {ms} ms |" in text for ms in (10, 20, 30, 40))
-    assert all(f"| {name} | {recordings[0].snr_db:g} dB |" in text for name in chosen)
+    wanted = [f"| ours | {ms} ms |" for ms in (10, 20, 30, 40)]
+    assert all(part in text for part in [*wanted, *(f"| {name} | {recordings[0].snr_db:g} dB |" for name in chosen)])
     scores = chosen["peer"](recordings[0].noisy, recordings[0].rate, 2)
-    assert scores[0] == scores[199] == pytest.approx(0.2) and scores[200] == scores[-1] == pytest.approx(0.7)
-    with pytest.raises(SystemExit, match="neither"):
-        voice.parse("nothing")
+    assert scores[[0, 199, 200, -1]] == pytest.approx([0.2, 0.2, 0.7, 0.7])
+    assert "| 100.0% |" in voice.false_alarms({"click": [np.ones(32000)]}, {"always": lambda *_: np.ones(100)})
 
-
-def test_voice_labels_of_ones_own(tmp_path: Path) -> None:
-    for name in ("audio", "labels"):
-        (tmp_path / name).mkdir()
+    (tmp_path / "audio").mkdir()
+    (tmp_path / "labels").mkdir()
     soundfile.write(tmp_path / "audio" / "talk.flac", np.zeros((48000, 2)), 16000)
     (tmp_path / "labels" / "talk.txt").write_text("0.500000\t1.250000\tyes\n\n2.0,2.1\n")
     (recording,) = voice.read_recordings(tmp_path, 0)
     assert np.flatnonzero(np.diff(recording.voice.astype(int))).tolist() == [49, 124, 199, 209]
-    told = {"told": lambda samples, rate, blocks: recording.voice[: 300 // blocks * blocks : blocks] * 1.0}
-    assert "| told | 10 ms | 1.0000 | 1.0000 | 1.0000 | 1.0000 |" in voice.frame_table(told, [recording])
-    assert "| 100.0% |" in voice.false_alarms({"click": [np.ones(32000)]}, {"always": lambda *_: np.ones(100)})

@@ -14,6 +14,7 @@ from morva_training.mixing import Recipe
 from morva_training.spectra import FULL_32K, SMALL_16K
 
 CPU = torch.device("cpu")
+NOTHING = dict.fromkeys(vars(LossWeights()), 0.0)
 
 
 @pytest.fixture(scope="module")
@@ -43,53 +44,42 @@ def test_band_sums_are_exact_for_masked_spectra() -> None:
 
 def test_better_masks_score_better(batch: Batch) -> None:
     """The best mask beats none and silence, and each term alone ranks it above its own worst."""
+    none, silence = (torch.full_like(batch.features, value) for value in (9.0, -9.0))
     good = torch.logit((batch.product / batch.noisy_power).clamp(1e-4, 0.9999).sqrt())
-    others = [torch.full_like(batch.features, value) for value in (9.0, 0.0, -9.0)]
-    loss = MaskLoss(FULL_32K, LossWeights(), CPU)
-    assert all(loss(good, batch)[0] < loss(other, batch)[0] for other in others)
-    for term in vars(LossWeights()):
-        alone = MaskLoss(FULL_32K, LossWeights(**{**dict.fromkeys(vars(LossWeights()), 0.0), term: 1.0}), CPU)
-        logits = torch.full_like(batch.features, 0.5).requires_grad_()
-        alone(logits, batch)[0].backward()
-        assert logits.grad.isfinite().all() and logits.grad.abs().sum() > 0, term
-        worst = others[0] if term in ("phase", "pause") else others[2]
+    everything = MaskLoss(FULL_32K, LossWeights(), CPU)
+    assert all(everything(good, batch)[0] < everything(other, batch)[0] for other in (none, silence))
+    for term in NOTHING:
+        alone = MaskLoss(FULL_32K, LossWeights(**{**NOTHING, term: 1.0}), CPU)
+        worst = none if term in ("phase", "pause") else silence
         assert alone(good, batch)[0] < alone(worst, batch)[0], term
+
+    noise = (batch.noisy_power - 2 * batch.product + batch.speech_power).clamp_min(1e-9)
+    good = torch.logit((1 - (noise / batch.noisy_power).sqrt()).clamp(1e-4, 0.9999).sqrt())
+    level = LevelLoss(FULL_32K, LEVEL_WEIGHTS, CPU, mask_share=0.0)
+    assert level(good, batch)[1]["level_error_db"] < 1.0
+    assert all(level(good, batch)[0] < level(other, batch)[0] for other in (none, silence))
 
 
 def test_narrow_recordings_have_little_say_above_their_band(batch: Batch) -> None:
     loss = MaskLoss(FULL_32K, LossWeights(pause=0.0, loudness=0.0), CPU)
     logits = torch.zeros_like(batch.features).requires_grad_()
     loss(logits, batch)[0].backward()
-    narrow = ~batch.wideband
-    assert narrow.any() and batch.wideband.any() and batch.wideband[~batch.has_speech].all()
-    edge = logits.grad[narrow][:, :, 76:80]  # 7.2 to 8 kHz: neither speech nor silence is certain
-    assert edge.abs().max() == 0
+    narrow = logits.grad[~batch.wideband]
+    assert len(narrow) and batch.wideband[~batch.has_speech].all()
+    assert narrow[:, :, 76:80].abs().max() == 0, "7.2 to 8 kHz: neither speech nor silence is certain"
+    assert narrow[:, :, 82:].sum() > 0, "the only lesson there is to close the mask"
     assert (loss.trusted[81:] > 0).all() and (loss.trusted[81:] < 0.5).all()
-    assert logits.grad[narrow][:, :, 82:].sum() > 0, "the only lesson there is to close the mask"
     assert logits.grad[batch.wideband][:, :, 80:].abs().max() > 0
 
 
-def test_quality_of_identity_and_its_order(batch: Batch) -> None:
-    model = LoudnessModel(FULL_32K, CPU)
-    speech, noise = batch.speech_power[batch.has_speech], batch.noisy_power[batch.has_speech]
+def test_quality_of_identity_at_any_level(batch: Batch) -> None:
+    speech, model = batch.speech_power[batch.has_speech], LoudnessModel(FULL_32K, CPU)
     identity = model.quality(speech, speech)
     assert (identity > 4.3).all() and torch.allclose(model.quality(speech, 4.0 * speech), identity, atol=1e-2)
-    scores = [model.quality(speech, speech + share * noise).mean() for share in (0.001, 0.03, 1.0)]
-    assert scores[0] > scores[1] > scores[2]
 
 
 def test_pauses_stay_clear_of_speech() -> None:
     power = torch.full((2, 60, 3), 1e-9)
     power[:, 20:30] = 1.0
     silent = pause_frames(power, torch.tensor([True, False]))
-    assert silent[0].nonzero().flatten().tolist() == [*range(18), *range(32, 60)]
-    assert silent[1].all()
-
-
-def test_level_loss_is_least_for_the_mask_that_removes_the_noise(batch: Batch) -> None:
-    loss = LevelLoss(FULL_32K, LEVEL_WEIGHTS, CPU, mask_share=0.0)
-    noise = (batch.noisy_power - 2 * batch.product + batch.speech_power).clamp_min(1e-9)
-    gain = (1 - (noise / batch.noisy_power).sqrt()).clamp(1e-4, 0.9999)
-    good, parts = loss(torch.logit(gain.sqrt()), batch)
-    assert parts["level_error_db"] < 1.0
-    assert all(good < loss(torch.full_like(batch.features, value), batch)[0] for value in (-9.0, 9.0))
+    assert silent[0].nonzero().flatten().tolist() == [*range(18), *range(32, 60)] and silent[1].all()
