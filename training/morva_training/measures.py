@@ -108,8 +108,10 @@ def roc_auc(scores: np.ndarray, labels: np.ndarray) -> float:
 def f1_of_thresholds(scores: np.ndarray, labels: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
     """The thresholds from high to low, and the F1 of what lies at or above each."""
     order = np.argsort(-scores)
-    hits = np.cumsum(labels[order])
-    return scores[order], 2 * hits / (np.arange(1, len(scores) + 1) + labels.sum())
+    thresholds, hits = scores[order], np.cumsum(labels[order])
+    f1 = 2 * hits / (np.arange(1, len(scores) + 1) + labels.sum())
+    whole = np.append(np.diff(thresholds) != 0, True)  # equal scores pass together
+    return thresholds[whole], f1[whole]
 
 
 def best_f1(scores: np.ndarray, labels: np.ndarray) -> tuple[float, float]:

@@ -26,8 +26,8 @@ def voice_like(rng: np.random.Generator, seconds: float) -> np.ndarray:
 
 
 @pytest.fixture(scope="session")
-def data(tmp_path_factory: pytest.TempPathFactory) -> tuple[Path, dict[str, list[corpus.Row]]]:
-    """Eight speakers, fourteen noises and two rooms, with their tables; the last of each are held out."""
+def store(tmp_path_factory: pytest.TempPathFactory) -> Path:
+    """A store of eight speakers, fourteen noises and two rooms; the last of each are held out."""
     root, rng = tmp_path_factory.mktemp("audio"), np.random.default_rng(11)
     tables: dict[str, list[corpus.Row]] = {"speech": [], "noise": [], "rir": []}
 
@@ -43,11 +43,5 @@ def data(tmp_path_factory: pytest.TempPathFactory) -> tuple[Path, dict[str, list
         add("noise", n, 0.1 * rng.standard_normal(96000), 11, category=("fan", "music")[n % 2], author=link)
     for n in range(2):
         add("rir", n, np.concatenate([np.zeros(80), [0.9], 0.02 * rng.standard_normal(4000)]), 0)
-    return root, tables
-
-
-@pytest.fixture(scope="session")
-def store(data, tmp_path_factory: pytest.TempPathFactory) -> Path:
-    out = tmp_path_factory.mktemp("store")
-    corpus.build(data[1], data[0], out)
-    return out
+    corpus.build(tables, root, root / "store")
+    return root / "store"
