@@ -39,7 +39,7 @@ class BuildWithEngine(build_py):
         (bundled / "models").mkdir(parents=True)
         shutil.copyfile(engine_library(), bundled / "libmorva.so")
         for model in (ROOT / "models").iterdir():
-            if model.suffix in (".mvw", ".md"):
+            if model.suffix in (".mvw", ".md", ".json"):
                 shutil.copyfile(model, bundled / "models" / model.name)
 
 

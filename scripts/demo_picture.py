@@ -7,6 +7,7 @@ CLEAN is the speech in NOISY without its noise; the three files are mono, of one
 """
 
 import sys
+from pathlib import Path
 
 import matplotlib
 
@@ -16,21 +17,9 @@ import numpy as np
 import soundfile
 from PIL import Image
 
+sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "training"))
 
-def db(power: float) -> float:
-    return 10 * np.log10(power + 1e-12)
-
-
-def pauses(clean: np.ndarray, rate: int) -> np.ndarray:
-    """True where nobody has spoken for 100 ms and nobody will within 100 ms."""
-    width = rate // 5
-    around = np.convolve(clean**2, np.ones(width) / width, "same")
-    return around < 1e-5 * np.max(around)
-
-
-def si_sdr(sound: np.ndarray, clean: np.ndarray) -> float:
-    target = clean * (sound @ clean) / (clean @ clean)
-    return db(np.sum(target**2)) - db(np.sum((sound - target) ** 2))
+from morva_training.measures import level_db, pauses_of, si_sdr  # noqa: E402
 
 
 def draw(sounds: dict[str, np.ndarray], rate: int, path: str) -> None:
@@ -53,10 +42,10 @@ def main() -> None:
     noisy, rate = soundfile.read(noisy_path)
     clean, _ = soundfile.read(clean_path)
     cleaned, _ = soundfile.read(cleaned_path)
-    quiet = pauses(clean, rate)
-    before, after = db(np.mean(noisy[quiet] ** 2)), db(np.mean(cleaned[quiet] ** 2))
+    quiet = pauses_of(clean, rate)
+    before, after = level_db(noisy[quiet]), level_db(cleaned[quiet])
     print(f"noise in pauses   {before:6.1f} dBFS -> {after:6.1f} dBFS   ({before - after:.1f} dB quieter)")
-    before, after = si_sdr(noisy, clean), si_sdr(cleaned, clean)
+    before, after = si_sdr(clean, noisy), si_sdr(clean, cleaned)
     print(f"SI-SDR            {before:6.1f} dB   -> {after:6.1f} dB     ({after - before:+.1f} dB)")
     draw({"Before": noisy, "After": cleaned, "The speech without noise, for comparison": clean}, rate, picture)
 

@@ -12,45 +12,38 @@ from __future__ import annotations
 
 import argparse
 import json
-import sys
 from pathlib import Path
 
 import numpy as np
 import soundfile
 
-sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "training"))
-
-from morva_training.corpus import BASE_RATE, Clip, Store  # noqa: E402
-from morva_training.mixing import active_level, in_dev  # noqa: E402
+import tree  # noqa: F401
+from morva_training.corpus import BASE_RATE, Clip, Corpus
+from morva_training.measures import active_level
 
 SNRS_DB = (-5, 0, 5, 10, 15)
 SECONDS = 8.0
 BABBLERS = 6
 
 
-def by_category(store: Store, kind: str, split: str) -> dict[str, list[Clip]]:
-    """Recordings by speaker or category; "dev" is the share of the training split kept for validation."""
-    clips = [c for c in store.of_split("train") if in_dev(c, kind)] if split == "dev" else store.of_split(split)
-    groups: dict[str, list[Clip]] = {}
-    for clip in clips:
-        groups.setdefault(clip.category, []).append(clip)
-    return groups
-
-
-def talkers(store: Store, split: str) -> dict[str, list[Clip]]:
+def talkers(corpus: Corpus, split: str) -> dict[str, list[Clip]]:
     """Speakers with more than two seconds of speech."""
-    voices = by_category(store, "speech", split)
+    voices = corpus.groups("speech", split)
     return {name: clips for name, clips in voices.items() if sum(c.length for c in clips) > 2 * BASE_RATE}
 
 
-def sentences(rng: np.random.Generator, store: Store, clips: list[Clip]) -> np.ndarray:
+def scaled(samples: np.ndarray, level: float) -> np.ndarray:
+    return samples * level / (active_level(samples, BASE_RATE) + 1e-3)
+
+
+def sentences(rng: np.random.Generator, corpus: Corpus, clips: list[Clip]) -> np.ndarray:
     """One speaker's recordings with pauses; the recordings' own edges are kept."""
     out = np.zeros(int(SECONDS * BASE_RATE), np.float32)
     position = BASE_RATE
     while position < len(out) - BASE_RATE:
         clip = clips[rng.integers(len(clips))]
         longest = min(len(out) - position, 4 * BASE_RATE)
-        piece = store.read(clip, 0, longest)
+        piece = corpus.read(clip, 0, longest)
         fade = min(len(piece), BASE_RATE // 50)
         piece[-fade:] *= np.linspace(1, 0, fade, dtype=np.float32)
         out[position : position + len(piece)] = piece
@@ -58,27 +51,27 @@ def sentences(rng: np.random.Generator, store: Store, clips: list[Clip]) -> np.n
     return out
 
 
-def noise_of(rng: np.random.Generator, store: Store, clips: list[Clip]) -> np.ndarray:
+def noise_of(rng: np.random.Generator, corpus: Corpus, clips: list[Clip]) -> np.ndarray:
     """One recording, repeated to the full length."""
     clip = clips[rng.integers(len(clips))]
-    samples = store.read(clip)
+    samples = corpus.read(clip)
     count = int(SECONDS * BASE_RATE)
     return np.tile(samples, -(-count // len(samples)))[:count]
 
 
-def babble_of(rng: np.random.Generator, store: Store, voices: dict[str, list[Clip]]) -> np.ndarray:
+def babble_of(rng: np.random.Generator, corpus: Corpus, voices: dict[str, list[Clip]]) -> np.ndarray:
     total = np.zeros(int(SECONDS * BASE_RATE), np.float32)
     for name in rng.choice(sorted(voices), BABBLERS, replace=False):
-        samples = np.concatenate([store.read(c) for c in voices[name]])
+        samples = np.concatenate([corpus.read(c) for c in voices[name]])
         samples = np.tile(samples, -(-len(total) // len(samples)))[: len(total)]
-        total += samples / (active_level(samples) + 1e-3)
+        total += scaled(samples, 1.0)
     return total
 
 
 def make(store: Path, out: Path, count: int, clean_count: int, seed: int, split: str) -> None:
     rng = np.random.default_rng(seed)
-    speech, noise = Store(store, "speech"), Store(store, "noise")
-    voices, noises = talkers(speech, split), by_category(noise, "noise", split)
+    corpus = Corpus(store)
+    voices, noises = talkers(corpus, split), corpus.groups("noise", split)
     names, kinds = sorted(voices), sorted(noises) + ["babble"]
     listing = []
     for folder in ("noisy", "clean"):
@@ -86,19 +79,19 @@ def make(store: Path, out: Path, count: int, clean_count: int, seed: int, split:
     for number in range(count + clean_count):
         clean_only = number >= count
         speaker = names[number * 7 % len(names)] if number < len(names) else str(rng.choice(names))
-        voice = sentences(rng, speech, voices[speaker])
+        voice = sentences(rng, corpus, voices[speaker])
         kind = "" if clean_only else kinds[number % len(kinds)]
         snr = None if clean_only else SNRS_DB[(number // len(kinds) + number) % len(SNRS_DB)]
         level = 32768 * 10 ** (rng.uniform(-30, -18) / 20)
-        voice *= level / (active_level(voice) + 1e-3)
+        voice = scaled(voice, level)
         mixed = voice.copy()
         if not clean_only:
             disturbance = (
-                babble_of(rng, speech, {k: v for k, v in voices.items() if k != speaker})
+                babble_of(rng, corpus, {k: v for k, v in voices.items() if k != speaker})
                 if kind == "babble"
-                else noise_of(rng, noise, noises[kind])
+                else noise_of(rng, corpus, noises[kind])
             )
-            mixed += disturbance * level / (active_level(disturbance) + 1e-3) * 10 ** (-snr / 20)
+            mixed += scaled(disturbance, level * 10 ** (-snr / 20))
         peak = np.abs(mixed).max()
         scale = min(1.0, 32000.0 / peak)
         stem = f"clean-{number - count:03d}" if clean_only else f"{kind}-{number:03d}"

@@ -14,11 +14,11 @@ from pathlib import Path
 
 import numpy as np
 
-import systems  # noqa: F401  (makes the training package importable)
-from morva_training import mvw
-from morva_training.corpus import Store
-from morva_training.engine import NoiseLevelModel
-from morva_training.mixing import active_level
+import tree  # noqa: F401
+from morva_training.corpus import Corpus
+from morva_training.measures import active_level
+
+import morva
 
 RATE = 16000
 SECONDS = 6
@@ -32,12 +32,11 @@ def coloured(rng: np.random.Generator, slope: float) -> np.ndarray:
     return np.fft.irfft(spectrum * (frequency / 1000.0) ** slope)
 
 
-def steady_noises(store: Path, split: str) -> dict[str, np.ndarray]:
+def steady_noises(corpus: Corpus, split: str) -> dict[str, np.ndarray]:
     rng = np.random.default_rng(1)
     noises = {"white": coloured(rng, 0.0), "pink": coloured(rng, -0.5), "brown": coloured(rng, -1.0)}
-    recorded = Store(store, "noise", RATE)
-    for clip in recorded.of_split(split):
-        samples = recorded.read(clip)
+    for clip in corpus.clips("noise", split):
+        samples = corpus.read(clip)
         if len(samples) < 3 * RATE:
             continue
         blocks = samples[: len(samples) // 1600 * 1600].reshape(-1, 1600)
@@ -47,18 +46,15 @@ def steady_noises(store: Path, split: str) -> dict[str, np.ndarray]:
     return noises
 
 
-def reported(weight: mvw.Weight, samples: np.ndarray) -> float:
-    model = NoiseLevelModel(weight)
-    hop = RATE // 100
-    levels = [model.level(samples[at : at + hop]) for at in range(0, len(samples) // hop * hop, hop)]
+def reported(weight: Path, samples: np.ndarray) -> float:
+    levels = morva.noise_level(samples / 32768, RATE, model=str(weight.resolve()))
     return float(np.median(levels[200:]))
 
 
-def speech_of(store: Path, split: str) -> np.ndarray:
+def speech_of(corpus: Corpus, split: str) -> np.ndarray:
     """Six seconds of one held-out speaker, the one with the longest recording."""
-    voices = Store(store, "speech", RATE)
-    clips = sorted(voices.of_split(split), key=lambda clip: -clip.length)
-    speech = np.concatenate([voices.read(c) for c in clips if c.category == clips[0].category])
+    clips = sorted(corpus.clips("speech", split), key=lambda clip: -clip.length)
+    speech = np.concatenate([corpus.read(c) for c in clips if c.group == clips[0].group])
     return np.tile(speech, 1 + SECONDS * RATE // len(speech))[: SECONDS * RATE]
 
 
@@ -68,19 +64,19 @@ def main() -> None:
     parser.add_argument("--store", type=Path, required=True)
     parser.add_argument("--split", default="heldout")
     args = parser.parse_args()
-    weight = mvw.read(args.weight)
-    speech = speech_of(args.store, args.split)
-    speech *= 10 ** (SPEECH_DB / 20) / active_level(speech, RATE // 50)
+    corpus = Corpus(args.store, RATE)
+    speech = speech_of(corpus, args.split)
+    speech *= 10 ** (SPEECH_DB / 20) / active_level(speech, RATE)
     errors: dict[str, list[float]] = {}
     print("| noise | error alone, dB | error under speech (SNR 27, 12, 0 dB), dB |\n|---|---|---|")
-    for name, noise in steady_noises(args.store, args.split).items():
+    for name, noise in steady_noises(corpus, args.split).items():
         unit = noise / np.sqrt(np.mean(np.square(noise)))
         row: dict[str, list[float]] = {"alone": [], "spoken": []}
         for db in LEVELS_DB:
             alone = unit * 10 ** (db / 20)
-            row["alone"].append(reported(weight, np.clip(alone, -32768, 32767)) - db)
+            row["alone"].append(reported(args.weight, np.clip(alone, -32768, 32767)) - db)
             if db >= 35:
-                row["spoken"].append(reported(weight, np.clip(alone + speech, -32768, 32767)) - db)
+                row["spoken"].append(reported(args.weight, np.clip(alone + speech, -32768, 32767)) - db)
                 errors.setdefault(f"under speech, SNR {SPEECH_DB - db:.0f} dB", []).append(row["spoken"][-1])
         errors.setdefault("alone", []).extend(row["alone"])
         print(f"| {name} | " + " | ".join(", ".join(f"{e:+.1f}" for e in part) for part in row.values()) + " |")

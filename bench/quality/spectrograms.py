@@ -24,9 +24,10 @@ import matplotlib.pyplot as plt  # noqa: E402
 from PIL import Image  # noqa: E402
 
 import metrics  # noqa: E402
+import mixtures  # noqa: E402
 import systems  # noqa: E402
-from morva_training.corpus import BASE_RATE, Store  # noqa: E402
-from morva_training.mixing import active_level  # noqa: E402
+from morva_training.corpus import BASE_RATE, Corpus  # noqa: E402
+from morva_training.measures import si_sdr  # noqa: E402
 
 SECONDS = 6
 
@@ -55,7 +56,7 @@ EXAMPLES = (
 
 class Material:
     def __init__(self, store: Path, seed: int) -> None:
-        self.speech, self.noise = Store(store, "speech"), Store(store, "noise")
+        self.corpus = Corpus(store)
         self.rng = np.random.default_rng(seed)
         self.count = SECONDS * BASE_RATE
 
@@ -63,24 +64,24 @@ class Material:
         return np.tile(samples, -(-self.count // len(samples)))[: self.count]
 
     def talk(self) -> np.ndarray:
-        clips = [c for c in self.speech.of_split("heldout") if c.length > 3 * BASE_RATE]
+        clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 3 * BASE_RATE]
         clip = clips[self.rng.integers(len(clips))]
         out = np.zeros(self.count, np.float32)
         start = BASE_RATE
-        samples = self.speech.read(clip)[: self.count - start]
+        samples = self.corpus.read(clip)[: self.count - start]
         out[start : start + len(samples)] = samples
         return out
 
     def shout(self) -> np.ndarray:
         """The held-out recording of acted emotions with the brightest voice."""
-        clips = [c for c in self.speech.of_split("heldout") if "emodb" in c.path]
+        clips = [c for c in self.corpus.clips("speech", "heldout") if "emodb" in c.path]
 
         def brightness(samples: np.ndarray) -> float:
             power = np.abs(np.fft.rfft(samples)) ** 2
             return float((power * np.arange(len(power))).sum() / power.sum() / len(power))
 
-        loud = max(clips, key=lambda c: brightness(self.speech.read(c)))
-        return self.fitted(np.concatenate([np.zeros(BASE_RATE, np.float32), self.speech.read(loud)]))
+        loud = max(clips, key=lambda c: brightness(self.corpus.read(c)))
+        return self.fitted(np.concatenate([np.zeros(BASE_RATE, np.float32), self.corpus.read(loud)]))
 
     def whisper(self) -> np.ndarray:
         with tempfile.NamedTemporaryFile(suffix=".wav") as file:
@@ -92,23 +93,22 @@ class Material:
 
     def disturbance(self, category: str) -> np.ndarray:
         if category == "babble":
-            clips = [c for c in self.speech.of_split("heldout") if c.length > 2 * BASE_RATE]
+            clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 2 * BASE_RATE]
             chosen = self.rng.choice(len(clips), 6, replace=False)
-            voices = [self.fitted(self.speech.read(clips[i])) for i in chosen]
-            return np.sum([v / (active_level(v) + 1e-3) for v in voices], axis=0)
-        clips = [c for c in self.noise.of_split("heldout") if c.category == category]
-        return self.fitted(self.noise.read(max(clips, key=lambda c: c.length)))
+            voices = [self.fitted(self.corpus.read(clips[i])) for i in chosen]
+            return np.sum([mixtures.scaled(v, 1.0) for v in voices], axis=0)
+        clips = self.corpus.groups("noise", "heldout")[category]
+        return self.fitted(self.corpus.read(max(clips, key=lambda c: c.length)))
 
 
 def mixture(material: Material, example: Example) -> tuple[np.ndarray, np.ndarray]:
     """Noisy and clean, -1..1."""
     voice = {"": material.talk, "whisper": material.whisper, "shout": material.shout}[example.voice]()
     level = 10 ** ((-14 if example.voice == "shout" else -24) / 20)
-    voice = voice * level / (active_level(voice) + 1e-3)
+    voice = mixtures.scaled(voice, level)
     if not example.noise:
         return voice, voice
-    noise = material.disturbance(example.noise)
-    noise = noise * level / (active_level(noise) + 1e-3) * 10 ** (-example.snr_db / 20)
+    noise = mixtures.scaled(material.disturbance(example.noise), level * 10 ** (-example.snr_db / 20))
     return np.clip(voice + noise, -1, 1).astype(np.float32), voice
 
 
@@ -139,7 +139,7 @@ def main() -> None:
     for number, example in enumerate(EXAMPLES):
         noisy, clean = mixture(Material(args.store, args.seed + number), example)
         result = process(noisy, BASE_RATE)
-        before, after = metrics.si_sdr(clean, noisy), metrics.si_sdr(clean, result)
+        before, after = si_sdr(clean, noisy), si_sdr(clean, result)
         quality = [metrics.pesq_score(clean, x, BASE_RATE) for x in (noisy, result)]
         pause = metrics.pause_attenuation(clean, noisy, result, BASE_RATE)
         title = f"{example.name}: PESQ {quality[0]:.2f} to {quality[1]:.2f}"

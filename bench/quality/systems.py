@@ -2,7 +2,7 @@
 
 A system is named on the command line:
     none                 the input as it is
-    NAME=model.mvw       a noise model, run by the NumPy reference of the engine
+    NAME=model.mvw       a noise model, run by the engine
     NAME=command         any program called as `command in.wav out.wav`
 """
 
@@ -10,7 +10,6 @@ from __future__ import annotations
 
 import shlex
 import subprocess
-import sys
 import tempfile
 from pathlib import Path
 from typing import Callable
@@ -18,29 +17,16 @@ from typing import Callable
 import numpy as np
 import soundfile
 
-sys.path.insert(0, str(Path(__file__).resolve().parents[2] / "training"))
+import tree  # noqa: F401
+from metrics import at_rate
 
-from morva_training import mvw  # noqa: E402
-from morva_training.engine import NoiseModel  # noqa: E402
-
-from metrics import at_rate  # noqa: E402
+import morva
 
 Process = Callable[[np.ndarray, int], np.ndarray]
 
 
 def from_weight(path: Path) -> Process:
-    weight = mvw.read(path)
-
-    def process(samples: np.ndarray, rate: int) -> np.ndarray:
-        model = NoiseModel(weight)
-        at_model = at_rate(samples, rate, model.layout.rate) * 32768.0
-        hop = model.layout.hop
-        padded = np.append(at_model, np.zeros(3 * hop - len(at_model) % hop, np.float32))
-        clean = np.concatenate([model.process(padded[i : i + hop]) for i in range(0, len(padded), hop)])
-        clean = clean[hop : hop + len(at_model)]  # the model's delay
-        return at_rate(clean / 32768.0, model.layout.rate, rate)[: len(samples)]
-
-    return process
+    return lambda samples, rate: morva.denoise(samples, rate, model=str(path.resolve()))
 
 
 def from_command(command: str) -> Process:

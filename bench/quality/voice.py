@@ -36,25 +36,22 @@ import soundfile
 
 import metrics
 import mixtures
-import systems  # noqa: F401  (makes the training package importable)
-from morva_training import mvw
-from morva_training.corpus import BASE_RATE, Store
-from morva_training.engine import VoiceModel
-from morva_training.voice import BLOCK, RATE, block_labels, frame_labels
+import tree  # noqa: F401
+from morva_training.corpus import BASE_RATE, Corpus
+from morva_training.measures import best_f1, block_labels, frame_labels, roc_auc
+
+import morva
 
 FOOLING = (
     "music", "keyboard", "mouse_click", "human_nonspeech", "snoring", "baby_cry", "animal", "cat", "dog_bark",
     "vacuum", "rain", "birds",
 )  # fmt: skip
+LABEL_RATE = 8000
 BABBLE_RMS = 1000.0  # of each talker
 RISE = 0.05
 COLLAR_BLOCKS = 5  # of 10 ms, on both sides of a start or end
 
 Scorer = Callable[[np.ndarray, int, int], np.ndarray]  # samples, rate, blocks per frame -> score per frame
-
-
-def on_model_scale(samples: np.ndarray, rate: int) -> np.ndarray:
-    return np.clip(np.rint(metrics.at_rate(samples, rate, RATE) * 32768), -32768, 32767).astype(np.float32)
 
 
 def remembered(scorer: Scorer) -> Scorer:
@@ -70,10 +67,10 @@ def remembered(scorer: Scorer) -> Scorer:
     return scores
 
 
-def from_weight(weight: mvw.Weight) -> Scorer:
+def from_weight(path: Path) -> Scorer:
     def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
-        model, x, frame = VoiceModel(weight), on_model_scale(samples, rate), blocks * BLOCK
-        return np.array([model.score(x[at : at + frame]) for at in range(0, len(x) - frame + 1, frame)])
+        heard = metrics.at_rate(samples, rate, LABEL_RATE)  # its own rate, as peers get theirs
+        return morva.voice(heard, LABEL_RATE, frame_ms=10 * blocks, model=str(path.resolve()))
 
     return remembered(scores)
 
@@ -97,7 +94,7 @@ def parse(text: str) -> tuple[str, Scorer]:
     if not rest:
         raise SystemExit(f"{text!r} is neither NAME=model.mvw nor NAME=command")
     is_weight = rest.endswith(".mvw") and Path(rest).is_file()
-    return name, from_weight(mvw.read(Path(rest))) if is_weight else from_command(rest)
+    return name, from_weight(Path(rest)) if is_weight else from_command(rest)
 
 
 @dataclass
@@ -161,7 +158,8 @@ def read_recordings(folder: Path, limit: int) -> list[Recording]:
             voice = labels_of_stretches(folder / "labels" / (file.stem + ".txt"), len(samples) * 100 // rate)
             sure = np.ones(len(voice), np.float32)
         else:
-            voice, sure = block_labels(on_model_scale(*read_sound(folder / "clean" / file.name)))
+            clean = metrics.at_rate(*read_sound(folder / "clean" / file.name), LABEL_RATE)
+            voice, sure = block_labels(clean, LABEL_RATE // 100)
         result.append(Recording(samples, rate, voice, sure, snrs.get(file.stem)))
     return result
 
@@ -196,9 +194,9 @@ def frame_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str
             above = all_.scores > 0.5
             at_half = 2 * (above & all_.voice).sum() / (above.sum() + all_.voice.sum())
             lines.append(
-                f"| {name} | {10 * blocks} ms | {metrics.roc_auc(all_.scores, all_.voice):.4f} "
-                f"| {metrics.roc_auc(all_.scores[all_.inner], all_.voice[all_.inner]):.4f} "
-                f"| {metrics.best_f1(all_.scores, all_.voice)[0]:.4f} | {at_half:.4f} |"
+                f"| {name} | {10 * blocks} ms | {roc_auc(all_.scores, all_.voice):.4f} "
+                f"| {roc_auc(all_.scores[all_.inner], all_.voice[all_.inner]):.4f} "
+                f"| {best_f1(all_.scores, all_.voice)[0]:.4f} | {at_half:.4f} |"
             )
     return "\n".join(lines)
 
@@ -221,19 +219,20 @@ def snr_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str:
                 else "||"
             )
             label = "clean" if snr is None else f"{snr:g} dB"
-            area = metrics.roc_auc(all_.scores, all_.voice)
+            area = roc_auc(all_.scores, all_.voice)
             lines.append(f"| {name} | {label} | {area:.4f} | {len(delays)} | {onset} |")
     return "\n".join(lines)
 
 
 def without_speech(store: Path, split: str) -> dict[str, list[np.ndarray]]:
     """Sounds at the store's base rate, by kind; babble is six talkers at once."""
-    noise, speech = Store(store, "noise"), Store(store, "speech")
-    sounds = {name: [noise.read(c) for c in noise.of_split(split) if c.category == name] for name in FOOLING}
-    voices = mixtures.talkers(speech, split)
+    corpus = Corpus(store)
+    noises = corpus.groups("noise", split)
+    sounds = {name: [corpus.read(c) for c in noises.get(name, [])] for name in FOOLING}
+    voices = mixtures.talkers(corpus, split)
     rng = np.random.default_rng(1)
     if len(voices) >= mixtures.BABBLERS:
-        sounds["babble"] = [mixtures.babble_of(rng, speech, voices) * BABBLE_RMS for _ in range(5)]
+        sounds["babble"] = [mixtures.babble_of(rng, corpus, voices) * BABBLE_RMS for _ in range(5)]
     return {name: parts for name, parts in sounds.items() if parts}
 
 

@@ -4,22 +4,16 @@ from __future__ import annotations
 
 import atexit
 import functools
+import json
 import os
 import threading
 from dataclasses import dataclass
 from pathlib import Path
+from typing import Any
 
 from . import _library
 
 RATES = (8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000)
-
-VOICE_MODEL = "VAD_weight.mvw"
-LEVEL_MODEL = "noise_level_16k.mvw"
-_CLEANING_MODELS = (
-    (8000, "NC_small_8k.mvw"),
-    (16000, "NC_small_16k.mvw"),
-    (96000, "c6.xs.f.ca03f4.mvw"),
-)
 
 
 class EngineError(RuntimeError):
@@ -52,21 +46,23 @@ def check_rate(rate: int) -> int:
     return int(rate)
 
 
-def cleaning_model(rate: int) -> str:
-    """The shipped noise-suppression model for sound of this rate."""
-    return next(name for highest, name in _CLEANING_MODELS if rate <= highest)
+@functools.cache
+def _shipped() -> list[dict[str, Any]]:
+    return json.loads((_library.MODELS / "shipped.json").read_text())
+
+
+def shipped_model(kind: str, rate: int) -> str:
+    """The shipped model's file for sound of this rate; kinds as in the C interface: NC, VAD, NoiseDB."""
+    return next(row["file"] for row in _shipped() if row["kind"] == kind and rate <= row["maxSampleRate"])
 
 
 def _model_file(name: str) -> Path:
     if os.sep in name:
         return Path(name)
-    chosen = os.environ.get("MORVA_MODELS")
-    system = (Path(place) / "share/morva/models" for place in ("/usr", "/usr/local"))
-    folders = [Path(chosen)] if chosen else [_library.BUNDLED / "models", *system]
-    for folder in folders:
-        if (folder / name).exists():
-            return folder / name
-    raise FileNotFoundError(f"the model {name} is in none of {[str(f) for f in folders]}")
+    file = Path(os.environ.get("MORVA_MODELS") or _library.MODELS) / name
+    if not file.exists():
+        raise FileNotFoundError(f"there is no model {name} in {file.parent}")
+    return file
 
 
 @functools.cache

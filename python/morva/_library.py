@@ -3,14 +3,15 @@
 from __future__ import annotations
 
 import ctypes
-import ctypes.util
 import functools
 import os
-from ctypes import POINTER, c_char, c_char_p, c_float, c_int, c_short, c_uint, c_ulonglong
-from ctypes import c_void_p, c_wchar_p
+from ctypes import POINTER, c_char, c_char_p, c_float, c_int, c_uint, c_ulonglong, c_void_p, c_wchar_p
 from pathlib import Path
 
-BUNDLED = Path(__file__).resolve().parent / "_bundled"
+_BUNDLED = Path(__file__).resolve().parent / "_bundled"
+_TREE = Path(__file__).resolve().parents[2]  # where this package is used without being installed
+_INSTALLED = _BUNDLED.exists()
+MODELS = _BUNDLED / "models" if _INSTALLED else _TREE / "models"
 
 
 class ModelInfo(ctypes.Structure):
@@ -23,7 +24,7 @@ class ModelInfo(ctypes.Structure):
     ]
 
 
-_shorts, _floats, _uints = POINTER(c_short), POINTER(c_float), POINTER(c_uint)
+_FRAME = [c_void_p, c_void_p, c_uint]  # session, samples, how many
 _FUNCTIONS = {
     "Morva_SDK_GlobalInit": (c_int, [c_wchar_p, c_uint]),
     "Morva_SDK_GlobalDestroy": (c_int, []),
@@ -34,10 +35,10 @@ _FUNCTIONS = {
     "Morva_NC_CloseSession": (c_int, [c_void_p]),
     "Morva_VAD_CloseSession": (c_int, [c_void_p]),
     "Morva_NoiseDB_CloseSession": (c_int, [c_void_p]),
-    "Morva_NC_CleanAmbientNoiseInt16": (c_int, [c_void_p, _shorts, c_uint, _shorts, c_uint]),
-    "Morva_NC_CleanAmbientNoiseFloat": (c_int, [c_void_p, _floats, c_uint, _floats, c_uint]),
-    "Morva_VAD_FrameInt16": (c_float, [c_void_p, _shorts, c_uint]),
-    "Morva_NoiseDB_FrameInt16": (c_float, [c_void_p, _shorts, c_uint]),
+    "Morva_NC_CleanAmbientNoiseInt16": (c_int, [*_FRAME, c_void_p, c_uint]),
+    "Morva_NC_CleanAmbientNoiseFloat": (c_int, [*_FRAME, c_void_p, c_uint]),
+    "Morva_VAD_FrameFloat": (c_float, _FRAME),
+    "MorvaExt_NoiseDB_FrameFloat": (c_int, [*_FRAME, POINTER(c_float)]),
     "MorvaExt_SessionLatencySamples": (c_int, [c_void_p]),
     "MorvaExt_NC_SetAttenuationLimit": (c_int, [c_void_p, c_float]),
     "MorvaExt_NC_SetBypass": (c_int, [c_void_p, c_int]),
@@ -47,18 +48,11 @@ _FUNCTIONS = {
 }
 
 
-def _path() -> str:
-    chosen = os.environ.get("MORVA_LIBRARY")
-    if chosen:
-        return chosen
-    bundled = BUNDLED / "libmorva.so"
-    return str(bundled) if bundled.exists() else ctypes.util.find_library("morva") or "libmorva.so.1"
-
-
 @functools.cache
 def library() -> ctypes.CDLL:
-    """The library of MORVA_LIBRARY, else the one in this package, else the system's."""
-    loaded = ctypes.CDLL(_path())
+    """The library of MORVA_LIBRARY, else the one in this package, else the one built in this source tree."""
+    own = _BUNDLED / "libmorva.so" if _INSTALLED else _TREE / "build/release/libmorva.so"
+    loaded = ctypes.CDLL(os.environ.get("MORVA_LIBRARY") or str(own))
     for name, (result, arguments) in _FUNCTIONS.items():
         function = getattr(loaded, name)
         function.restype, function.argtypes = result, arguments

@@ -16,22 +16,24 @@ from ._library import library
 Sound = npt.NDArray[Any]
 
 
-def _pointer(values: Sound, kind: Any) -> Any:
-    return values.ctypes.data_as(ctypes.POINTER(kind))
+def samples_of(sound: npt.ArrayLike) -> Sound:
+    """The rule of every call: int16, or floating point in -1..1. Other types do not say their full scale."""
+    given = np.asarray(sound)
+    if given.dtype != np.int16 and not np.issubdtype(given.dtype, np.floating):
+        raise TypeError(f"samples are int16 or floating point, not {given.dtype}")
+    return given
 
 
-def to_pcm16(sound: Sound) -> npt.NDArray[np.int16]:
-    if sound.dtype == np.int16:
-        return sound
-    scaled = np.nan_to_num(sound.astype(np.float32) * np.float32(32768), nan=0.0)
-    return np.rint(np.clip(scaled, -32768, 32767)).astype(np.int16)
+def as_float(samples: Sound) -> npt.NDArray[np.float32]:
+    return samples / np.float32(32768) if samples.dtype == np.int16 else samples.astype(np.float32, copy=False)
 
 
 class _Session:
     """A session of the engine, closed with its owner; frames of `frame_size` samples."""
 
-    def __init__(self, kind: str, rate: int, frame_ms: int, model: str) -> None:
+    def __init__(self, kind: str, rate: int, frame_ms: int, model: str | None) -> None:
         self.rate = _engine.check_rate(rate)
+        model = model or _engine.shipped_model(kind, rate)
         if frame_ms not in (10, 20, 30, 40):
             raise ValueError(f"frames have 10, 20, 30 or 40 ms, not {frame_ms}")
         self.frame_size = self.rate * frame_ms // 1000
@@ -55,6 +57,12 @@ class _Session:
             raise ValueError("closed")
         return self._handle
 
+    def _checked(self, frame: npt.ArrayLike) -> Sound:
+        given = samples_of(frame)
+        if given.shape != (self.frame_size,):
+            raise ValueError(f"a frame has {self.frame_size} samples, not shape {given.shape}")
+        return given
+
     def __enter__(self):
         return self
 
@@ -67,7 +75,7 @@ class Denoiser(_Session):
 
     `frame()` is the live call: a frame in, a frame out, `latency` samples late. `push()` and `flush()`
     take blocks of any length and remove the latency: together they give back exactly as many samples as
-    went in, in their place.
+    went in, in their place. All blocks of a sound have one type.
     """
 
     def __init__(
@@ -78,12 +86,12 @@ class Denoiser(_Session):
         model: str | None = None,
         attenuation_limit_db: float = math.inf,
     ) -> None:
-        super().__init__("NC", rate, frame_ms, model or _engine.cleaning_model(_engine.check_rate(rate)))
+        super().__init__("NC", rate, frame_ms, model)
         self.latency: int = library().MorvaExt_SessionLatencySamples(self._handle)
         self._skip = self.latency
         self._taken = self._given = 0
-        self._waiting: list[Sound] = []
-        self._dtype: np.dtype[Any] | None = None
+        self._waiting: Sound | None = None
+        self._flushed = False
         self.set_attenuation_limit(attenuation_limit_db)
 
     def set_attenuation_limit(self, limit_db: float) -> None:
@@ -95,45 +103,48 @@ class Denoiser(_Session):
         """Lets the sound through at the same latency; the change cross-fades."""
         library().MorvaExt_NC_SetBypass(self._live(), int(on))
 
-    def frame(self, frame: Sound) -> Sound:
+    def frame(self, frame: npt.ArrayLike) -> Sound:
         """Cleans one frame of `frame_size` samples, int16 or float."""
-        if frame.shape != (self.frame_size,):
-            raise ValueError(f"a frame has {self.frame_size} samples, not shape {frame.shape}")
-        kind: Any = ctypes.c_float
-        clean = library().Morva_NC_CleanAmbientNoiseFloat
-        if frame.dtype == np.int16:
-            kind, clean = ctypes.c_short, library().Morva_NC_CleanAmbientNoiseInt16
-        given = np.ascontiguousarray(frame, np.int16 if frame.dtype == np.int16 else np.float32)
+        checked = self._checked(frame)
+        pcm = checked.dtype == np.int16
+        clean = library().Morva_NC_CleanAmbientNoiseInt16 if pcm else library().Morva_NC_CleanAmbientNoiseFloat
+        given = np.ascontiguousarray(checked, np.int16 if pcm else np.float32)
         out = np.empty_like(given)
-        size = self.frame_size
-        if clean(self._live(), _pointer(given, kind), size, _pointer(out, kind), size) != 0:
+        if clean(self._live(), given.ctypes.data, given.size, out.ctypes.data, out.size) != 0:
             raise _engine.failure("the engine refused a frame")
-        return out.astype(frame.dtype, copy=False)
+        return out.astype(checked.dtype, copy=False)
 
-    def push(self, block: Sound) -> Sound:
+    def push(self, block: npt.ArrayLike) -> Sound:
         """Takes a block of any length and returns the cleaned samples that are ready."""
-        if block.ndim != 1:
+        given = samples_of(block)
+        if self._flushed:
+            raise ValueError("the sound has been flushed; the next one needs a new object")
+        if given.ndim != 1:
             raise ValueError("one channel at a time")
-        self._dtype = block.dtype
-        self._taken += len(block)
-        sound = np.concatenate([*self._waiting, block])
+        if self._waiting is None:
+            self._waiting = given[:0]
+        if given.dtype != self._waiting.dtype:
+            raise TypeError(f"the sound began as {self._waiting.dtype}, this block is {given.dtype}")
+        self._taken += len(given)
+        sound = np.concatenate([self._waiting, given])
         whole = len(sound) // self.frame_size * self.frame_size
-        self._waiting = [sound[whole:]]
-        return self._release([self.frame(f) for f in sound[:whole].reshape(-1, self.frame_size)])
+        self._waiting = sound[whole:]
+        return self._release(sound[:whole])
 
     def flush(self) -> Sound:
         """Returns the rest; after it the object can only be closed."""
+        self._flushed = True
+        waiting = np.empty(0, np.float32) if self._waiting is None else self._waiting
         rest = self._taken - self._given
-        if rest == 0:
-            return np.empty(0, self._dtype or np.float32)
-        waiting = np.concatenate(self._waiting)
-        padded = np.zeros(rest + self._skip + self.frame_size, self._dtype)
+        self._waiting = waiting[:0]
+        frames = -(-(rest + self._skip) // self.frame_size) if rest else 0
+        padded = np.zeros(frames * self.frame_size, waiting.dtype)
         padded[: len(waiting)] = waiting
-        frames = padded[: len(padded) // self.frame_size * self.frame_size]
-        return self._release([self.frame(f) for f in frames.reshape(-1, self.frame_size)])
+        return self._release(padded)
 
-    def _release(self, frames: list[Sound]) -> Sound:
-        cleaned = np.concatenate([np.empty(0, self._dtype), *frames])
+    def _release(self, sound: Sound) -> Sound:
+        frames = [self.frame(frame) for frame in sound.reshape(-1, self.frame_size)]
+        cleaned = np.concatenate([sound[:0], *frames])
         skipped = min(self._skip, len(cleaned))
         self._skip -= skipped
         ready = cleaned[skipped : skipped + self._taken - self._given]
@@ -145,12 +156,12 @@ class VoiceDetector(_Session):
     """Tells per frame how likely it holds voice."""
 
     def __init__(self, rate: int, *, frame_ms: int = 10, model: str | None = None) -> None:
-        super().__init__("VAD", rate, frame_ms, model or _engine.VOICE_MODEL)
+        super().__init__("VAD", rate, frame_ms, model)
 
-    def frame(self, frame: Sound) -> float:
+    def frame(self, frame: npt.ArrayLike) -> float:
         """Voice score of one frame, 0..1."""
-        pcm = np.ascontiguousarray(to_pcm16(frame))
-        score = library().Morva_VAD_FrameInt16(self._live(), _pointer(pcm, ctypes.c_short), pcm.size)
+        given = np.ascontiguousarray(as_float(self._checked(frame)))
+        score = library().Morva_VAD_FrameFloat(self._live(), given.ctypes.data, given.size)
         if not 0.0 <= score <= 1.0:
             raise _engine.failure("no voice score")
         return score
@@ -160,11 +171,13 @@ class NoiseLevelMeter(_Session):
     """Measures the background noise."""
 
     def __init__(self, rate: int, *, frame_ms: int = 10, model: str | None = None) -> None:
-        super().__init__("NoiseDB", rate, frame_ms, model or _engine.LEVEL_MODEL)
+        super().__init__("NoiseDB", rate, frame_ms, model)
 
-    def frame(self, frame: Sound) -> float:
+    def frame(self, frame: npt.ArrayLike) -> float:
         """Noise level after one frame, in decibels re one squared unit of the 16-bit scale."""
-        if frame.shape != (self.frame_size,):
-            raise ValueError(f"a frame has {self.frame_size} samples, not shape {frame.shape}")
-        pcm = np.ascontiguousarray(to_pcm16(frame))
-        return library().Morva_NoiseDB_FrameInt16(self._live(), _pointer(pcm, ctypes.c_short), pcm.size)
+        given = np.ascontiguousarray(as_float(self._checked(frame)))
+        level = ctypes.c_float()
+        measure = library().MorvaExt_NoiseDB_FrameFloat
+        if measure(self._live(), given.ctypes.data, given.size, ctypes.byref(level)) != 0:
+            raise _engine.failure("no noise level")
+        return level.value

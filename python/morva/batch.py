@@ -1,10 +1,9 @@
 """Cleans folders of recordings: python -m morva.batch recordings -o cleaned
 
-Work runs on Dask: by default on the cores of this machine, with --scheduler on a cluster whose workers
-see the same folders and have this package installed. An output appears only when it is complete. The
-journal beside the outputs holds one line per finished file, so that a run that was stopped goes on where
-it was; changed sources and failed files are done again. Files that fail are listed at the end and in
-the journal, and the status is 1.
+Files are cleaned side by side on threads, as the engine works outside the interpreter lock. An output
+appears only when it is complete. The journal beside the outputs holds one line per finished file, so
+that a run that was stopped goes on where it was; changed sources and failed files are done again.
+Files that fail are listed at the end and in the journal, and the status is 1.
 """
 
 from __future__ import annotations
@@ -15,13 +14,17 @@ import math
 import os
 import sys
 from collections.abc import Iterable, Iterator
+from concurrent.futures import ThreadPoolExecutor, as_completed
 from dataclasses import dataclass
 from pathlib import Path
 from typing import Any
 
+from tqdm import tqdm
+
+from ._files import denoise_file
+
 JOURNAL = "morva-batch.jsonl"
 ENDINGS = (".wav", ".flac", ".ogg")
-RETRIES = 2  # of a file whose worker died
 
 
 @dataclass(frozen=True)
@@ -98,9 +101,7 @@ class Journal:
 
 
 def clean(job: Job) -> str | None:
-    """Runs on a worker: the error's text, or nothing when the file is done."""
-    from morva import denoise_file
-
+    """The error's text, or nothing when the file is done."""
     try:
         job.target.parent.mkdir(parents=True, exist_ok=True)
         denoise_file(job.source, job.target, **job.settings)
@@ -109,37 +110,23 @@ def clean(job: Job) -> str | None:
     return None
 
 
-def run(jobs: list[Job], journal: Journal, client: Any, *, progress: bool = True) -> dict[str, str]:
+def run(jobs: list[Job], journal: Journal, workers: int, *, progress: bool = True) -> dict[str, str]:
     """Cleans what is not done yet; returns the failures by source."""
-    from distributed import as_completed
-    from tqdm import tqdm
-
     todo = [job for job in jobs if not journal.is_done(job)]
     if len(todo) < len(jobs):
         print(f"{len(jobs) - len(todo)} of {len(jobs)} files are done already", file=sys.stderr)
-    futures = {client.submit(clean, job, pure=False, retries=RETRIES): job for job in todo}
     failures: dict[str, str] = {}
-    with tqdm(total=len(todo), unit="file", disable=not progress) as bar:
-        for future in as_completed(futures):
-            job = futures.pop(future)
-            # A worker that dies too often shows as the future's own error.
-            lost = future.exception() if future.status != "finished" else None
-            error = f"{type(lost).__name__}: {lost}" if lost else future.result()
+    pool = ThreadPoolExecutor(workers)
+    try:
+        futures = {pool.submit(clean, job): job for job in todo}
+        for future in tqdm(as_completed(futures), total=len(todo), unit="file", disable=not progress):
+            job, error = futures[future], future.result()
             journal.add(job, error)
             if error is not None:
                 failures[str(job.source)] = error
-            bar.update()
+    finally:
+        pool.shutdown(cancel_futures=True)  # when interrupted: the files under way are finished, no others begun
     return failures
-
-
-def connect(scheduler: str | None, workers: int) -> Any:
-    """A client of the cluster at `scheduler`, or of one on this machine."""
-    from distributed import Client, LocalCluster
-
-    if scheduler:
-        return Client(scheduler)
-    cluster = LocalCluster(n_workers=workers, threads_per_worker=1, dashboard_address=":0")
-    return Client(cluster)
 
 
 def main(arguments: list[str] | None = None) -> int:
@@ -148,8 +135,7 @@ def main(arguments: list[str] | None = None) -> int:
     )
     parser.add_argument("inputs", nargs="+", type=Path, help="sound files and folders")
     parser.add_argument("-o", "--output", required=True, type=Path, help="folder of the results")
-    parser.add_argument("--scheduler", help="address of a Dask scheduler; without it, this machine")
-    parser.add_argument("--workers", type=int, default=os.cpu_count(), help="processes on this machine")
+    parser.add_argument("--workers", type=int, default=os.cpu_count() or 1, help="files at a time")
     parser.add_argument("--model", help="shipped model's file name or path of a weight file")
     parser.add_argument("--frame", type=int, default=10, choices=(10, 20, 30, 40), help="milliseconds")
     parser.add_argument("--attenuation-limit", type=float, default=math.inf, help="decibels")
@@ -165,8 +151,7 @@ def main(arguments: list[str] | None = None) -> int:
     except (OSError, ValueError) as error:
         print(f"morva.batch: {error}", file=sys.stderr)
         return 2
-    with connect(options.scheduler, options.workers) as client:
-        failures = run(jobs, Journal(options.output), client, progress=not options.quiet)
+    failures = run(jobs, Journal(options.output), options.workers, progress=not options.quiet)
     for source, reason in failures.items():
         print(f"{source}: {reason}", file=sys.stderr)
     print(f"{len(jobs) - len(failures)} of {len(jobs)} files cleaned", file=sys.stderr)

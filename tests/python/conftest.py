@@ -4,7 +4,6 @@ import os
 import subprocess
 from pathlib import Path
 
-import numpy as np
 import pytest
 import soundfile
 
@@ -24,19 +23,17 @@ def command():
 @pytest.fixture(scope="session")
 def speech():
     """Ten seconds of noisy speech at 48000 Hz, float."""
-    sound, rate = soundfile.read(ROOT / "examples/audio/noisy.flac", dtype="float32")
-    assert rate == 48000
-    return sound
+    return soundfile.read(ROOT / "examples/audio/noisy.flac", dtype="float32")[0]
 
 
 @pytest.fixture
 def write(tmp_path):
-    """Writes a sound as floating-point WAV, so that nothing is rounded on the way."""
+    """Writes a sound, as floating point unless told otherwise, so that nothing is rounded on the way."""
 
     def write(name, sound, rate, subtype="FLOAT"):
         path = tmp_path / name
         path.parent.mkdir(parents=True, exist_ok=True)
-        soundfile.write(path, np.asarray(sound), rate, subtype=subtype)
+        soundfile.write(path, sound, rate, subtype=subtype)
         return path
 
     return write

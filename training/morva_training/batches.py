@@ -16,8 +16,8 @@ import torch
 from torch import Tensor
 from torch.utils.data import IterableDataset
 
-from .mixing import Mixture, MixtureMaker, Recipe
-from .spectra import FULL_32K, Layout, frame_energies, level_gains, log_features
+from .mixing import MixtureMaker, Recipe, Waves
+from .spectra import FULL_32K, Layout, analyse, frame_energies, level_gains, log_features
 
 EXPONENT = 0.3  # of magnitudes in the compressed losses
 
@@ -68,20 +68,19 @@ def band_sums(noisy: np.ndarray, speech: np.ndarray, layout: Layout) -> dict[str
     return {name: torch.from_numpy(np.add.reduceat(v.numpy(), starts, axis=-1)) for name, v in sums.items()}
 
 
-def make_item(mixture: Mixture, layout: Layout, rng: np.random.Generator) -> dict[str, Tensor]:
+def make_item(waves: Waves, layout: Layout, rng: np.random.Generator) -> dict[str, Tensor]:
     """One row of a batch."""
-    speech = lower_part(mixture.speech, layout)
-    noisy = speech + lower_part(mixture.noise, layout)
+    speech, noisy = lower_part(analyse(np.stack([waves.speech, waves.heard()]), FULL_32K), layout)
     energies = frame_energies(noisy, layout.frame)
     history = float(energies.mean()) * 10 ** rng.uniform(-0.6, 0.6) if rng.random() < 0.5 else None
     gains = level_gains(energies, layout.active_frames, history=history).astype(np.float32)
-    reference = speech if mixture.has_speech else noisy
+    reference = speech if waves.has_speech else noisy
     level = np.sqrt(np.mean(np.square(np.abs(reference)))) + 1e-3
     scale = np.float32(1.0 / level)
     item = band_sums(noisy * scale, speech * scale, layout)
     item["features"] = torch.from_numpy(log_features(noisy, gains, layout))
-    item["wideband"] = torch.tensor(mixture.wideband)
-    item["has_speech"] = torch.tensor(mixture.has_speech)
+    item["wideband"] = torch.tensor(waves.wideband)
+    item["has_speech"] = torch.tensor(waves.has_speech)
     return item
 
 

@@ -10,19 +10,32 @@ import datetime
 
 import numpy as np
 import torch
-from torch import Tensor, nn
+from torch import nn
 
 from .mvw import Value, Weight
-from .networks import LayerNormGatedNetwork, PlainGatedNetwork
+from .networks import LayerNormGatedNetwork, Network, PlainGatedNetwork
 from .spectra import Layout
 
-
-def _array(value: Tensor) -> np.ndarray:
-    return value.detach().cpu().numpy().astype(np.float32)
-
-
-def _arrays(values) -> list[np.ndarray]:
-    return [_array(v) for v in values]
+SINGLE = {
+    "WeightGRU": "update",
+    "BaesGRU": "update_bias",
+    "WeightGRU_reset": "reset",
+    "BiasGRU_reset": "reset_bias",
+}
+LISTS = {
+    "WeightLinear": "linear",
+    "BaesLinear": "linear_bias",
+    "WeightNonLinear": "rectified",
+    "BaesNonLinear": "rectified_bias",
+    "GainLinearNorm": "linear_gain",
+    "BiasLinearNorm": "linear_offset",
+    "GainNonLinearNorm": "rectified_gain",
+    "BiasNonLinearNorm": "rectified_offset",
+}
+# The output matrix stands last in the rectified branch; in a voice model, which ends in the linear one, in
+# both, as the engine takes the state's width from the rectified branch.
+OUTPUT = {"WeightNonLinear": "output", "BaesNonLinear": "output_bias"}
+LINEAR_OUTPUT = {"WeightLinear": "output", "BaesLinear": "output_bias"}
 
 
 def timestamp() -> bytes:
@@ -30,23 +43,40 @@ def timestamp() -> bytes:
     return datetime.datetime.now(datetime.timezone.utc).strftime("%y%m%d%H%M").encode()
 
 
-def noise_header(version: str, name: str, layout: Layout, controls: dict[str, Value]) -> Weight:
-    suffix = "_v" + version.replace(".", "_")
-    header: Weight = {
-        "Version": version.encode(),
-        "ModelName": name.encode(),
-        "TimeStamp": timestamp(),
-        "SampleRate": layout.rate,
-        "Step": layout.hop,
-        "FiltrBegin": layout.first_bin,
-        "FiltrEnd": layout.first_bin + layout.bins,
-        "FrameLength": layout.frame,
-        "PreviewFrames": layout.preview,
-        "CoefficientNumber": layout.frame // 2 + 1,
+def _named_values(network: Network) -> dict[str, nn.Parameter | list[nn.Parameter]]:
+    """The network's values under the file's keys."""
+    named: dict[str, nn.Parameter | list[nn.Parameter]] = {
+        key: getattr(network, name) for key, name in SINGLE.items() if hasattr(network, name)
     }
-    for key, value in {"COMPRESS_RATE": layout.compress, **controls}.items():
-        header[f"CONTROL_MORVA_{key}{suffix}"] = value
-    return header
+    outputs = {**OUTPUT, **(LINEAR_OUTPUT if getattr(network, "linear_output", False) else {})}
+    for key, name in LISTS.items():
+        if hasattr(network, name):
+            named[key] = [*getattr(network, name), *([getattr(network, outputs[key])] if key in outputs else [])]
+    return named
+
+
+def network_values(network: Network) -> Weight:
+    def array(value: nn.Parameter) -> np.ndarray:
+        return value.detach().cpu().numpy().astype(np.float32)
+
+    return {k: [array(v) for v in x] if isinstance(x, list) else array(x) for k, x in _named_values(network).items()}
+
+
+def network_of(weight: Weight) -> Network:
+    """A module with the values of a weight of version 0.0.6 or 0.0.5, or of a voice model's."""
+    version = bytes(weight["Version"])
+    hidden, outputs = weight["WeightNonLinear"][-1].shape
+    features, layers = weight["WeightGRU"].shape[0] - hidden, len(weight["WeightNonLinear"])
+    if version == b"0.0.6":
+        network: Network = LayerNormGatedNetwork(features, hidden, outputs, layers)
+    else:
+        network = PlainGatedNetwork(features, hidden, outputs, layers, linear_output=b"VAD" in version)
+    with torch.no_grad():
+        for key, target in _named_values(network).items():
+            targets, values = (target, weight[key]) if isinstance(target, list) else ([target], [weight[key]])
+            for one, value in zip(targets, values):
+                one.copy_(torch.from_numpy(np.ascontiguousarray(value)))
+    return network
 
 
 def layout_of(weight: Weight) -> Layout:
@@ -60,116 +90,46 @@ def layout_of(weight: Weight) -> Layout:
     )
 
 
-def gated_values(network: LayerNormGatedNetwork) -> Weight:
-    return {
-        "WeightGRU": _array(network.update),
-        "BaesGRU": _array(network.update_bias),
-        "WeightGRU_reset": _array(network.reset),
-        "BiasGRU_reset": _array(network.reset_bias),
-        "WeightLinear": _arrays(network.linear),
-        "BaesLinear": _arrays(network.linear_bias),
-        "WeightNonLinear": _arrays(network.rectified) + [_array(network.output)],
-        "BaesNonLinear": _arrays(network.rectified_bias) + [_array(network.output_bias)],
-        "GainLinearNorm": _arrays(network.linear_gain),
-        "BiasLinearNorm": _arrays(network.linear_offset),
-        "GainNonLinearNorm": _arrays(network.rectified_gain),
-        "BiasNonLinearNorm": _arrays(network.rectified_offset),
-    }
-
-
-def plain_values(network: PlainGatedNetwork) -> Weight:
-    """The voice-activity network ends in its linear branch, the noise network in its rectified one.
-
-    The engine takes the state's width from the last "WeightNonLinear" matrix, so the voice model
-    carries its output matrix there, too.
-    """
-    linear, linear_bias = _arrays(network.linear), _arrays(network.linear_bias)
-    if network.linear_output:
-        linear.append(_array(network.output))
-        linear_bias.append(_array(network.output_bias))
-    return {
-        "WeightGRU": _array(network.update),
-        "BaesGRU": _array(network.update_bias),
-        "WeightLinear": linear,
-        "BaesLinear": linear_bias,
-        "WeightNonLinear": _arrays(network.rectified) + [_array(network.output)],
-        "BaesNonLinear": _arrays(network.rectified_bias) + [_array(network.output_bias)],
-    }
-
-
-def _assign(target: nn.Parameter, value: np.ndarray) -> None:
-    with torch.no_grad():
-        target.copy_(torch.from_numpy(np.ascontiguousarray(value)))
-
-
-def _assign_all(targets, values) -> None:
-    for target, value in zip(targets, values):
-        _assign(target, value)
-
-
-def gated_network(weight: Weight) -> LayerNormGatedNetwork:
-    """A module with the values of a version 0.0.6 weight."""
-    last = weight["WeightNonLinear"][-1]
-    features = weight["WeightGRU"].shape[0] - last.shape[0]
-    network = LayerNormGatedNetwork(features, last.shape[0], last.shape[1], len(weight["WeightNonLinear"]))
-    _assign(network.update, weight["WeightGRU"])
-    _assign(network.update_bias, weight["BaesGRU"])
-    _assign(network.reset, weight["WeightGRU_reset"])
-    _assign(network.reset_bias, weight["BiasGRU_reset"])
-    _assign_all(network.linear, weight["WeightLinear"])
-    _assign_all(network.linear_bias, weight["BaesLinear"])
-    _assign_all(network.rectified, weight["WeightNonLinear"][:-1])
-    _assign_all(network.rectified_bias, weight["BaesNonLinear"][:-1])
-    _assign_all(network.linear_gain, weight["GainLinearNorm"])
-    _assign_all(network.linear_offset, weight["BiasLinearNorm"])
-    _assign_all(network.rectified_gain, weight["GainNonLinearNorm"])
-    _assign_all(network.rectified_offset, weight["BiasNonLinearNorm"])
-    _assign(network.output, last)
-    _assign(network.output_bias, weight["BaesNonLinear"][-1])
-    return network
-
-
-def plain_network(weight: Weight) -> PlainGatedNetwork:
-    """A module with the values of a version 0.0.5 or voice-activity weight."""
-    voice = b"VAD" in bytes(weight["Version"])
-    matrices = weight["WeightLinear"] if voice else weight["WeightNonLinear"]
-    biases = weight["BaesLinear"] if voice else weight["BaesNonLinear"]
-    last = matrices[-1]
-    features = weight["WeightGRU"].shape[0] - last.shape[0]
-    network = PlainGatedNetwork(features, last.shape[0], last.shape[1], len(matrices), linear_output=voice)
-    _assign(network.update, weight["WeightGRU"])
-    _assign(network.update_bias, weight["BaesGRU"])
-    _assign_all(network.linear, weight["WeightLinear"])
-    _assign_all(network.linear_bias, weight["BaesLinear"])
-    _assign_all(network.rectified, weight["WeightNonLinear"])
-    _assign_all(network.rectified_bias, weight["BaesNonLinear"])
-    _assign(network.output, last)
-    _assign(network.output_bias, biases[-1])
-    return network
-
-
-def noise_weight(
-    network: LayerNormGatedNetwork | PlainGatedNetwork,
-    layout: Layout,
-    mean: np.ndarray,
-    deviation: np.ndarray,
-    name: str,
-    controls: dict[str, Value] | None = None,
-) -> Weight:
+def noise_weight(network: Network, layout: Layout, mean: np.ndarray, deviation: np.ndarray, name: str) -> Weight:
     """A whole noise model, ready to be written."""
-    gated = isinstance(network, LayerNormGatedNetwork)
-    weight = noise_header("0.0.6" if gated else "0.0.5", name, layout, controls or {})
-    weight["MU"] = mean.astype(np.float32)
-    weight["SD"] = deviation.astype(np.float32)
-    weight.update(gated_values(network) if gated else plain_values(network))
-    return weight
+    version = "0.0.6" if isinstance(network, LayerNormGatedNetwork) else "0.0.5"
+    return {
+        "Version": version.encode(),
+        "ModelName": name.encode(),
+        "TimeStamp": timestamp(),
+        "SampleRate": layout.rate,
+        "Step": layout.hop,
+        "FiltrBegin": layout.first_bin,
+        "FiltrEnd": layout.first_bin + layout.bins,
+        "FrameLength": layout.frame,
+        "PreviewFrames": layout.preview,
+        "CoefficientNumber": layout.frame // 2 + 1,
+        "CONTROL_MORVA_COMPRESS_RATE_v" + version.replace(".", "_"): layout.compress,
+        "MU": mean.astype(np.float32),
+        "SD": deviation.astype(np.float32),
+        **network_values(network),
+    }
+
+
+def voice_weight(network: PlainGatedNetwork, mean: np.ndarray, variance: np.ndarray, points: list[float]) -> Weight:
+    """A whole voice model; `points` are the logits for scores 0, one half and 1."""
+    low, middle, high = points
+    return {
+        "Version": b"VAD_0.0.1",
+        "ModelName": b"vad8",
+        "TimeStamp": timestamp(),
+        "SampleRate": 8000,
+        "FrameLength": 240,
+        "MU": mean.astype(np.float32),
+        "SD": variance.astype(np.float32),
+        "Test_MINMAX": np.array([low, high], np.float32),
+        "Test_BestF1": np.array([middle], np.float32),
+        **network_values(network),
+    }
 
 
 def half_precision(weight: Weight) -> Weight:
-    """The model with every matrix rounded to values that half precision holds.
-
-    The engine then stores and reads half the bytes; the result differs by about -90 dB.
-    """
+    """The model with every matrix rounded to values that half precision holds: the engine stores half the bytes."""
 
     def rounded(value: Value) -> Value:
         if isinstance(value, list):

@@ -131,6 +131,8 @@ class Run:
             desc=self.folder.name,
             disable=together.rank() != 0,
         )
+        if self.step == 0:
+            self._validate(validate)
         while self.step < self.schedule.steps:
             for group in self.optimiser.param_groups:
                 group["lr"] = self.schedule.rate(self.step)
@@ -160,11 +162,10 @@ class Run:
                 self.log({**means, **({"ran_away": ran_away} if ran_away else {})})
                 parts_seen, ran_away = {}, 0
                 self.save()
-            if (
-                validate
-                and together.rank() == 0
-                and (self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps)
-            ):
-                result = validate(self.averaged)
-                self.log({f"dev_{name}": round(value, 4) for name, value in result.items()})
+            if self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps:
+                self._validate(validate)
         bar.close()
+
+    def _validate(self, validate: Callable[[nn.Module], dict[str, float]] | None) -> None:
+        if validate and together.rank() == 0:
+            self.log({f"dev_{name}": round(value, 4) for name, value in validate(self.averaged).items()})

@@ -19,16 +19,15 @@ import torch
 from torch import Tensor, nn
 
 from .batches import EXPONENT, Batch
+from .measures import PAUSE_DB
 from .spectra import Layout
 
 SPEECH_SPL = 79.0  # dB, level at which P.862 listens
 TRUSTED_EDGE_HZ = 7000.0  # of recordings without content above 8 kHz
 HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.3  # what such recordings may say about the noise above
 SYLLABLE_HOPS = 32
-# Fitted to P.862.2 scores of noisy and cleaned recordings (correlation 0.96): the frames and bands
-# here are not quite the standard's.
+# Fitted to P.862.2 scores of noisy and cleaned recordings: frames and bands are not quite the standard's.
 OFFSET, SYMMETRIC, ASYMMETRIC = 4.41, 0.107, 0.0547
-PAUSE_DEPTH = 10**-4.5  # below the loud frames of the piece
 DEEPEST_DB = -40.0
 
 
@@ -40,6 +39,9 @@ class LossWeights:
     ratio: float = 0.17  # per dB
     loudness: float = 1.4  # per point of listening quality
     pause: float = 0.012  # per dB of noise left in pauses
+
+
+LEVEL_WEIGHTS = LossWeights(loudness=0.0, ratio=0.01)  # of the level model's share of the mask loss
 
 
 def bark(frequency: np.ndarray) -> np.ndarray:
@@ -127,7 +129,7 @@ def pause_frames(speech_power: Tensor, has_speech: Tensor) -> Tensor:
     """Frames [B, T] where nobody speaks, two frames clear of speech."""
     power = speech_power.sum(-1)
     loud = torch.quantile(power, 0.95, dim=1, keepdim=True)
-    busy = (power > loud * PAUSE_DEPTH) & has_speech[:, None]
+    busy = (power > loud * 10 ** (PAUSE_DB / 10)) & has_speech[:, None]
     near = nn.functional.max_pool1d(busy.float()[:, None], 5, 1, 2)[:, 0]
     return 1.0 - near
 
@@ -199,8 +201,8 @@ class LevelLoss:
     WINDOW, STRIDE = 30, 10
     FAINTEST = 10**-5.0
 
-    def __init__(self, layout: Layout, device: torch.device, mask_share: float = 0.15) -> None:
-        self.mask_loss = MaskLoss(layout, LossWeights(loudness=0.0, ratio=0.01), device)
+    def __init__(self, layout: Layout, weights: LossWeights, device: torch.device, mask_share: float = 0.15) -> None:
+        self.mask_loss = MaskLoss(layout, weights, device)
         self.mask_share = mask_share
 
     def __call__(self, logits: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:

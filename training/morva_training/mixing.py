@@ -1,28 +1,25 @@
 """Mixtures for training: speech, rooms, noises, levels and equalisation drawn at random.
 
-One `MixtureMaker` owns a random generator and a decoded store; `draw` returns the spectra of a
-piece of speech and of what disturbs it (noise, clipping). Room reverberation belongs to the speech: the task is to
-remove noise, not the room. Recordings without content above 8 kHz are flagged, so that the loss
-gives them no say about the bins above.
+One `MixtureMaker` owns a random generator and a corpus; `draw` returns a piece of speech and what
+disturbs it, and how what is heard is clipped. Room reverberation belongs to the speech: the task is to
+remove noise, not the room. Speech without content above 8 kHz is flagged, so that the loss gives it no
+say about the bins above.
 """
 
 from __future__ import annotations
 
-import zlib
-from dataclasses import dataclass, field, replace
+from dataclasses import dataclass, replace
 from pathlib import Path
 
 import numpy as np
 from scipy import fft as sfft
 from scipy.ndimage import gaussian_filter1d
-from scipy.signal import lfilter, resample_poly
+from scipy.signal import lfilter
 
-from .corpus import BASE_RATE, Clip, Store, load_rooms
-from .spectra import FULL_32K, analyse
+from .corpus import BASE_RATE, Clip, Corpus
+from .measures import active_level
 
 FULL_SCALE = 32768.0
-DEV_SHARE = 25  # one in so many speakers and noise recordings is kept back for validation
-
 
 # Short sounds are a small part of the recordings and a large part of what callers complain about.
 IMPULSIVE = (
@@ -59,49 +56,32 @@ class Recipe:
     boosted: tuple[str, ...] = IMPULSIVE  # noise categories drawn three times as often
 
 
-@dataclass
+@dataclass(frozen=True)
 class Waves:
     """A piece of speech and what disturbs it, as samples on the 16-bit scale."""
 
     speech: np.ndarray
     noise: np.ndarray
-    wideband: bool
+    rate: int
+    wideband: bool  # False for speech that holds nothing above 8 kHz
     has_speech: bool
     noisy: bool  # False for a piece that is clean but for a faint background
+    clip: float | None = None  # share of its peak at which the microphone clips the sum
 
+    def heard(self) -> np.ndarray:
+        total = self.speech + self.noise
+        limit = FULL_SCALE if self.clip is None else min(FULL_SCALE, self.clip * np.abs(total).max())
+        return np.clip(total, -limit, limit)
 
-@dataclass
-class Mixture:
-    """Spectra [T, 321] at 32 kHz of a piece of speech and of what disturbs it; their sum is heard."""
-
-    speech: np.ndarray
-    noise: np.ndarray
-    wideband: bool
-    has_speech: bool
-    noisy: bool
-
-    def remixed(self, other: "Mixture", snr_db: float) -> "Mixture":
+    def remixed(self, other: Waves, snr_db: float) -> Waves:
         """This speech in the noise of another piece."""
-        own = np.sqrt(np.mean(np.abs(self.speech[:, :256]) ** 2)) + 1e-3
-        theirs = np.sqrt(np.mean(np.abs(other.noise[:, :256]) ** 2)) + 1e-3
-        scale = np.float32(own / theirs * 10 ** (-snr_db / 20))
-        return replace(self, noise=other.noise * scale, noisy=True)
+        noise = at_level(other.noise, self.rate, active_level(self.speech, self.rate), -snr_db)
+        return replace(self, noise=noise, noisy=True)
 
 
-def in_dev(clip: Clip, kind: str) -> bool:
-    """Whether a training recording belongs to the validation share (whole speakers of speech)."""
-    key = clip.category if kind == "speech" else clip.path
-    return zlib.crc32(key.encode()) % DEV_SHARE == 3
-
-
-def active_level(samples: np.ndarray, block: int = 640) -> float:
-    """RMS of the blocks within 30 dB of the loudest one; a block is 20 ms at 32 kHz."""
-    count = len(samples) // block
-    if count == 0:
-        return 0.0
-    power = np.square(samples[: count * block].reshape(count, block)).mean(axis=1)
-    loud = power > power.max() * 1e-3
-    return float(np.sqrt(power[loud].mean())) if power.max() > 0 else 0.0
+def at_level(samples: np.ndarray, rate: int, reference: float, db: float) -> np.ndarray:
+    """The samples with an active level `db` over the reference, which is how every ratio here is measured."""
+    return samples * np.float32(reference * 10 ** (db / 20) / (active_level(samples, rate) + 1e-3))
 
 
 def simulated_room(rng: np.random.Generator, rate: int) -> np.ndarray:
@@ -171,76 +151,60 @@ def smooth_gain(rng: np.random.Generator, bins: int, rate: int, deviation_db: fl
 
 
 class Warped:
-    """Recordings faster and higher, or slower and lower. They come from the store of twice the rate
+    """Recordings faster and higher, or slower and lower. They come from the copy of twice the rate
     where there is one, so that slower ones lose no treble."""
 
-    def __init__(self, store: Path, kind: str, rate: int) -> None:
+    def __init__(self, store: Path, rate: int) -> None:
         self.ratio = 2 if rate < BASE_RATE else 1
-        self.fine = Store(store, kind, rate * self.ratio)
-        self.clips = {clip.path: clip for clip in self.fine.clips}
+        self.fine = Corpus(store, rate * self.ratio)
+        every = [c for kind in ("speech", "noise") for c in self.fine.of_all_splits(kind)]
+        self.clips = {(clip.kind, clip.path): clip for clip in every}
 
     def read(self, clip: Clip, offset: int, length: int, factor: float) -> np.ndarray:
-        """About `length` samples, or what there is, of a clip of the plain store from its `offset` on."""
-        piece = self.fine.read(self.clips[clip.path], offset * self.ratio, int(length * self.ratio * factor))
+        """About `length` samples, or what there is, of a clip of the plain corpus from its `offset` on."""
+        fine = self.clips[clip.kind, clip.path]
+        piece = self.fine.read(fine, offset * self.ratio, int(length * self.ratio * factor))
         return resampled(piece, 1.0 / (self.ratio * factor)) if len(piece) else piece
 
 
-@dataclass
+def odds_of(groups: dict[str, list[Clip]]) -> np.ndarray:
+    """More for what there is more of, but less than in proportion."""
+    weight = np.sqrt(np.array([sum(c.length for c in clips) for clips in groups.values()], dtype=float))
+    return weight / weight.sum()
+
+
 class MixtureMaker:
-    """Draws mixtures from a decoded store. One per process and seed."""
+    """Draws mixtures from a store. One per process and seed."""
 
-    store: Path
-    seed: int
-    recipe: Recipe = field(default_factory=Recipe)
-    split: str = "train"
-    rate: int = BASE_RATE
-
-    def __post_init__(self) -> None:
-        self.rng = np.random.default_rng(self.seed)
-        self.speech = Store(self.store, "speech", self.rate)
-        self.noise = Store(self.store, "noise", self.rate)
-        self.warped_speech = Warped(self.store, "speech", self.rate)
-        self.warped_noise = Warped(self.store, "noise", self.rate)
-        self.block = self.rate // 50
-        self.count = int(self.recipe.seconds * self.rate) // self.block * self.block
-        rooms = load_rooms(self.store, "heldout" if self.split == "heldout" else "train")
-        self.rooms = [resample_poly(room, 1, BASE_RATE // self.rate).astype(np.float32) for room in rooms]
-        self.speakers = self._group(self.speech, "speech", self.split)
-        self.categories = self._group(self.noise, "noise", self.split)
-        self.bands = {
-            band: [s for s, clips in self.speakers.items() if clips[0].band == band] for band in ("full", "8k")
-        }
-        self.speaker_odds = {band: self._odds(self.speakers, names) for band, names in self.bands.items()}
-        self.category_names = sorted(self.categories)
-        odds = self._odds(self.categories, self.category_names)
-        odds *= np.where(np.isin(self.category_names, self.recipe.boosted), 3.0, 1.0)
+    def __init__(
+        self, store: Path, seed: int, recipe: Recipe | None = None, split: str = "train", rate: int = BASE_RATE
+    ) -> None:
+        self.recipe, self.rate = recipe or Recipe(), rate
+        self.rng = np.random.default_rng(seed)
+        self.corpus, self.warped = Corpus(store, rate), Warped(store, rate)
+        self.block = rate // 50
+        self.count = int(self.recipe.seconds * rate) // self.block * self.block
+        self.rooms = self.corpus.rooms(split)
+        self.voices = {band: self._long(self.corpus.voices(split, band)) for band in ("full", "8k")}
+        self.voice_odds = {band: odds_of(voices) for band, voices in self.voices.items() if voices}
+        self.categories = self._long(self.corpus.groups("noise", split))
+        self.category_names = list(self.categories)
+        odds = odds_of(self.categories) * np.where(np.isin(self.category_names, self.recipe.boosted), 3.0, 1.0)
         self.category_odds = odds / odds.sum()
 
-    @staticmethod
-    def _group(store: Store, kind: str, split: str) -> dict[str, list[Clip]]:
-        groups: dict[str, list[Clip]] = {}
-        for clip in store.clips:
-            wanted = "dev" if clip.split == "train" and in_dev(clip, kind) else clip.split
-            if wanted == split and clip.length > store.rate // 50:
-                groups.setdefault(clip.category, []).append(clip)
-        if not groups and split == "dev":  # too few recordings to keep some back
-            return MixtureMaker._group(store, kind, "train")
-        return groups
+    def _long(self, groups: dict[str, list[Clip]]) -> dict[str, list[Clip]]:
+        """Groups, in the order of their names, without clips that are shorter than a block."""
+        long = {name: [c for c in groups[name] if c.length > self.block] for name in sorted(groups)}
+        return {name: clips for name, clips in long.items() if clips}
 
-    @staticmethod
-    def _odds(groups: dict[str, list[Clip]], names: list[str]) -> np.ndarray:
-        seconds = np.array([sum(c.length for c in groups[n]) for n in names], dtype=float)
-        weight = np.sqrt(seconds)
-        return weight / weight.sum() if len(names) else weight
-
-    def _speaker(self) -> str:
-        full = self.bands["full"] and (not self.bands["8k"] or self.rng.random() < self.recipe.full_band_share)
+    def voice(self) -> tuple[str, list[Clip]]:
+        """The band and the clips of a random speaker."""
+        full = self.voices["full"] and (not self.voices["8k"] or self.rng.random() < self.recipe.full_band_share)
         band = "full" if full else "8k"
-        return self.rng.choice(self.bands[band], p=self.speaker_odds[band])
+        return band, self.voices[band][self.rng.choice(list(self.voices[band]), p=self.voice_odds[band])]
 
-    def talk(self, speaker: str, pauses: bool = True) -> np.ndarray:
+    def talk(self, clips: list[Clip], pauses: bool = True) -> np.ndarray:
         """Sentences of one speaker, one after the other, from a random point on."""
-        clips = self.speakers[speaker]
         out = np.zeros(self.count, np.float32)
         lead = int(self.rng.uniform(0, 2 * self.recipe.pause_seconds) * self.rate)
         position = lead if pauses and self.rng.random() < 0.4 else 0
@@ -248,11 +212,9 @@ class MixtureMaker:
             clip = clips[self.rng.integers(len(clips))]
             offset = int(self.rng.integers(max(1, clip.length - self.rate))) if self.rng.random() < 0.4 else 0
             if self.rng.random() < self.recipe.speed_share:
-                piece = self.warped_speech.read(
-                    clip, offset, self.count - position, self.rng.uniform(*self.recipe.speed)
-                )
+                piece = self.warped.read(clip, offset, self.count - position, self.rng.uniform(*self.recipe.speed))
             else:
-                piece = self.speech.read(clip, offset, self.count)
+                piece = self.corpus.read(clip, offset, self.count)
             piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
@@ -264,8 +226,8 @@ class MixtureMaker:
         """Many talkers at similar levels, most of them in the same room."""
         total = np.zeros(self.count, np.float32)
         for _ in range(self.rng.integers(4, 9)):
-            voice = self.talk(self._speaker(), pauses=False)
-            total += voice / (active_level(voice, self.block) + 1e-3) * 10 ** (self.rng.normal(0, 3) / 20)
+            voice = self.talk(self.voice()[1], pauses=False)
+            total += at_level(voice, self.rate, 1.0, self.rng.normal(0, 3))
         return self.in_room(total)
 
     def in_room(self, samples: np.ndarray) -> np.ndarray:
@@ -291,11 +253,10 @@ class MixtureMaker:
         warped = self.rng.random() < self.recipe.noise_speed_share
         while position < self.count:
             if warped:
-                piece = self.warped_noise.read(
-                    clip, offset, self.count - position, self.rng.uniform(*self.recipe.noise_speed)
-                )
+                speed = self.rng.uniform(*self.recipe.noise_speed)
+                piece = self.warped.read(clip, offset, self.count - position, speed)
             else:
-                piece = self.noise.read(clip, offset, self.count)
+                piece = self.corpus.read(clip, offset, self.count)
             piece = piece[: self.count - position]
             out[position : position + len(piece)] = piece
             position += len(piece)
@@ -305,53 +266,46 @@ class MixtureMaker:
         return out
 
     def noises(self) -> np.ndarray:
-        noise = self.one_noise()
-        noise /= active_level(noise, self.block) + 1e-3
+        noise = at_level(self.one_noise(), self.rate, 1.0, 0.0)
         if self.rng.random() < self.recipe.second_noise_share:
-            other = self.one_noise()
-            noise += other / (active_level(other, self.block) + 1e-3) * 10 ** (self.rng.uniform(-12, 3) / 20)
+            noise += at_level(self.one_noise(), self.rate, 1.0, self.rng.uniform(-12, 3))
         return noise
 
-    def draw_waves(self) -> Waves:
-        """One piece of `recipe.seconds` before equalisation."""
-        r = self.recipe
-        kind = self.rng.random()
-        speaker = self._speaker()
-        has_speech = kind >= r.noise_only_share
-        speech = self.talk(speaker) if has_speech else np.zeros(self.count, np.float32)
-        if has_speech and self.rng.random() < r.whisper_share:
-            speech = whispered(self.rng, speech, self.rate)
-        if has_speech and self.rng.random() < r.room_share:
-            speech = self.in_room(speech)
-        level = FULL_SCALE * 10 ** (self.rng.uniform(*r.level_db) / 20)
-        speech *= level / (active_level(speech, self.block) + 1e-3)
-        clean = has_speech and kind < r.noise_only_share + r.clean_share
-        if clean:
-            noise = coloured_noise(self.rng, self.count, self.rate)
-            snr = self.rng.uniform(35.0, 70.0)
-            noise /= noise.std() + 1e-6
-        else:
-            noise = self.noises()
-            snr = self.rng.uniform(*r.snr_db)
-        noise *= level * 10 ** (-snr / 20)
-        if self.rng.random() < r.clip_share:
-            noisy = speech + noise
-            limit = np.abs(noisy).max() * self.rng.uniform(0.3, 0.9)
-            noise = np.clip(noisy, -limit, limit) - speech
-        return Waves(speech, noise, self.speakers[speaker][0].band == "full", has_speech, not clean)
-
-    def equalisers(self, bins: int) -> tuple[np.ndarray, np.ndarray]:
-        """Gains over the bins for the speech and for what disturbs it; both share the microphone's."""
+    def equalised(self, speech: np.ndarray, noise: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
+        """Both as the microphone takes them, the noise also as its place does."""
+        bins = self.count // 2 + 1
         gain = smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)
         if self.rng.random() < self.recipe.band_limit_share:
             edge = self.rng.uniform(3300, 12000) / (self.rate / 2)
             steepness = np.clip((np.arange(bins) / bins - edge) * 200, -40, 40)
             gain = (gain / (1 + np.exp(steepness))).astype(np.float32)
-        return gain, gain * smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)
+        gains = np.stack([gain, gain * smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)])
+        spectra = sfft.rfft(np.stack([speech, noise]).astype(np.float32), axis=-1)
+        speech, noise = sfft.irfft(spectra * gains, n=self.count, axis=-1)
+        return speech, noise
 
-    def draw(self) -> Mixture:
-        """One piece as spectra; equalisation and band limits are done on these. Needs the base rate."""
-        waves = self.draw_waves()
-        spectra = analyse(np.stack([waves.speech, waves.noise]).astype(np.float32), FULL_32K)
-        speech_gain, noise_gain = self.equalisers(spectra.shape[-1])
-        return Mixture(spectra[0] * speech_gain, spectra[1] * noise_gain, waves.wideband, waves.has_speech, waves.noisy)
+    def draw(self) -> Waves:
+        """One piece of `recipe.seconds`."""
+        r = self.recipe
+        kind = self.rng.random()
+        band, clips = self.voice()
+        has_speech = kind >= r.noise_only_share
+        speech = self.talk(clips) if has_speech else np.zeros(self.count, np.float32)
+        if has_speech and self.rng.random() < r.whisper_share:
+            speech = whispered(self.rng, speech, self.rate)
+        if has_speech and self.rng.random() < r.room_share:
+            speech = self.in_room(speech)
+        clean = has_speech and kind < r.noise_only_share + r.clean_share
+        noise = coloured_noise(self.rng, self.count, self.rate) if clean else self.noises()
+        speech, noise = self.equalised(speech, noise)
+        level = FULL_SCALE * 10 ** (self.rng.uniform(*r.level_db) / 20)
+        snr = self.rng.uniform(*((35.0, 70.0) if clean else r.snr_db))
+        return Waves(
+            speech=at_level(speech, self.rate, level, 0.0),
+            noise=at_level(noise, self.rate, level, -snr),
+            rate=self.rate,
+            wideband=band == "full" or not has_speech,  # nobody is heard: all bands are known to be noise
+            has_speech=has_speech,
+            noisy=not clean,
+            clip=self.rng.uniform(0.3, 0.9) if self.rng.random() < r.clip_share else None,
+        )

@@ -56,6 +56,14 @@ def plain_recurrence(inputs: Tensor, state: Tensor, weights: Tensor) -> Tuple[Te
     return torch.stack(outputs), state
 
 
+def network_input(features: Tensor, mean: Tensor, scale: Tensor, context: int) -> Tensor:
+    """Standardised features with their context, oldest first; before the start there is silence."""
+    padded = functional.pad(features, (0, 0, context - 1, 0))
+    standard = (padded - mean) / scale
+    count = features.shape[1]
+    return torch.cat([standard[:, i : i + count] for i in range(context)], dim=-1)
+
+
 def _product(x: Tensor, matrix: Tensor, kind: torch.dtype) -> Tensor:
     """x W with factors of the given kind and the sums in single precision."""
     return (x.to(kind) @ matrix.to(kind)).to(x.dtype)
@@ -115,11 +123,6 @@ class LayerNormGatedNetwork(nn.Module):
             y = torch.relu(a) + b * self.linear_gain[i] + self.linear_offset[i]
         return (y @ self.output + self.output_bias).transpose(0, 1), state
 
-    def macs_per_frame(self) -> int:
-        """Multiply-adds of the matrix products for one frame."""
-        width, h = self.hidden + self.features, self.hidden
-        return 4 * width * h + 2 * h * h * (self.layers - 2) + h * self.outputs
-
 
 class PlainGatedNetwork(nn.Module):
     """Network of version 0.0.5; with `linear_output` that of the voice-activity model.
@@ -159,6 +162,5 @@ class PlainGatedNetwork(nn.Module):
             y = torch.relu(both[..., :h] + self.rectified_bias[i]) + both[..., h:] + self.linear_bias[i]
         return (y @ self.output + self.output_bias).transpose(0, 1), state
 
-    def macs_per_frame(self) -> int:
-        width, h = self.hidden + self.features, self.hidden
-        return 3 * width * h + 2 * h * h * (self.layers - 2) + h * self.outputs
+
+Network = LayerNormGatedNetwork | PlainGatedNetwork

@@ -5,9 +5,7 @@ from __future__ import annotations
 import torch
 from torch import Tensor
 
-from .networks import LayerNormGatedNetwork, PlainGatedNetwork
-
-Network = LayerNormGatedNetwork | PlainGatedNetwork
+from .networks import Network, PlainGatedNetwork
 
 NOISE = 0.02  # of a matrix's standard deviation
 

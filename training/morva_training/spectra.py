@@ -93,19 +93,6 @@ def analyse(samples: np.ndarray, layout: Layout) -> np.ndarray:
     return sfft.rfft(frames.astype(np.float32, copy=False), axis=-1)
 
 
-def synthesise(spectra: np.ndarray, layout: Layout) -> np.ndarray:
-    """Overlap-add of spectra [T, frame / 2 + 1]: T * hop samples, one hop later than the input.
-
-    Sample n of the result stands for input sample n - hop, as in the engine's output queue.
-    """
-    frames = sfft.irfft(spectra, n=layout.frame, axis=-1) * vorbis_window(layout.frame)
-    hop = layout.hop
-    out = np.zeros((len(frames) + 1, hop), np.float32)
-    out[:-1] += frames[:, :hop]
-    out[1:] += frames[:, hop:]
-    return out[:-1].reshape(-1)
-
-
 def frame_energies(spectra: np.ndarray, frame: int) -> np.ndarray:
     """Mean square per sample of each frame, estimated from windowed half spectra.
 
@@ -150,11 +137,3 @@ def log_features(spectra: np.ndarray, gains: np.ndarray, layout: Layout) -> np.n
     power = np.square(seen.real) + np.square(seen.imag)
     bands = compress_bands(power * np.square(gains)[..., None], layout)
     return np.log(bands + FEATURE_OFFSET).astype(np.float32)
-
-
-def with_context(features: np.ndarray, preview: int) -> np.ndarray:
-    """Network input [..., T, preview * K]: the newest frames, oldest first, zeros before the start."""
-    count = features.shape[-2]
-    pad = [(0, 0)] * (features.ndim - 2) + [(preview - 1, 0), (0, 0)]
-    padded = np.pad(features, pad)
-    return np.concatenate([padded[..., i : i + count, :] for i in range(preview)], axis=-1)

@@ -1,10 +1,4 @@
-"""Training material of the voice-activity model: mixtures, labels and features at 8 kHz.
-
-Labels come from the clean speech alone. A 10 ms block is voice when its power is within 30 dB of
-the speaker's loud blocks, and so is its power above 80 Hz (what lies below is the rumble of desks
-and traffic); gaps below 80 ms are closed, islands below 30 ms dropped, edges stay where they are.
-Blocks between 30 and 42 dB do not count, they are neither.
-"""
+"""Training material of the voice-activity model: mixtures, labels (see measures) and features at 8 kHz."""
 
 from __future__ import annotations
 
@@ -14,12 +8,10 @@ from typing import Iterator
 import numpy as np
 import torch
 from scipy import fft as sfft
-from scipy.ndimage import binary_closing, binary_opening
-from scipy.signal import butter, sosfiltfilt
 from torch import Tensor
 from torch.utils.data import IterableDataset
 
-from .engine import voice_features
+from .measures import block_labels, frame_labels
 from .mixing import MixtureMaker, Recipe
 from .spectra import hamming_window
 
@@ -28,8 +20,6 @@ FRAME = 240
 FEATURES = 61
 CONTEXT = 5
 BLOCK = RATE // 100
-VOICE_DB, DOUBT_DB = -30.0, -42.0
-LOWEST_VOICE_HZ = 80.0
 
 VOICE_RECIPE = Recipe(
     seconds=5.0,
@@ -56,40 +46,26 @@ VOICE_RECIPE = Recipe(
 DEV_RECIPE = Recipe(seconds=5.0, snr_db=(-5.0, 15.0), level_db=(-40.0, -15.0), pause_share=0.7, pause_seconds=1.0)
 
 
-def relative_power(samples: np.ndarray, block: int) -> np.ndarray:
-    """Power per block over that of the loud ones; zeros when nothing is there."""
-    power = np.square(samples.reshape(-1, block)).mean(axis=1)
-    if not len(power) or power.max() <= 0:
-        return np.zeros(len(power))
-    return power / np.percentile(power[power > power.max() * 1e-5], 90)
+def pooling_starts(bins: int) -> np.ndarray:
+    """First bins of the voice model's bands: single bins, then pairs, fours and so on per octave."""
+    extra = 1 if bins % 8 == 1 else 0
+    quarter = bins // 4
+    starts = list(range(quarter + extra))
+    index, width, boundary = quarter + extra, 2, 2 * quarter
+    while index < bins:
+        if index - extra == boundary:
+            width, boundary = 2 * width, 2 * boundary
+        starts.append(index)
+        index += width
+    return np.array(starts)
 
 
-def block_labels(speech: np.ndarray, block: int = BLOCK) -> tuple[np.ndarray, np.ndarray]:
-    """Voice (bool) and weight per block (10 ms) of clean speech."""
-    count = len(speech) // block
-    if count == 0:
-        return np.zeros(0, bool), np.ones(0, np.float32)
-    samples = speech[: count * block].astype(np.float64)
-    high_pass = butter(4, LOWEST_VOICE_HZ, "highpass", fs=100 * block, output="sos")
-    voiced = sosfiltfilt(high_pass, samples, padlen=min(len(samples) - 1, 10 * block))
-    # Both: the filter rings ahead of a start, and rumble is loud without it.
-    power = np.minimum(relative_power(samples, block), relative_power(voiced, block))
-    voice = power > 10 ** (VOICE_DB / 10)
-    padded = np.pad(voice, 8)
-    padded = binary_opening(binary_closing(padded, np.ones(8)), np.ones(3))
-    voice = padded[8:-8]
-    doubtful = ~voice & (power > 10 ** (DOUBT_DB / 10))
-    weight = np.where(doubtful, 0.0, 1.0)
-    onset = np.flatnonzero(np.diff(voice.astype(int)) == 1) + 1
-    for start in onset:
-        weight[start : start + 5] = 2.0
-    return voice, weight.astype(np.float32)
-
-
-def frame_labels(values: np.ndarray, blocks: int) -> np.ndarray:
-    """Mean of the block values over caller's frames of `blocks` blocks."""
-    count = len(values) // blocks
-    return values[: count * blocks].reshape(count, blocks).astype(np.float32).mean(axis=1)
+def voice_features(spectrum: np.ndarray) -> np.ndarray:
+    """Log band powers [..., F] of spectra [..., FrameLength / 2 + 1], before standardisation."""
+    power = np.square(spectrum.real) + np.square(spectrum.imag)
+    starts = pooling_starts(power.shape[-1])
+    widths = np.diff(np.append(starts, power.shape[-1]))
+    return np.log(np.add.reduceat(power, starts, axis=-1) / widths + 1).astype(np.float32)
 
 
 def tracked_gains(frames: np.ndarray) -> np.ndarray:
@@ -121,14 +97,6 @@ def stream_features(samples: np.ndarray, frame: int, heard: np.ndarray | None = 
     return voice_features(spectra)
 
 
-def network_input(features: Tensor, mean: Tensor, variance: Tensor) -> Tensor:
-    """Standardised features with four frames of context; before the start there is silence."""
-    padded = torch.nn.functional.pad(features, (0, 0, CONTEXT - 1, 0))
-    standard = (padded - mean) / torch.sqrt(variance + 1e-7)
-    count = features.shape[1]
-    return torch.cat([standard[:, i : i + count] for i in range(CONTEXT)], dim=-1)
-
-
 class VoiceBatches(IterableDataset):
     """Endless batches of features, labels and weights; the caller's frame changes from batch to batch."""
 
@@ -142,14 +110,8 @@ class VoiceBatches(IterableDataset):
 
     def piece(self, maker: MixtureMaker) -> tuple[np.ndarray, np.ndarray, np.ndarray, np.ndarray]:
         """Noisy samples, clean samples, voice per block, weight per block."""
-        waves = maker.draw_waves()
-        count = len(waves.speech)
-        speech_gain, noise_gain = maker.equalisers(count // 2 + 1)
-        both = sfft.rfft(np.stack([waves.speech, waves.noise]).astype(np.float32), axis=-1)
-        both *= np.stack([speech_gain, noise_gain])
-        speech, noise = sfft.irfft(both, n=count, axis=-1)
-        speech = speech if waves.has_speech else np.zeros_like(speech)
-        return np.clip(speech + noise, -32768, 32767), speech, *block_labels(speech)
+        waves = maker.draw()
+        return waves.heard(), waves.speech, *block_labels(waves.speech, BLOCK)
 
     def __iter__(self) -> Iterator[dict[str, Tensor]]:
         worker = torch.utils.data.get_worker_info()

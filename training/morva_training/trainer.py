@@ -1,0 +1,102 @@
+"""The training program: what all kinds of models share, from the command line to the weight file.
+
+Runs on a CPU or a GPU. A run that was stopped goes on from its last checkpoint when it is started again
+with the same folder; with `--steps 0` it only writes the weight file of what is there, also while it runs.
+"""
+
+from __future__ import annotations
+
+import argparse
+from abc import ABC, abstractmethod
+from pathlib import Path
+
+import numpy as np
+import torch
+from torch import Tensor, nn
+from torch.utils.data import DataLoader, IterableDataset
+
+from . import mvw, together
+from .convert import half_precision
+from .loop import Run, Schedule, steps_done
+from .mvw import Weight
+from .networks import Network, network_input
+
+STATISTICS_BATCHES = 4
+
+
+class Task(ABC):
+    """What one kind of model brings. Mean and spread of the features are those of its weight file."""
+
+    context: int  # frames of features that the network sees
+    skipped: int  # frames at the start of a piece, while the memory fills
+
+    def __init__(self, args: argparse.Namespace) -> None:
+        self.args = args
+        self.device = torch.device("cuda" if torch.cuda.is_available() else "cpu")
+
+    @abstractmethod
+    def batches(self, seed: int) -> IterableDataset: ...
+
+    @abstractmethod
+    def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
+        """Mean and spread of features [n, F]."""
+
+    @abstractmethod
+    def network(self, start: Weight | None) -> Network:
+        """The network to train, fresh or from a weight file."""
+
+    @abstractmethod
+    def loss(self, model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]: ...
+
+    @abstractmethod
+    def validate(self, model: nn.Module) -> dict[str, float]: ...
+
+    @abstractmethod
+    def weight(self, model: nn.Module, mean: np.ndarray, spread: np.ndarray) -> Weight: ...
+
+    def scale(self, spread: Tensor) -> Tensor:
+        return spread
+
+    def outputs(self, model: nn.Module, batch: dict[str, Tensor]) -> Tensor:
+        """Logits [B, T, K] of the whole pieces."""
+        x = network_input(batch["features"].to(self.device), self.mean, self.input_scale, self.context)
+        return model(x, model.initial_state(len(x)))[0]
+
+    def standardise(self, mean: list[float], spread: list[float]) -> None:
+        self.mean = torch.tensor(mean, device=self.device)
+        self.input_scale = self.scale(torch.tensor(spread, device=self.device))
+
+
+def add_options(parser: argparse.ArgumentParser, *, steps: int, batch: int, rate: float, seed: int) -> None:
+    parser.add_argument("--store", type=Path, required=True, help="decoded audio (see corpus)")
+    parser.add_argument("--run", type=Path, required=True, help="folder of checkpoints and log")
+    parser.add_argument("--out", type=Path, help="weight file to write at the end")
+    parser.add_argument("--start", type=Path, help="weight file to start from, grown to the shape asked for")
+    parser.add_argument("--steps", type=int, default=steps)
+    parser.add_argument("--batch", type=int, default=batch)
+    parser.add_argument("--rate", type=float, default=rate)
+    parser.add_argument("--seed", type=int, default=seed)
+    parser.add_argument("--workers", type=int, default=1)
+
+
+def train(task: Task) -> None:
+    args = task.args
+    torch.manual_seed(args.seed)
+    if task.device.type == "cpu":
+        torch.set_num_threads(1)
+    # A resumed run must not hear the same mixtures again, nor two processes the same.
+    seed = args.seed + 7919 * steps_done(args.run) + 104729 * together.join()
+    loader = iter(DataLoader(task.batches(seed), batch_size=None, num_workers=args.workers))
+    start = mvw.read(args.start) if args.start else None
+    if start:
+        mean, spread = (torch.from_numpy(start[key]) for key in ("MU", "SD"))
+    else:
+        some = torch.cat([next(loader)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
+        mean, spread = (together.from_the_first(v) for v in task.statistics(some))
+    extra = {"mean": mean.tolist(), "spread": spread.tolist()}
+    run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate), extra)
+    task.standardise(run.extra["mean"], run.extra["spread"])
+    run.train(loader, task.loss, task.validate)
+    if args.out and together.rank() == 0:
+        weight = task.weight(run.averaged, np.array(run.extra["mean"]), np.array(run.extra["spread"]))
+        mvw.write(args.out, half_precision(weight))
