@@ -285,12 +285,10 @@ TEST(LifeCycle, DestroyingTheEngineEndsItsSessions) {
         Engine engine;
         Engine::addIdentity("id", 16000, 20);
         for (int i = 0; i < 200; ++i) handles.push_back(openNc(16000, 16000, 10, "id"));
-        // Handles stay apart, and closing one leaves the others alone.
-        for (std::size_t i = 0; i < handles.size(); i += 3) {
+        // Closing some leaves the others alone.
+        for (std::size_t i = 0; i < handles.size(); i += 2) {
             EXPECT_EQ(Morva_NC_CloseSession(handles[i]), 0);
-        }
-        for (std::size_t i = 1; i < handles.size(); i += 3) {
-            EXPECT_EQ(MorvaExt_SessionLatencySamples(handles[i]), 160);
+            EXPECT_EQ(MorvaExt_SessionLatencySamples(handles[i + 1]), 160);
         }
     }
     Engine again;
