@@ -4,23 +4,16 @@
 #include <cstdio>
 #include <cstdlib>
 #include <filesystem>
+#include <fstream>
 #include <string>
 #include <vector>
 
 #include "morva-sdk/morva-ext.h"
 #include "morva-sdk/morva-sdk.h"
+#include "shipped_models.h"
 
 namespace morva_bench {
 
-struct ShippedModel {
-    char const* name;
-    char const* file;
-};
-inline constexpr ShippedModel kNoiseModels[] = {{"small_8k", "NC_small_8k.mvw"},
-                                                {"small_16k", "NC_small_16k.mvw"},
-                                                {"full", "c6.xs.f.ca03f4.mvw"}};
-inline constexpr ShippedModel kVoiceModel = {"voice", "VAD_weight.mvw"};
-inline constexpr ShippedModel kLevelModel = {"level", "noise_level_16k.mvw"};
 inline constexpr int kRates[] = {8000, 16000, 32000, 44100, 48000, 96000};
 
 // Where the shipped models are, unless MORVA_BENCH_MODELS names another folder.
@@ -34,16 +27,22 @@ inline void startEngine() {
     static bool const started = [] {
         std::wstring const folder = modelFolder().wstring();
         if (Morva_SDK_GlobalInit(folder.c_str(), 1) != 0) std::exit(1);
-        auto const add = [](ShippedModel const& model) {
+        for (auto const& model : morva::shippedModels) {
             auto const file = std::filesystem::path(model.file).wstring();
             if (Morva_SDK_SetModel(file.c_str(), model.name) != 0) std::exit(1);
-        };
-        for (auto const& model : kNoiseModels) add(model);
-        add(kVoiceModel);
-        add(kLevelModel);
+        }
         return true;
     }();
     static_cast<void>(started);
+}
+
+// Memory of this process.
+inline long residentKib() {
+    std::ifstream status("/proc/self/status");
+    for (std::string line; std::getline(status, line);) {
+        if (line.starts_with("VmRSS:")) return std::atol(line.c_str() + 6);
+    }
+    return 0;
 }
 
 // A 10 ms noise-cancellation session with the same rate in and out, closed at the end of its scope.

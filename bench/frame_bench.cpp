@@ -62,37 +62,33 @@ constexpr NamedSound kSounds[] = {{"speech", Sound::speech},
                                   {"denormal", Sound::denormal},
                                   {"clipped", Sound::clipped}};
 
-[[maybe_unused]] bool const registered = [] {
-    for (auto const& model : kNoiseModels) {
-        for (int const rate : kRates) {
-            for (auto const& sound : kSounds) {
-                // Other sounds than speech only where their cost is compared.
-                if (sound.kind != Sound::speech && rate != 48000) continue;
-                std::string const name = std::string("frame/") + model.name + "/" +
-                                         std::to_string(rate) + "/" + sound.name;
-                benchmark::RegisterBenchmark(name.c_str(), cleanFrames, model.name, rate,
-                                             sound.kind);
-            }
+void registerFrames(char const* model) {
+    for (int const rate : kRates) {
+        for (auto const& sound : kSounds) {
+            // Other sounds than speech only where their cost is compared.
+            if (sound.kind != Sound::speech && rate != 48000) continue;
+            auto const name =
+                std::string("frame/") + model + '/' + std::to_string(rate) + '/' + sound.name;
+            benchmark::RegisterBenchmark(name.c_str(), cleanFrames, model, rate, sound.kind);
         }
     }
-    auto const load = [](ShippedModel const& model) {
-        std::string const name = std::string("model_load/") + model.name;
-        benchmark::RegisterBenchmark(name.c_str(), loadModel, model.file);
-    };
-    for (auto const& model : kNoiseModels) {
-        load(model);
-        std::string const name = std::string("session_open/") + model.name;
-        benchmark::RegisterBenchmark(name.c_str(), openNoiseSession, model.name);
+}
+
+auto* openerOf(morva::ShippedKind kind) {
+    using enum morva::ShippedKind;
+    if (kind == NC) return &openNoiseSession;
+    return kind == VAD ? &openValueSession<Morva_VAD_CreateSession, Morva_VAD_CloseSession>
+                       : &openValueSession<Morva_NoiseDB_CreateSession, Morva_NoiseDB_CloseSession>;
+}
+
+[[maybe_unused]] bool const registered = [] {
+    for (auto const& [file, name, kind, rate, maxRate] : morva::shippedModels) {
+        if (kind == morva::ShippedKind::NC) registerFrames(name);
+        auto const load = std::string("model_load/") + name;
+        benchmark::RegisterBenchmark(load.c_str(), loadModel, file);
+        auto const open = std::string("session_open/") + name;
+        benchmark::RegisterBenchmark(open.c_str(), openerOf(kind), name);
     }
-    load(kVoiceModel);
-    load(kLevelModel);
-    benchmark::RegisterBenchmark("session_open/voice",
-                                 openValueSession<Morva_VAD_CreateSession, Morva_VAD_CloseSession>,
-                                 kVoiceModel.name);
-    benchmark::RegisterBenchmark(
-        "session_open/level",
-        openValueSession<Morva_NoiseDB_CreateSession, Morva_NoiseDB_CloseSession>,
-        kLevelModel.name);
     return true;
 }();
 

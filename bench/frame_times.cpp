@@ -36,7 +36,7 @@ void printPercentiles(char const* what, std::vector<float>& times) {
 }
 
 void printDistribution(std::size_t frames) {
-    Session session("full", 48000);
+    Session session("full_NC-ca03f4", 48000);
     auto const sound = makeSound(Sound::speech, 48000, 10.0);
     std::size_t position = 0;
     std::vector<float> elapsed(frames);
@@ -59,7 +59,8 @@ void printSoundRatios() {
     constexpr Sound kKinds[] = {Sound::speech, Sound::silence, Sound::denormal, Sound::clipped};
     constexpr int kRounds = 31;
     std::printf("\ncost relative to speech     silence  denormal   clipped\n");
-    for (auto const& model : kNoiseModels) {
+    for (auto const& model : morva::shippedModels) {
+        if (model.kind != morva::ShippedKind::NC) continue;
         std::array<std::vector<double>, std::size(kKinds)> costs;
         std::array<std::unique_ptr<Session>, std::size(kKinds)> sessions;
         std::array<std::vector<float>, std::size(kKinds)> sounds;
@@ -83,14 +84,6 @@ void printSoundRatios() {
     std::printf("\n");
 }
 
-long residentKib() {
-    std::ifstream status("/proc/self/status");
-    for (std::string line; std::getline(status, line);) {
-        if (line.starts_with("VmRSS:")) return std::atol(line.c_str() + 6);
-    }
-    return 0;
-}
-
 void printSessionCost() {
     constexpr int kSessions = 1000;
     auto const sound = makeSound(Sound::speech, 48000, 1.0);
@@ -98,7 +91,7 @@ void printSessionCost() {
     long const before = residentKib();
     double const opened = cpuSeconds();
     for (int i = 0; i < kSessions; ++i)
-        sessions.push_back(std::make_unique<Session>("full", 48000));
+        sessions.push_back(std::make_unique<Session>("full_NC-ca03f4", 48000));
     double const openMs = 1e3 * (cpuSeconds() - opened);
     double const started = cpuSeconds();
     for (auto& session : sessions) {

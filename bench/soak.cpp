@@ -33,22 +33,15 @@ struct Place {
     char const* model;
     int rate;
 };
-constexpr Place kPlaces[] = {{"full", 48000},      {"full", 44100},    {"small_16k", 16000},
-                             {"small_16k", 48000}, {"small_8k", 8000}, {"small_8k", 96000}};
+constexpr Place kPlaces[] = {{"full_NC-ca03f4", 48000}, {"full_NC-ca03f4", 44100},
+                             {"small_NC", 16000},       {"small_NC", 48000},
+                             {"small_NC_8k", 8000},     {"small_NC_8k", 96000}};
 constexpr int kValueRate = 16000;
 constexpr double kModels = std::size(kPlaces) + 2.0;  // and voice activity, noise level
 
 [[noreturn]] void fail(std::string const& what) {
     std::printf("FAILED: %s\n", what.c_str());
     std::exit(1);
-}
-
-long residentKib() {
-    std::ifstream status("/proc/self/status");
-    for (std::string line; std::getline(status, line);) {
-        if (line.starts_with("VmRSS:")) return std::atol(line.c_str() + 6);
-    }
-    return 0;
 }
 
 // Speech, music-like tones, noise, silence, clicks, clipping, denormals and broken samples by
@@ -204,9 +197,9 @@ public:
 private:
     static void* open(char kind) {
         auto const rate = static_cast<MorvaSamplingRate>(kValueRate);
-        auto* const handle = kind == 'v'
-                                 ? Morva_VAD_CreateSession(rate, MORVA_FRAME_10_MS, "voice")
-                                 : Morva_NoiseDB_CreateSession(rate, MORVA_FRAME_10_MS, "level");
+        auto* const handle =
+            kind == 'v' ? Morva_VAD_CreateSession(rate, MORVA_FRAME_10_MS, "default_VAD")
+                        : Morva_NoiseDB_CreateSession(rate, MORVA_FRAME_10_MS, "noise_level");
         if (handle == nullptr) fail("a session does not open");
         return handle;
     }

@@ -29,8 +29,8 @@ void addOurs(Contestants& all) {
         int rate;
     };
     for (auto const [model, rate] :
-         {Place{"full", 48000}, Place{"full", 32000}, Place{"small_16k", 48000},
-          Place{"small_16k", 16000}, Place{"small_8k", 8000}}) {
+         {Place{"full_NC-ca03f4", 48000}, Place{"full_NC-ca03f4", 32000}, Place{"small_NC", 48000},
+          Place{"small_NC", 16000}, Place{"small_NC_8k", 8000}}) {
         all.push_back(
             {std::string("this engine, ") + model, rate, std::make_unique<Ours>(model, rate)});
     }

@@ -77,8 +77,8 @@ void print(std::vector<Line> const& lines, std::string const& reference) {
 void printFloor(std::vector<Line> const& lines, Machine const& machine) {
     std::printf("\nmeasured: %.1f GB/s from memory, %.1f GFLOP/s\n",
                 machine.memoryBytesPerSecond() / 1e9, machine.operationsPerSecond() / 1e9);
-    for (auto const& work : {frameWork("full", "c6.xs.f.ca03f4.mvw", 48000),
-                             frameWork("small_16k", "NC_small_16k.mvw", 16000)}) {
+    for (auto const& work : {frameWork("full_NC-ca03f4", "c6.xs.f.ca03f4.mvw", 48000),
+                             frameWork("small_NC", "NC_small_16k.mvw", 16000)}) {
         auto const line = std::ranges::find_if(lines, [&](Line const& candidate) {
             return candidate.name == "this engine, " + work.model && candidate.rate == work.rate;
         });

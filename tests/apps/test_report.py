@@ -70,7 +70,7 @@ def look():
 def test_all_plots_are_drawn_and_both_sounds_play(look, morva, model, recording, tmp_path):
     sound = speechlike(48000, 2.0, seed=5)[:, 0]
     sound[:24000] = 0
-    source = recording(sound, 48000, 'a <b> & "c" </script> äö.wav')
+    source = recording(sound, 48000, 'a <b> & "c" <!--<script> äö.wav')
     others = ["--vad-model", model(loudness_voice(), "v.mvw"), "--level-model", model(noise_level(), "l.mvw")]
     morva("report", source, tmp_path / "page.html", "--model", model(constant_mask(0)), *others)
     seen = look(tmp_path / "page.html")

@@ -28,10 +28,14 @@ export PKG_CONFIG_PATH
 cc -std=c11 -D_POSIX_C_SOURCE=200809L "$source/examples/c/denoise.c" -o "$work/denoise" \
     $(pkg-config --cflags --libs morva)
 models=$(pkg-config --variable=modelsdir morva)
-head -c 96000 /dev/urandom >"$work/noise.raw"
-LD_LIBRARY_PATH=$(echo "$prefix"/lib*) "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" 48000 \
-    <"$work/noise.raw" >"$work/quiet.raw" 2>"$work/log"
-[ "$(stat -c %s "$work/quiet.raw")" = 96000 ] || fail "C example: $(cat "$work/log")"
+LD_LIBRARY_PATH=$(echo "$prefix"/lib*)
+export LD_LIBRARY_PATH
+for size in 0 2 96002; do # no whole number of frames
+    head -c $size /dev/urandom | "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" 48000 >"$work/quiet.raw" 2>"$work/log"
+    [ "$(stat -c %s "$work/quiet.raw")" = $size ] || fail "C example: $(cat "$work/log")"
+done
+! "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" 22050 </dev/null 2>"$work/log" || fail "C example takes any rate"
+unset LD_LIBRARY_PATH
 
 echo "-- command line"
 "$prefix/bin/morva" --version | grep -qx "$(pkg-config --modversion morva)" || fail "versions differ"
