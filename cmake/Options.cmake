@@ -22,7 +22,7 @@ target_compile_options(morva_options INTERFACE
     -Wall -Wextra -Wpedantic -Werror -Wshadow -Wconversion -Wno-sign-conversion
     $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Wold-style-cast> -ffunction-sections -fdata-sections
     $<$<CXX_COMPILER_ID:GNU>:-Wno-restrict>  # false alarms on std::string in GCC 12
-    -fno-math-errno -ffp-contract=on)
+    -fno-math-errno -ffp-contract=off)
 target_link_options(morva_options INTERFACE -Wl,--gc-sections)
 if(MORVA_SANITIZE)
     target_compile_options(morva_options INTERFACE -fsanitize=${MORVA_SANITIZE} -fno-omit-frame-pointer

@@ -3,52 +3,24 @@
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <algorithm>
-#include <cstddef>
-#include <cstdint>
+#include <array>
+#include <functional>
 #include <initializer_list>
 
 #include "harness.h"
-#include "support/weight_writer.h"
+#include "morva-sdk/vocabulary.h"
 
 namespace {
 
-constexpr int rates[] = {8000,  12000, 16000, 24000, 32000, 44100,
-                         48000, 88200, 96000, 22050, 0,     -1};
-constexpr int durations[] = {10, 20, 30, 40, 15, 32, 0, 25};
-constexpr char const* names[] = {"nc6", "nc5", "vad", "", "other", nullptr};
+constexpr std::array wildRates = {22050, 0, -1};
+constexpr std::array wildDurations = {15, 32, 0, 25};
+constexpr std::array<char const*, 6> names = {"nc6", "nc5", "vad", "", "other", nullptr};
 
 struct Weights {
-    std::string nc6;
-    std::string nc5;
-    std::string vad;
+    std::string nc6 = test_support::randomNcWeight(fuzz::smallShape());
+    std::string nc5 = test_support::randomNcWeight(fuzz::smallShape("0.0.5"));
+    std::string vad = test_support::randomVadWeight({.hidden = 2, .gates = 1});
 };
-
-Weights const& weights() {
-    static auto const all = [] {
-        test_support::NcShape nc;
-        nc.sampleRate = 8000;
-        nc.frameLength = 160;
-        nc.filtrEnd = 64;
-        nc.previewFrames = 1;
-        nc.hidden = 4;
-        nc.gates = 4;
-        Weights made;
-        made.nc6 = test_support::randomNcWeight(nc);
-        nc.version = "0.0.5";
-        nc.gates = 1;
-        made.nc5 = test_support::randomNcWeight(nc);
-        test_support::VadShape vad;
-        vad.hidden = 2;
-        vad.gates = 1;
-        made.vad = test_support::randomVadWeight(vad);
-        return made;
-    }();
-    return all;
-}
-
-bool isOneOf(int value, std::initializer_list<int> legal) {
-    return std::find(legal.begin(), legal.end(), value) != legal.end();
-}
 
 class Caller {
 public:
@@ -57,63 +29,57 @@ public:
     Caller(Caller const&) = delete;
     Caller& operator=(Caller const&) = delete;
 
+    // Starting, opening and frames more often than the rest, so that sequences get somewhere.
     void step() {
-        switch (choices_.ConsumeIntegralInRange(0, 15)) {
+        switch (below(16)) {
             case 0:
-                answer(Morva_SDK_GlobalDestroy(), {0, -3});
-                break;
+                return answer(Morva_SDK_GlobalDestroy(), {0, -3});
             case 1:
             case 2:
-                start();
-                break;
+                return start();
             case 3:
-                setModel();
-                break;
+                return setModel();
             case 4:
             case 5:
             case 6:
-                open();
-                break;
+                return open();
             case 7:
-                close();
-                break;
+                return closeOrReset();
             case 8:
-                answer(Morva_NoiseDB_ResetSession(handle()), {1, -3});
-                break;
             case 9:
-                sizes();
-                break;
-            case 10:
-                adjust();
-                break;
+                return askOrAdjust();
             default:
-                frame();
-                break;
+                return below(2) == 0 ? frame<short>() : frame<float>();
         }
     }
 
 private:
-    void answer(int value, std::initializer_list<int> legal) {
-        fuzz::require(isOneOf(value, legal), "the answer is one that the header lists");
+    static void answer(int value, std::initializer_list<int> legal) {
+        fuzz::require(std::ranges::find(legal, value) != legal.end(),
+                      "the answer is one that the header lists");
     }
-    template <class T, std::size_t n>
-    T pick(T const (&values)[n]) {
-        return values[choices_.ConsumeIntegralInRange<std::size_t>(0, n - 1)];
+    static void finite(float value) { fuzz::require(std::isfinite(value), "values are finite"); }
+
+    std::size_t below(std::size_t n) {
+        return choices_.ConsumeIntegralInRange<std::size_t>(0, n - 1);
     }
-    // Mostly legal, so that sequences get somewhere.
+    template <class Values>
+    auto oneOf(Values const& values) {
+        return values[below(values.size())];
+    }
+    template <class Enum, class Legal, class Wild>
+    Enum mostlyLegal(Legal const& legal, Wild const& wild) {
+        return static_cast<Enum>(below(16) == 0 ? oneOf(wild) : oneOf(legal));
+    }
     MorvaSamplingRate rate() {
-        auto const wild = choices_.ConsumeIntegralInRange(0, 15) == 0;
-        return static_cast<MorvaSamplingRate>(wild ? pick(rates)
-                                                   : rates[choices_.ConsumeIntegralInRange(0, 8)]);
+        return mostlyLegal<MorvaSamplingRate>(MORVA::MORVA_SDK::kSamplingRatesHz, wildRates);
     }
     MorvaFrameDuration duration() {
-        auto const wild = choices_.ConsumeIntegralInRange(0, 15) == 0;
-        return static_cast<MorvaFrameDuration>(
-            wild ? pick(durations) : durations[choices_.ConsumeIntegralInRange(0, 3)]);
+        return mostlyLegal<MorvaFrameDuration>(MORVA::MORVA_SDK::kFrameDurationsMs, wildDurations);
     }
     // A live, a closed, a null or an invented handle; the last ones are never looked into.
     void* handle() {
-        auto const which = choices_.ConsumeIntegralInRange<std::size_t>(0, handles_.size() + 1);
+        auto const which = below(handles_.size() + 2);
         if (which < handles_.size()) return handles_[which];
         return which == handles_.size() ? nullptr : &choices_;
     }
@@ -123,163 +89,113 @@ private:
                                                 choices_.ConsumeIntegral<unsigned>());
         answer(result, {0, -3});
         if (result != 0) return;
-        auto const& all = weights();
-        add(all.nc6, "nc6");
-        add(all.nc5, "nc5");
-        add(all.vad, "vad");
-    }
-    int add(std::string const& weight, char const* name) {
-        return Morva_SDK_SetModel_Blob(weight.data(), static_cast<unsigned>(weight.size()), name);
+        static Weights const weights;
+        fuzz::Engine::setModel(weights.nc6, "nc6");
+        fuzz::Engine::setModel(weights.nc5, "nc5");
+        fuzz::Engine::setModel(weights.vad, "vad");
     }
     void setModel() {
-        switch (choices_.ConsumeIntegralInRange(0, 3)) {
+        switch (below(4)) {
             case 0:
-                answer(Morva_SDK_SetModel(nullptr, pick(names)), {2});
-                break;
+                return answer(Morva_SDK_SetModel(nullptr, oneOf(names)), {2});
             case 1:
-                answer(Morva_SDK_SetModel(L"missing.mvw", pick(names)), {2, -3});
-                break;
+                return answer(Morva_SDK_SetModel(L"missing.mvw", oneOf(names)), {2, -3});
             case 2:
-                answer(Morva_SDK_SetModel_Blob(nullptr, 5, pick(names)), {2});
-                break;
-            default: {
+                return answer(Morva_SDK_SetModel_Blob(nullptr, 5, oneOf(names)), {2});
+            default:
                 auto const bytes = choices_.ConsumeRandomLengthString(64);
-                answer(add(bytes, choices_.ConsumeRandomLengthString(8).c_str()), {0, 2, -3});
-            }
+                auto const name = choices_.ConsumeRandomLengthString(8);
+                answer(fuzz::Engine::setModel(bytes, name.c_str()), {0, 2, -3});
         }
     }
     void open() {
         auto const in = rate();
         auto const out = rate();
         auto const ms = duration();
-        auto const* const name = pick(names);
-        void* opened = nullptr;
-        switch (choices_.ConsumeIntegralInRange(0, 2)) {
-            case 0:
-                opened = Morva_NC_CreateSession(in, out, ms, name);
-                break;
-            case 1:
-                opened = Morva_VAD_CreateSession(in, ms, name);
-                break;
-            default:
-                opened = Morva_NoiseDB_CreateSession(in, ms, name);
-                break;
-        }
+        auto const* const name = oneOf(names);
+        auto const kind = below(3);
+        void* const opened = kind == 0   ? Morva_NC_CreateSession(in, out, ms, name)
+                             : kind == 1 ? Morva_VAD_CreateSession(in, ms, name)
+                                         : Morva_NoiseDB_CreateSession(in, ms, name);
         if (opened != nullptr) handles_.push_back(opened);
     }
-    void close() {
-        auto* const victim = handle();
-        switch (choices_.ConsumeIntegralInRange(0, 2)) {
-            case 0:
-                answer(Morva_NC_CloseSession(victim), {0, -3});
-                break;
-            case 1:
-                answer(Morva_VAD_CloseSession(victim), {0, -3});
-                break;
-            default:
-                answer(Morva_NoiseDB_CloseSession(victim), {0, -3});
-                break;
-        }
+    void closeOrReset() {
+        constexpr std::array calls = {Morva_NC_CloseSession, Morva_VAD_CloseSession,
+                                      Morva_NoiseDB_CloseSession, Morva_NoiseDB_ResetSession};
+        auto const which = below(calls.size());
+        answer(calls[which](handle()), {which == 3 ? 1 : 0, -3});
     }
-    void sizes() {
-        unsigned in = 0;
-        unsigned out = 0;
-        answer(MorvaExt_SessionFrameSizes(handle(), &in, &out), {0, 2, -3});
-        auto const latency = MorvaExt_SessionLatencySamples(handle());
-        fuzz::require(latency >= -3, "a latency is a count or a code");
-    }
-    // What can be changed while a noise-cancellation session runs.
-    void adjust() {
+    void askOrAdjust() {
         auto* const session = handle();
-        int const on = choices_.ConsumeIntegralInRange(0, 2);
-        switch (choices_.ConsumeIntegralInRange(0, 4)) {
-            case 0: {
-                auto const limit = choices_.ConsumeFloatingPoint<float>();
-                answer(MorvaExt_NC_SetAttenuationLimit(session, limit), {0, 1, 2, -3});
-                break;
-            }
-            case 1:
-                answer(MorvaExt_NC_SetBypass(session, on), {0, 2, -3});
-                break;
-            case 2:
-                answer(MorvaExt_NC_SetBackgroundSpeaker(session, on), {0, 1, 2, -3});
-                break;
-            case 3:
-                answer(MorvaExt_NC_EnableVoice(session, pick(names)), {0, 2, -3});
-                break;
-            default: {
-                float voice = 0.0F;
-                float level = 0.0F;
-                answer(MorvaExt_NC_FrameMeters(session, &voice, &level), {0, 1, 2, -3});
-                fuzz::require(std::isfinite(level), "the removed level is finite");
-            }
-        }
+        int const on = static_cast<int>(below(3));
+        unsigned in = 0;
+        float voice = 0.0F;
+        float level = 0.0F;
+        float const limit = choices_.ConsumeFloatingPoint<float>();
+        std::function<int()> const calls[] = {
+            [&] { return MorvaExt_SessionFrameSizes(session, &in, nullptr); },
+            [&] { return std::min(0, MorvaExt_SessionLatencySamples(session) + 2); },
+            [&] { return MorvaExt_NC_SetAttenuationLimit(session, limit); },
+            [&] { return MorvaExt_NC_SetBypass(session, on); },
+            [&] { return MorvaExt_NC_SetBackgroundSpeaker(session, on); },
+            [&] { return MorvaExt_NC_EnableVoice(session, oneOf(names)); },
+            [&] { return MorvaExt_NC_FrameMeters(session, &voice, &level); },
+        };
+        answer(calls[below(std::size(calls))](), {0, 1, 2, -1, -3});
+        finite(level);
     }
 
     // The session's own sizes most of the time, else any; buffers are exactly as long as they are
     // said to be, so that a read past them is seen.
+    template <class Sample>
     void frame() {
         auto* const session = handle();
         unsigned in = 0;
         unsigned out = 0;
         MorvaExt_SessionFrameSizes(session, &in, &out);
-        if (choices_.ConsumeIntegralInRange(0, 7) == 0) {
-            in = choices_.ConsumeIntegralInRange(0U, 4000U);
-        }
-        if (choices_.ConsumeIntegralInRange(0, 7) == 0) {
-            out = choices_.ConsumeIntegralInRange(0U, 4000U);
-        }
-        if (choices_.ConsumeBool()) {
-            frameInt16(session, in, out);
+        if (below(8) == 0) in = static_cast<unsigned>(below(4001));
+        if (below(8) == 0) out = static_cast<unsigned>(below(4001));
+        Sample value{};
+        if constexpr (std::is_same_v<Sample, float>) {
+            value = choices_.ConsumeFloatingPoint<float>();
         } else {
-            frameFloat(session, in, out);
+            value = choices_.ConsumeIntegral<short>();
         }
-    }
-    void frameInt16(void* session, unsigned in, unsigned out) {
-        std::vector<short> input(in, choices_.ConsumeIntegral<short>());
-        std::vector<short> output(out);
+        std::vector<Sample> const input(in, value);
+        std::vector<Sample> output(out);
         auto const* const source = input.empty() ? nullptr : input.data();
-        switch (choices_.ConsumeIntegralInRange(0, 2)) {
+        call(session, source, in, output.data(), out);
+        for (Sample const sample : output) finite(static_cast<float>(sample));
+    }
+    void call(void* session, short const* in, unsigned inSize, short* out, unsigned outSize) {
+        switch (below(3)) {
             case 0:
-                answer(Morva_NC_CleanAmbientNoiseInt16(session, source, in, output.data(), out),
-                       {0, 1, 2, -3});
-                break;
+                return answer(Morva_NC_CleanAmbientNoiseInt16(session, in, inSize, out, outSize),
+                              {0, 1, 2, -3});
             case 1:
-                value(Morva_VAD_FrameInt16(session, source, in));
-                break;
+                return finite(Morva_VAD_FrameInt16(session, in, inSize));
             default:
-                value(Morva_NoiseDB_FrameInt16(session, source, in));
-                break;
+                return finite(Morva_NoiseDB_FrameInt16(session, in, inSize));
         }
     }
-    void frameFloat(void* session, unsigned in, unsigned out) {
-        std::vector<float> input(in, choices_.ConsumeFloatingPoint<float>());
-        std::vector<float> output(out);
-        auto const* const source = input.empty() ? nullptr : input.data();
-        switch (choices_.ConsumeIntegralInRange(0, 3)) {
+    void call(void* session, float const* in, unsigned inSize, float* out, unsigned outSize) {
+        auto const unit = [](float result) {
+            bool const inUnit = result >= 0.0F && result <= 1.0F;
+            fuzz::require(inUnit || result == -3.0F || result == -4.0F, "0..1 or a code");
+        };
+        float level = 0.0F;
+        switch (below(4)) {
             case 0:
-                answer(Morva_NC_CleanAmbientNoiseFloat(session, source, in, output.data(), out),
-                       {0, 1, 2, -3});
-                for (float const sample : output) value(sample);
-                break;
+                return answer(Morva_NC_CleanAmbientNoiseFloat(session, in, inSize, out, outSize),
+                              {0, 1, 2, -3});
             case 1:
-                unitValue(Morva_VAD_FrameFloat(session, source, in));
-                break;
+                return unit(Morva_VAD_FrameFloat(session, in, inSize));
             case 2:
-                unitValue(Morva_NoiseDB_FrameFloat(session, source, in));
-                break;
-            default: {
-                float level = 0.0F;
-                answer(MorvaExt_NoiseDB_FrameFloat(session, source, in, &level), {0, 1, 2, -3});
-                value(level);
-            }
+                return unit(Morva_NoiseDB_FrameFloat(session, in, inSize));
+            default:
+                answer(MorvaExt_NoiseDB_FrameFloat(session, in, inSize, &level), {0, 1, 2, -3});
+                finite(level);
         }
-    }
-    void value(float result) { fuzz::require(std::isfinite(result), "values are finite"); }
-    void unitValue(float result) {
-        bool const unit = result >= 0.0F && result <= 1.0F;
-        fuzz::require(unit || result == -3.0F || result == -4.0F,
-                      "a float value is 0..1 or a code");
     }
 
     FuzzedDataProvider& choices_;

@@ -3,15 +3,16 @@
 #pragma once
 
 #include <cmath>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <random>
 #include <string>
-#include <utility>
 #include <vector>
 
 #include "morva-sdk/morva-ext.h"
 #include "morva-sdk/morva-sdk.h"
+#include "support/weight_writer.h"
 
 namespace fuzz {
 
@@ -19,6 +20,17 @@ inline void require(bool holds, char const* what) {
     if (holds) return;
     std::fprintf(stderr, "broken: %s\n", what);
     std::abort();
+}
+
+// A model whose frames cost little.
+inline test_support::NcShape smallShape(std::string version = "0.0.6") {
+    return {.version = std::move(version),
+            .sampleRate = 8000,
+            .frameLength = 160,
+            .filtrEnd = 64,
+            .previewFrames = 2,
+            .hidden = 4,
+            .gates = 4};
 }
 
 class Engine {
@@ -30,7 +42,7 @@ public:
     Engine(Engine const&) = delete;
     Engine& operator=(Engine const&) = delete;
 
-    int setModel(std::string const& weight, char const* name) const {
+    static int setModel(std::string const& weight, char const* name) {
         return Morva_SDK_SetModel_Blob(weight.data(), static_cast<unsigned>(weight.size()), name);
     }
 };
@@ -43,10 +55,8 @@ public:
                                          static_cast<MorvaSamplingRate>(outputRate),
                                          static_cast<MorvaFrameDuration>(durationMs), model)) {
         if (handle_ == nullptr) return;
-        unsigned in = 0;
         unsigned out = 0;
-        require(MorvaExt_SessionFrameSizes(handle_, &in, &out) == 0, "a session has frame sizes");
-        inputSize_ = in;
+        require(MorvaExt_SessionFrameSizes(handle_, &inputSize_, &out) == 0, "frame sizes");
         output_.resize(out);
     }
     ~NcSession() {
@@ -56,13 +66,13 @@ public:
     NcSession& operator=(NcSession const&) = delete;
 
     explicit operator bool() const { return handle_ != nullptr; }
-    std::size_t inputSize() const { return inputSize_; }
+    unsigned inputSize() const { return inputSize_; }
 
     // Cleans one frame and checks that every sample is a legal one.
     std::vector<float> const& clean(std::vector<float> const& frame) {
-        int const result = Morva_NC_CleanAmbientNoiseFloat(
-            handle_, frame.data(), static_cast<unsigned>(frame.size()), output_.data(),
-            static_cast<unsigned>(output_.size()));
+        int const result =
+            Morva_NC_CleanAmbientNoiseFloat(handle_, frame.data(), inputSize_, output_.data(),
+                                            static_cast<unsigned>(output_.size()));
         require(result == 0, "a frame of the right size is cleaned");
         for (float const sample : output_) {
             require(sample >= -1.0F && sample < 1.0F, "output samples are finite and in range");
@@ -72,32 +82,27 @@ public:
 
 private:
     void* handle_;
-    std::size_t inputSize_ = 0;
+    unsigned inputSize_ = 0;
     std::vector<float> output_;
 };
 
-// Noise with a slow swell, -1..1: always the same, and made only once.
-class TestSignal {
-public:
-    std::vector<float> frame(std::size_t size) {
-        static std::vector<float> const sound = make();
-        std::vector<float> samples(size);
-        for (auto& sample : samples) sample = sound[time_++ % sound.size()];
-        return samples;
+// Noise with a slow swell, -1..1, always the same: frame `index` of that size.
+inline std::vector<float> signalFrame(std::size_t size, std::size_t index) {
+    static auto const noise = test_support::RandomValues(1).vector(10007, -1.0F, 1.0F);
+    std::vector<float> frame(size);
+    for (std::size_t i = 0; i < size; ++i) {
+        std::size_t const at = index * size + i;
+        frame[i] = 0.6F * std::sin(static_cast<float>(at % 20000) * 0.001F) * noise[at % 10007];
     }
+    return frame;
+}
 
-private:
-    static std::vector<float> make() {
-        std::mt19937 engine(1);
-        std::uniform_real_distribution<float> noise(-1.0F, 1.0F);
-        std::vector<float> sound(200'000);
-        for (std::size_t i = 0; i < sound.size(); ++i) {
-            sound[i] = 0.6F * std::sin(static_cast<float>(i) * 0.001F) * noise(engine);
-        }
-        return sound;
+// Runs a model for ten frames, if it can be opened at all.
+inline void run(int inputRate, int outputRate, int durationMs, char const* model) {
+    NcSession session(inputRate, outputRate, durationMs, model);
+    for (std::size_t i = 0; session && i < 10; ++i) {
+        session.clean(signalFrame(session.inputSize(), i));
     }
-
-    std::size_t time_ = 0;
-};
+}
 
 }  // namespace fuzz

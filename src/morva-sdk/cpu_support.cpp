@@ -1,17 +1,45 @@
 #include "morva-sdk/cpu_support.h"
 
+#include <cpuid.h>
+
 #include <cstring>
 
 namespace MORVA::MORVA_SDK {
+namespace {
+
+// Where the processor says that it has a feature, by the manufacturers' numbering.
+enum Register { eax, ebx, ecx, edx };
+struct Feature {
+    char const* name;
+    unsigned leaf;
+    Register where;
+    unsigned bit;
+};
+// What -march=x86-64-v3 lets a compiler use, beyond the baseline. The two that hosts ask for come
+// first.
+constexpr Feature kNeeded[] = {
+    {"SSE 4.1", 1, ecx, 19}, {"AVX2", 7, ebx, 5},           {"AVX", 1, ecx, 28},
+    {"FMA", 1, ecx, 12},     {"BMI2", 7, ebx, 8},           {"BMI1", 7, ebx, 3},
+    {"F16C", 1, ecx, 29},    {"LZCNT", 0x80000001, ecx, 5}, {"MOVBE", 1, ecx, 22},
+    {"POPCNT", 1, ecx, 23},  {"SSE 4.2", 1, ecx, 20},       {"SSSE3", 1, ecx, 9},
+    {"SSE3", 1, ecx, 0},     {"CMPXCHG16B", 1, ecx, 13},    {"LAHF", 0x80000001, ecx, 0}};
+
+bool has(Feature const& feature) {
+    unsigned registers[4] = {};
+    return __get_cpuid_count(feature.leaf, 0, &registers[eax], &registers[ebx], &registers[ecx],
+                             &registers[edx]) != 0 &&
+           (registers[feature.where] >> feature.bit & 1U) != 0;
+}
+
+}  // namespace
 
 char const* missingProcessorFeature() {
+    for (Feature const& feature : kNeeded) {
+        if (!has(feature)) return feature.name;
+    }
+    // Present and yet unusable: the operating system must keep the wide registers.
     __builtin_cpu_init();
-    // The builtin takes literals only, hence no table.
-    if (!__builtin_cpu_supports("sse4.1")) return "SSE 4.1";
-    if (!__builtin_cpu_supports("avx2")) return "AVX2";
-    if (!__builtin_cpu_supports("fma")) return "FMA";
-    if (!__builtin_cpu_supports("bmi2")) return "BMI2";
-    return nullptr;
+    return __builtin_cpu_supports("avx2") ? nullptr : "AVX2";
 }
 
 char const* processorFeatures() {

@@ -1,5 +1,6 @@
-// Turns whatever a body throws into a line on standard error and a result: the one way by which
-// failures leave the C interface. [any thread]
+// The one way through the C interface: whatever a body throws becomes a line on standard error and
+// a result, and whatever floating-point mode the caller is in, the body runs in the engine's.
+// [any thread]
 #pragma once
 
 #include <exception>
@@ -8,6 +9,7 @@
 
 #include "morva-sdk/last_error.h"
 #include "utils/exception.h"
+#include "utils/float_control.h"
 
 namespace MORVA::MORVA_SDK {
 
@@ -33,6 +35,7 @@ inline void printError(char const* text) noexcept {
 
 template <class Result, class Body>
 Result funnel(FailureCodes<Result> const& codes, Body&& body) noexcept {
+    UTILS::ScopedFloatControl const mode(UTILS::Denormals::kept);
     try {
         return body();
     } catch (UTILS::MORVA_Exception const& failure) {

@@ -7,6 +7,8 @@
  *   2. Morva_SDK_SetModel / Morva_SDK_SetModel_Blob for each model;
  *   3. create a session per audio stream, push frames through it, close it;
  *   4. Morva_SDK_GlobalDestroy, which also frees every session that is still open.
+ *   A process may end without the last step, in the middle of a frame call too: its exit destroys
+ *   nothing of the engine.
  *
  * Threads
  *   [control thread]  takes the engine's lock, allocates, prints; never call it from an audio
@@ -15,6 +17,8 @@
  *   a time per session; different sessions may run on different threads at the same time.
  *   Do not close a session while a frame call on it runs, nor destroy the engine while any call
  *   runs.
+ *   The caller's floating-point control word is set aside for the length of every call: rounding
+ *   modes and traps of the thread change no result.
  *
  * Processor
  *   The engine needs an x86-64 processor with AVX2, FMA and BMI2; on any other Morva_SDK_GlobalInit
@@ -33,8 +37,8 @@
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
  *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and
  *   are limited to that range (float output lies in -1..0.999969482421875). A sample that is no
- *   sound (a NaN, an infinity, a magnitude above 1e6) counts as 0, so that a bad frame is like a
- *   frame of silence: nothing of it stays in the session. Input and output may be the same buffer.
+ *   sound (a NaN, an infinity) counts as 0, so that a bad frame is like a frame of silence: nothing
+ *   of it stays in the session. Input and output may be the same buffer.
  */
 #ifndef MORVA_SDK_H
 #define MORVA_SDK_H
@@ -106,8 +110,7 @@ MORVA_API int Morva_VAD_CloseSession(void* session);
 MORVA_API int Morva_NoiseDB_CloseSession(void* session);
 
 /* [the session's thread, between frames] Brings a noise-level session back to its start: the same
- * input then gives bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle.
- * Rebuilds the energy statistics, so it does allocate. */
+ * input then gives bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle. */
 MORVA_API int Morva_NoiseDB_ResetSession(void* session);
 
 /* [audio thread] Clean one frame. `inputSize` is the frame size at the input rate, `outputSize` at
@@ -131,7 +134,7 @@ MORVA_API float Morva_VAD_FrameFloat(void* session, float const* input, unsigned
  * above (a level equal to one of those codes cannot be told from it). The Float call answers only
  * levels within 0..1 dB; every other level is refused like a wrong handle: "THE CLEANING ERROR
  * OUTPUT result <level>" and the wrong-session line are printed and -4.0 returned, while the
- * session goes on as usual. Use the Int16 call for levels. */
+ * session goes on as usual. MorvaExt_NoiseDB_FrameFloat (morva-ext.h) gives every level. */
 MORVA_API float Morva_NoiseDB_FrameInt16(void* session, short const* input, unsigned int inputSize);
 MORVA_API float Morva_NoiseDB_FrameFloat(void* session, float const* input, unsigned int inputSize);
 

@@ -7,7 +7,7 @@
 #include "morva-sdk/error_funnel.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "utils/exception.h"
-#include "utils/flush_to_zero.h"
+#include "utils/float_control.h"
 #include "utils/pcm.h"
 
 namespace MORVA::MORVA_SDK {
@@ -51,14 +51,13 @@ void printSizeError(char const* error, std::size_t inputSize, std::string const&
 }  // namespace
 
 MorvaSessionT::Path MorvaSessionT::openPath(char const* modelName) const {
-    bool const isSound = type_ == MorvaSessionType::NoiseCancellation;
     // A missing model is what the caller hears about first, even when the duration is wrong as
     // well.
     auto const checkDuration = [this] {
         if (isFrameDuration(duration_)) return;
         UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
     };
-    if (isSound) {
+    if (type_ == MorvaSessionType::NoiseCancellation) {
         auto model = NOISE_CANCELLER::createNoiseModel(inputRate_, duration_, modelName);
         checkDuration();
         return Path(std::in_place_type<SoundPath>, std::move(model), inputFrameSize_,
@@ -96,7 +95,7 @@ bool MorvaSessionT::cleanSamples(std::span<Sample const> input, std::span<Sample
         printSizeError(Format::sizeError, inputFrameSize_, std::to_string(outputFrameSize_));
         return false;
     }
-    UTILS::ScopedFlushToZero const fast;
+    UTILS::ScopedFloatControl const mode(UTILS::Denormals::asZero);
     frame_.resize(input.size());
     Format::read(input, frame_);
     sound().clean(frame_);
@@ -120,7 +119,7 @@ std::optional<float> MorvaSessionT::valueOf(std::span<Sample const> input) {
         printSizeError(Format::sizeError, inputFrameSize_, "");
         return std::nullopt;
     }
-    UTILS::ScopedFlushToZero const fast;
+    UTILS::ScopedFloatControl const mode(UTILS::Denormals::asZero);
     frame_.resize(input.size());
     Format::read(input, frame_);
     std::get<ModelStage>(path_).run(frame_);

@@ -7,7 +7,7 @@
 
 namespace MORVA::NOISE_CANCELLER {
 
-// Read before the network, so that a weight without anything is missed by its first value.
+// Read before the network.
 struct FeatureStatistics {
     // Throws MORVA_Exception for a missing value.
     explicit FeatureStatistics(WEIGHTS::Weight const& weight)

@@ -15,8 +15,7 @@ public:
     // thread]
     virtual float noiseLevelDb() const = 0;
 
-    // False when the model has no background-speaker stage. Says on standard output what was set.
-    // [any thread]
+    // False when the model has no background-speaker stage. [any thread]
     virtual bool switchBackgroundSpeaker(bool) { return false; }
 };
 

@@ -24,7 +24,7 @@ public:
     struct Params : FeatureStatistics, NetworkWeights, SpectralParams {
         Params(SpectralParams::Environment& environment, std::size_t frameMs,
                Generation const& generation)
-            : FeatureStatistics(*environment.first),
+            : FeatureStatistics(inOrder(*environment.first, generation)),
               NetworkWeights(*environment.first),
               SpectralParams(environment, frameMs, generation) {
             if (mu.empty() || sd.empty()) refuseWeight("MU or SD is empty");
@@ -36,6 +36,14 @@ public:
                                     {layers, layers - 1});
         }
         std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }
+
+    private:
+        // What a weight lacks is named in the order in which a generation reads.
+        static WEIGHTS::Weight const& inOrder(WEIGHTS::Weight const& weight,
+                                              Generation const& generation) {
+            if (generation.structureFirst) Structure const missed(weight);
+            return weight;
+        }
     };
 
     MaskModel(Params const& params, CONTAINERS::AnyMap& environment, Generation const& generation,

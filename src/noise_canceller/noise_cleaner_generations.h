@@ -19,12 +19,12 @@
 namespace MORVA::NOISE_CANCELLER {
 
 inline constexpr Generation kGenerations[] = {
-    {"_v0_0_1", WindowPair::HammingTriangular, LevelReference::RunningNoiseMean, false},
-    {"_v0_0_2", WindowPair::Vorbis, LevelReference::RunningNoiseMean, false},
-    {"_v0_0_3", WindowPair::Vorbis, LevelReference::MeanEnergy, false},
-    {"_v0_0_4", WindowPair::Vorbis, LevelReference::MeanEnergy, true},
-    {"_v0_0_5", WindowPair::Vorbis, LevelReference::MeanEnergy, true},
-    {"_v0_0_6", WindowPair::Vorbis, LevelReference::MeanEnergy, true},
+    {"_v0_0_1", WindowPair::HammingTriangular, LevelReference::RunningNoiseMean, false, false},
+    {"_v0_0_2", WindowPair::Vorbis, LevelReference::RunningNoiseMean, false, false},
+    {"_v0_0_3", WindowPair::Vorbis, LevelReference::MeanEnergy, false, false},
+    {"_v0_0_4", WindowPair::Vorbis, LevelReference::MeanEnergy, true, false},
+    {"_v0_0_5", WindowPair::Vorbis, LevelReference::MeanEnergy, true, false},
+    {"_v0_0_6", WindowPair::Vorbis, LevelReference::MeanEnergy, true, true},
 };
 constexpr Generation const& generation(int number) {
     return kGenerations[number - 1];

@@ -39,7 +39,10 @@ public:
 
     void setMaskFloor(float floor) override { model_.setMaskFloor(floor); }
     float noiseLevelDb() const override { return model_.noiseLevelDb(); }
-    bool switchBackgroundSpeaker(bool on) override { return background_speaker_fix_switch(on); }
+    bool switchBackgroundSpeaker(bool on) override {
+        backgroundSpeakerOn_ = on;
+        return true;
+    }
 
 private:
     void suppressBackgroundSpeaker(std::vector<float>& frame);

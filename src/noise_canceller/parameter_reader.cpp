@@ -1,16 +1,29 @@
 #include "noise_canceller/parameter_reader.h"
 
+#include <locale.h>
+#include <stdlib.h>
+
 #include <algorithm>
-#include <cstdlib>
 #include <iostream>
 #include <limits>
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {
 
-// atoi without its undefined behaviour on overflow.
+// The host's locale, with its decimal comma, has no say.
+locale_t plainLocale() {
+    static locale_t const plain = newlocale(LC_ALL_MASK, "C", nullptr);
+    return plain;
+}
+
+// atof in that locale.
+float toReal(std::string const& text) {
+    return static_cast<float>(strtod_l(text.c_str(), nullptr, plainLocale()));
+}
+
+// atoi, without its undefined behaviour on overflow.
 int toInteger(std::string const& text) {
-    long const value = std::strtol(text.c_str(), nullptr, 10);
+    long const value = strtol_l(text.c_str(), nullptr, 10, plainLocale());
     return static_cast<int>(
         std::clamp<long>(value, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
 }
@@ -35,7 +48,7 @@ std::shared_ptr<T> ParameterReader::stored(std::string const& key) const {
 
 float ParameterReader::real(char const* name, float byDefault) const {
     auto const k = key(name);
-    if (auto const value = text(k)) return static_cast<float>(std::atof(value->c_str()));
+    if (auto const value = text(k)) return toReal(*value);
     if (auto const value = stored<float>(k)) return *value;
     return byDefault;
 }

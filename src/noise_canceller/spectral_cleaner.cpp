@@ -55,27 +55,29 @@ SpectralCleaner::SpectralCleaner(SpectralParams const& params, FeatureStatistics
                                          *sharedTriangularWindow(environment, params.frameLength));
     }
     features_.reserve(params.bands.bins());
-    reset();
+    buildStatistics();
 }
 
 void SpectralCleaner::reset() {
     context_.reset();
     shaper_.reset();
+    if (gate_) gate_->reset();
+    if (meanEnergy_) meanEnergy_->reset();
+    if (noiseMean_) noiseMean_->fillWithSilence();
+}
+
+void SpectralCleaner::buildStatistics() {
     if (params_.enableThreshCut) {
         gate_.emplace(kStatisticsFrames, params_.sampleRate * kGateSeconds / params_.frameLength,
                       params_.threshCutRefEn);
     }
-    buildLevelReference();
-}
-
-void SpectralCleaner::buildLevelReference() {
     if (params_.enableRescale) {
         meanEnergy_.emplace(kStatisticsFrames, params_.sampleRate * kLevelSeconds / params_.step,
                             params_.rescaleRefEn, params_.rescaleRefAmpl * params_.rescaleRefAmpl);
     }
     if (level_ == LevelReference::RunningNoiseMean) {
         noiseMean_.emplace(kStatisticsFrames, params_.bands.bands());
-        for (std::size_t i = 0; i < kStatisticsFrames; ++i) noiseMean_->addNullFrameNoise();
+        noiseMean_->fillWithSilence();
     }
 }
 

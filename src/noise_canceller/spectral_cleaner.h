@@ -38,7 +38,7 @@ public:
                     CONTAINERS::AnyMap& environment, Generation const& generation,
                     Synthesis synthesis);
 
-    // Back to the state after construction.
+    // Back to the state after construction; allocates nothing.
     void reset();
 
     // `in` holds FrameLength samples; `x` receives the network's input.
@@ -54,7 +54,7 @@ public:
     std::vector<float> const& synthesisWindow() const { return *synthesis_; }
 
 private:
-    void buildLevelReference();
+    void buildStatistics();
     void synthesise(std::vector<float> const& mask, float floor);
     float levelGain(float const* in);
 

@@ -22,14 +22,7 @@ std::size_t positive(WEIGHTS::Weight const& weight, char const* name) {
 
 }  // namespace
 
-SpectralParams::SpectralParams(Environment& environment, std::size_t frameMs,
-                               Generation const& generation)
-    : sessionFrameMs(frameMs), bands(0, 0) {
-    readStructure(*environment.first);
-    readTunables(ParameterReader(environment, generation.suffix), generation);
-}
-
-void SpectralParams::readStructure(WEIGHTS::Weight const& weight) {
+Structure::Structure(WEIGHTS::Weight const& weight) {
     sampleRate = positive(weight, "SampleRate");
     step = positive(weight, "Step");
     int const begin = weight.getReference<int>("FiltrBegin");
@@ -61,6 +54,12 @@ void SpectralParams::readStructure(WEIGHTS::Weight const& weight) {
     }
     filtrBegin = static_cast<std::size_t>(begin);
     filtrEnd = static_cast<std::size_t>(end);
+}
+
+SpectralParams::SpectralParams(Environment& environment, std::size_t frameMs,
+                               Generation const& generation)
+    : Structure(*environment.first), sessionFrameMs(frameMs), bands(0, 0) {
+    readTunables(ParameterReader(environment, generation.suffix), generation);
 }
 
 void SpectralParams::readTunables(ParameterReader const& reader, Generation const& generation) {

@@ -27,13 +27,13 @@ struct Generation {
     WindowPair windows;
     LevelReference level;
     bool compressesBands;
+    bool structureFirst;  // read before means, deviations and network
 };
 
-struct SpectralParams {
-    using Environment = CONTAINERS::ModelEnvironment::element_type;
-
+// The lengths of a model, checked against each other.
+struct Structure {
     // Throws MORVA_Exception for missing values and for a structure that the pipeline cannot run.
-    SpectralParams(Environment& environment, std::size_t frameMs, Generation const& generation);
+    explicit Structure(WEIGHTS::Weight const& weight);
 
     std::size_t sampleRate;  // Hz
     std::size_t step;        // hop, samples
@@ -43,6 +43,14 @@ struct SpectralParams {
     std::size_t previewFrames;      // P, frames of context
     std::size_t coefficientNumber;  // bins of the full mask
     std::size_t modelFrameMs;
+};
+
+struct SpectralParams : Structure {
+    using Environment = CONTAINERS::ModelEnvironment::element_type;
+
+    // Throws MORVA_Exception for missing values and for a structure that the pipeline cannot run.
+    SpectralParams(Environment& environment, std::size_t frameMs, Generation const& generation);
+
     std::size_t sessionFrameMs;
 
     float smootCoef;
@@ -71,7 +79,6 @@ struct SpectralParams {
     }
 
 private:
-    void readStructure(WEIGHTS::Weight const& weight);
     void readTunables(ParameterReader const& reader, Generation const& generation);
 };
 

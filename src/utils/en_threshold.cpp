@@ -27,6 +27,14 @@ EnThreshold::EnThreshold(std::size_t K, std::size_t M, float activityThreshold)
       frameEnergies(K, 0.0),
       activeEnergies(M, 0.0) {}
 
+void EnThreshold::reset() {
+    std::ranges::fill(frameEnergies, 0.0);
+    std::ranges::fill(activeEnergies, 0.0);
+    frameEnergySum = activeEnergySum = 0.0;
+    activeCount = 0;
+    gain = 1.0f;
+}
+
 float EnThreshold::setCurrentData(std::vector<float> const& frame) {
     double const energy = meanEnergy(frame);
     double const share = energy / static_cast<double>(windowFrames);

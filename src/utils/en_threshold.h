@@ -23,6 +23,9 @@ public:
     // Scales a vector by the latest gain; always true.
     bool applyEnThreshold(std::vector<float>& frame);
 
+    // Back to the state after construction; allocates nothing.
+    void reset();
+
 private:
     float gate() const;
 

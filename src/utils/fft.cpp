@@ -3,6 +3,7 @@
 #include <mkl_dfti.h>
 #include <mkl_service.h>
 
+#include "utils/math_setup.h"
 #include "utils/non_copyable.h"
 
 namespace MORVA::UTILS {
@@ -55,6 +56,7 @@ private:
 }  // namespace
 
 std::shared_ptr<FFT> FFT::create(std::size_t n) {
+    configureMathLibrary(0);  // for those who did not come through the engine
     return std::make_unique<FFT_MKL>(n);
 }
 

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 #include <map>
+#include <memory>
 #include <mutex>
 #include <numbers>
 #include <numeric>
@@ -19,7 +20,7 @@ constexpr std::int64_t wing = gridPoints * crossings;
 constexpr double cutoff = 0.9;
 constexpr double kaiserBeta = 6.0;
 constexpr std::size_t vectorLanes = 8;
-constexpr std::size_t maxCoefficients = std::size_t{1} << 22;
+constexpr std::size_t maxCoefficients = std::size_t{1} << 22;  // 16 MiB
 
 // The zeroth modified Bessel function, by its power series.
 double besselI0(double x) {
@@ -48,9 +49,15 @@ std::vector<float> makeKernel() {
     return kernel;
 }
 
+// Threads may still open sessions while the process exits, so nothing here is destroyed then.
+template <class T>
+T& keepForEver(T value) {
+    return *std::make_unique<T>(std::move(value)).release();
+}
+
 // The grid point of a tap; the right wing ends one point earlier than the left one.
 float coefficient(std::int64_t point, bool right) {
-    static std::vector<float> const kernel = makeKernel();
+    static auto const& kernel = keepForEver(makeKernel());
     std::int64_t const end = right ? wing - 1 : wing;
     return point < end ? kernel[static_cast<std::size_t>(std::max<std::int64_t>(point, 0))] : 0.0f;
 }
@@ -64,11 +71,10 @@ std::size_t roundUp(std::size_t n) {
 std::shared_ptr<InterpolationFilter const> InterpolationFilter::forRates(std::uint64_t inRate,
                                                                          std::uint64_t outRate) {
     static std::mutex lock;
-    static std::map<std::pair<std::uint64_t, std::uint64_t>,
-                    std::weak_ptr<InterpolationFilter const>>
-        known;
+    using Steps = std::pair<std::uint64_t, std::uint64_t>;
+    static auto& known = keepForEver(std::map<Steps, std::weak_ptr<InterpolationFilter const>>());
     std::uint64_t const divisor = std::gcd(inRate, outRate);
-    std::pair const steps(inRate / divisor, outRate / divisor);
+    Steps const steps(inRate / divisor, outRate / divisor);
     std::lock_guard const guard(lock);
     if (auto shared = known[steps].lock()) return shared;
     auto made = std::make_shared<InterpolationFilter const>(steps.first, steps.second);
@@ -82,7 +88,7 @@ InterpolationFilter::InterpolationFilter(std::uint64_t inStep, std::uint64_t out
       scale_(std::min(1.0, static_cast<double>(outStep) / static_cast<double>(inStep))),
       reach_(static_cast<std::ptrdiff_t>(crossings / scale_)),
       taps_(roundUp(2 * static_cast<std::size_t>(reach_) + 2)) {
-    if (outStep > maxCoefficients / taps_) {
+    if (outStep > maxCoefficients / (kRowsPerPhase * taps_)) {
         raise("The resampler's filter for these rates would be too large",
               "src/utils/interpolation_filter", "InterpolationFilter");
     }

@@ -48,9 +48,10 @@ public:
 
 private:
     using Row = std::vector<float>;
+    static constexpr std::size_t kRowsPerPhase = 3;  // one by drift, some of them the same
     struct Phase {
         double fraction;
-        std::array<std::uint32_t, 3> rows;  // offsets, by drift
+        std::array<std::uint32_t, kRowsPerPhase> rows;  // offsets
     };
 
     Row exactRow(std::uint64_t phase) const;

@@ -1,5 +1,8 @@
 #include "utils/mean_energy.h"
 
+#include <algorithm>
+#include <iterator>
+
 #include "utils/energy_history.h"
 #include "utils/exception.h"
 
@@ -19,10 +22,20 @@ MeanEnergy::MeanEnergy(std::size_t K, std::size_t M, float activityThreshold, fl
     : windowFrames(checked(K)),
       activeFrames(checked(M)),
       threshold(activityThreshold),
+      firstEnergy(initialEnergy),
       frameEnergies(K, 0.0),
       activeEnergies(1, initialEnergy),
       activeEnergySum(initialEnergy),
       spareNodes(M - 1, 0.0) {}
+
+void MeanEnergy::reset() {
+    std::ranges::fill(frameEnergies, 0.0);
+    frameEnergySum = 0.0;
+    spareNodes.splice(spareNodes.end(), activeEnergies, std::next(activeEnergies.begin()),
+                      activeEnergies.end());
+    activeEnergies.front() = activeEnergySum = firstEnergy;
+    activeCount = 1;
+}
 
 float MeanEnergy::setCurrentData(float const* frame, std::size_t n) {
     double const energy = meanEnergy({frame, n});

@@ -19,12 +19,16 @@ public:
     // Takes one frame and returns the mean active energy.
     float setCurrentData(float const* frame, std::size_t n);
 
+    // Back to the state after construction; allocates nothing.
+    void reset();
+
 private:
     void addActive(double energy);
 
     std::size_t windowFrames;
     std::size_t activeFrames;
     double threshold;
+    double firstEnergy;
     std::list<double> frameEnergies;   // energy / K of the last K frames, oldest first
     std::list<double> activeEnergies;  // energy of the last active frames, at most M
     double frameEnergySum = 0.0;

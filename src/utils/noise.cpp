@@ -12,6 +12,12 @@ Noise::Noise(std::size_t K, std::size_t valuesPerFrame)
     if (K == 0) raise("The noise mean needs at least one frame", "src/utils/noise", "Noise");
 }
 
+void Noise::fillWithSilence() {
+    while (frames.size() < windowFrames) addNullFrameNoise();
+    for (auto& frame : frames) std::ranges::fill(frame, 0.0f);
+    std::ranges::fill(mean, 0.0f);
+}
+
 Noise::Iterator Noise::addFrameNoise(float const* frame, std::size_t n) {
     return frames.emplace(frames.begin(), frame, frame + n);
 }

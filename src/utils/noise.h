@@ -1,6 +1,6 @@
 // Running mean of the last K feature frames in one pass per frame, whatever K.
 //
-// Use: K times addNullFrameNoise(); then per frame addFrameNoiseRemoveBack(f) and exactly one
+// Use: fillWithSilence(), or K times addNullFrameNoise(); then per frame addFrameNoiseRemoveBack(f) and exactly one
 // calculateNoise(). Frames are stored divided by K once folded in, so that removing one is a
 // subtraction. One thread at a time; a step of fixed frame length allocates nothing.
 #pragma once
@@ -17,6 +17,9 @@ public:
 
     // K frames of frameSize values; the history starts empty. Throws MORVA_Exception for K == 0.
     Noise(std::size_t K, std::size_t frameSize);
+
+    // K frames of silence; after the first time it allocates nothing.
+    void fillWithSilence();
 
     // Puts a copy of the frame at the front; the mean stays as it is.
     Iterator addFrameNoise(float const* frame, std::size_t n);

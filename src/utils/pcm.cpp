@@ -1,8 +1,8 @@
 #include "utils/pcm.h"
 
-#include <algorithm>
-#include <cstddef>
+#include <cmath>
 #include <cstdint>
+#include <limits>
 
 namespace MORVA::UTILS {
 namespace {
@@ -10,7 +10,7 @@ namespace {
 constexpr float fullScale = 32768.0f;
 constexpr float pcmMin = -32768.0f;
 constexpr float pcmMax = 32767.0f;
-constexpr float inputLimit = fullScale * 1e6f;
+constexpr float unitLimit = 1e6f;
 
 // Written with selections only, so that the loops below become vector code.
 constexpr float limited(float x, float low, float high) {
@@ -27,8 +27,8 @@ void pcm16ToFloat(std::span<short const> in, std::span<float> out) {
 
 void unitToPcm16Scale(std::span<float const> in, std::span<float> out) {
     for (std::size_t i = 0; i < in.size(); ++i) {
-        float const sample = in[i] * fullScale;
-        out[i] = sample >= -inputLimit && sample <= inputLimit ? sample : 0.0f;
+        bool const finite = std::abs(in[i]) <= std::numeric_limits<float>::max();
+        out[i] = finite ? limited(in[i], -unitLimit, unitLimit) * fullScale : 0.0f;
     }
 }
 

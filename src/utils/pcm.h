@@ -10,9 +10,9 @@ namespace MORVA::UTILS {
 // Each sample keeps its integer value.
 void pcm16ToFloat(std::span<short const> in, std::span<float> out);
 
-// -1 .. 1 to the 16-bit scale (x 32768). What no converter delivers, a NaN or a magnitude beyond
-// 1e6 full scales, becomes 0: one bad frame leaves neither endless numbers in a filter's memory nor
-// a loud sound in a level's.
+// -1 .. 1 to the 16-bit scale (x 32768). What is no sound, a NaN or an infinity, becomes 0, so that
+// a filter's memory never holds it; a finite sample beyond 1e6 full scales becomes that, since a
+// sum of larger ones could overflow.
 void unitToPcm16Scale(std::span<float const> in, std::span<float> out);
 
 // Limits to -32768 .. 32767; NaN becomes 0.

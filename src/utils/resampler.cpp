@@ -7,31 +7,30 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr double largestRatio = 256.0;
+constexpr unsigned long largestRatio = 256;
 constexpr std::size_t usualBlock =
     3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
 
 }  // namespace
 
 Resampler::Resampler(unsigned long inRate, unsigned long outRate)
-    : inRate_(inRate),
-      outRate_(outRate),
-      factor_(static_cast<double>(outRate) / static_cast<double>(inRate)) {
-    // Also catches a rate of 0, which makes the factor 0, infinite or NaN.
-    if (!(factor_ >= 1.0 / largestRatio && factor_ <= largestRatio)) {
+    : inRate_(inRate), outRate_(outRate) {
+    bool const near =
+        (inRate - 1) / largestRatio < outRate && (outRate - 1) / largestRatio < inRate;
+    if (inRate == 0 || outRate == 0 || !near) {
         raise("The resampler cannot convert between these rates", "src/utils/resampler",
               "Resampler");
     }
     converter_ = makeStreamConverter(inRate, outRate);
-    if (factor_ != 1.0) buffer_.reserve(static_cast<std::size_t>(extraRoom_) + usualBlock);
+    if (!isIdentity()) buffer_.reserve(static_cast<std::size_t>(extraRoom_) + usualBlock);
 }
 
 unsigned Resampler::resample(std::vector<float> const& in, std::vector<float>& out) {
-    if (factor_ == 1.0) {
+    if (isIdentity()) {
         if (&in != &out) out = in;
         return static_cast<unsigned>(in.size());
     }
-    int const expected = static_cast<int>(factor_ * static_cast<double>(in.size()));
+    int const expected = static_cast<int>(in.size() * outRate_ / inRate_);
     buffer_.resize(static_cast<std::size_t>(extraRoom_) + static_cast<std::size_t>(expected));
     int const room = extraRoom_ + expected - heldOver_;
     int const produced =
@@ -58,7 +57,7 @@ bool Resampler::reset() {
 }
 
 std::size_t Resampler::leadingZeros(std::size_t blockLength) const {
-    if (factor_ == 1.0) return 0;
+    if (isIdentity()) return 0;
     Resampler fresh(inRate_, outRate_);
     std::vector<float> const silence(blockLength);
     std::vector<float> out;

@@ -20,9 +20,9 @@ public:
     // cannot be built.
     Resampler(unsigned long inRate, unsigned long outRate);
 
-    // Converts one block: `out` gets exactly ratio() * in.size() samples, truncated. Returns how
-    // many samples the filter delivered in this call (in.size() at equal rates, where `out` is a
-    // copy). `in` and `out` may be the same vector.
+    // Converts one block: `out` gets exactly in.size() * outRate / inRate samples, truncated.
+    // Returns how many samples the filter delivered in this call (in.size() at equal rates, where
+    // `out` is a copy). `in` and `out` may be the same vector.
     unsigned resample(std::vector<float> const& in, std::vector<float>& out);
 
     // Plain streaming conversion without padding; returns the number of samples written.
@@ -31,20 +31,20 @@ public:
     // Back to the state of a new object; always true. Throws when the filter cannot be built.
     bool reset();
 
-    double ratio() const { return factor_; }
+    double ratio() const { return static_cast<double>(outRate_) / static_cast<double>(inRate_); }
 
     // Zeros that a first block of `blockLength` input samples starts with, in output samples: the
     // latency of this conversion. 0 at equal rates. Converts a block: not for the audio thread.
     std::size_t leadingZeros(std::size_t blockLength) const;
 
 private:
+    bool isIdentity() const { return inRate_ == outRate_; }
     int convert(float const* in, int inCount, float* out, int room);
     void startWithDelay(std::vector<float>& out, int produced);
     void continueStream(std::vector<float>& out, int produced);
 
     unsigned long inRate_;
     unsigned long outRate_;
-    double factor_;
     std::unique_ptr<StreamConverter> converter_;
     int extraRoom_ = 1024;
     int heldOver_ = 0;

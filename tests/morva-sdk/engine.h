@@ -152,33 +152,86 @@ inline std::vector<short> toPcm(std::vector<float> const& sound) {
     return pcm;
 }
 
-// Cleans a sound frame by frame; only whole frames are taken.
-template <class Sample>
-std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound) {
+// The whole frames of a sound, one after the other.
+template <class Sample, class Body>
+void forEachFrame(std::vector<Sample> const& sound, std::size_t size, Body body) {
+    for (std::size_t k = 0; (k + 1) * size <= sound.size(); ++k) {
+        auto const first = sound.begin() + static_cast<std::ptrdiff_t>(k * size);
+        body(k, std::vector<Sample>(first, first + static_cast<std::ptrdiff_t>(size)));
+    }
+}
+
+// Cleans a sound frame by frame, with `before(k)` ahead of frame k.
+template <class Sample, class Before>
+std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound, Before before) {
     unsigned inSize = 0;
     unsigned outSize = 0;
     EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &inSize, &outSize), 0);
     std::vector<Sample> all;
     std::vector<Sample> out(outSize);
-    for (std::size_t at = 0; at + inSize <= sound.size(); at += inSize) {
-        std::vector<Sample> const frame(sound.begin() + static_cast<long>(at),
-                                        sound.begin() + static_cast<long>(at + inSize));
+    forEachFrame(sound, inSize, [&](std::size_t k, std::vector<Sample> const& frame) {
+        before(k);
         EXPECT_EQ(clean(session, frame, out), 0);
         all.insert(all.end(), out.begin(), out.end());
-    }
+    });
     return all;
+}
+template <class Sample>
+std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound) {
+    return cleanAll(session, sound, [](std::size_t) {});
 }
 
 // The values of a model that answers with one per frame.
 template <class Sample, class Frame>
 std::vector<float> valuesOf(std::vector<Sample> const& sound, unsigned frameSize, Frame frame) {
     std::vector<float> values;
-    for (std::size_t at = 0; at + frameSize <= sound.size(); at += frameSize) {
-        values.push_back(
-            frame(std::vector<Sample>(sound.begin() + static_cast<long>(at),
-                                      sound.begin() + static_cast<long>(at + frameSize))));
-    }
+    forEachFrame(sound, frameSize, [&](std::size_t, auto const& f) { values.push_back(frame(f)); });
     return values;
 }
+
+// A session of any kind, 10 ms, driven through one call.
+enum class Kind { noise, voice, level };
+
+class Stream {
+public:
+    Stream(Kind kind, std::string const& model, int in, int out)
+        : kind_(kind),
+          inSize_(samples(in, 10)),
+          outSize_(kind == Kind::noise ? samples(out, 10) : 1) {
+        auto const* const name = model.c_str();
+        handle_ = kind == Kind::noise   ? openNc(in, out, 10, name)
+                  : kind == Kind::voice ? Morva_VAD_CreateSession(rate(in), duration(10), name)
+                                        : Morva_NoiseDB_CreateSession(rate(in), duration(10), name);
+        EXPECT_NE(handle_, nullptr) << model;
+    }
+    Stream(Stream const&) = delete;
+    Stream& operator=(Stream const&) = delete;
+    ~Stream() {
+        auto* const close = kind_ == Kind::noise   ? Morva_NC_CloseSession
+                            : kind_ == Kind::voice ? Morva_VAD_CloseSession
+                                                   : Morva_NoiseDB_CloseSession;
+        EXPECT_EQ(close(handle_), 0);
+    }
+
+    void* handle() const { return handle_; }
+    std::size_t inSize() const { return inSize_; }
+    std::size_t outSize() const { return outSize_; }
+
+    template <class Sample>
+    void frame(std::vector<Sample> const& in, std::vector<Sample>& out) const {
+        if (kind_ == Kind::noise) {
+            clean(handle_, in, out);
+        } else {
+            out[0] =
+                static_cast<Sample>(kind_ == Kind::voice ? vad(handle_, in) : level(handle_, in));
+        }
+    }
+
+private:
+    Kind kind_;
+    std::size_t inSize_;
+    std::size_t outSize_;
+    void* handle_ = nullptr;
+};
 
 }  // namespace sdk_test

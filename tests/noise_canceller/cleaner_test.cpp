@@ -8,6 +8,7 @@
 
 #include "models.h"
 #include "reference_cleaner.h"
+#include "support/allocation_counter.h"
 #include "support/error_bound.h"
 #include "support/random.h"
 
@@ -200,6 +201,29 @@ TEST_P(NoiseLevel, OfWhatIsRemoved) {
     }
 }
 INSTANTIATE_TEST_SUITE_P(Generation, NoiseLevel, ::testing::Values(5));
+
+// A reset happens on the session's thread, where nothing may fail half-way.
+TEST(NoiseLevelReset, IsLikeNewAndAllocatesNothing) {
+    Random random(3);
+    NcShape const shape{.version = "0.0.5"};
+    Tunables tunables;
+    tunables.threshCut = tunables.rescale = true;
+    auto const cleaner = makeCleaner(0, makeModel(random, shape, tunables).model, 10);
+    auto const sound = randomSound(random, 160 * 400, 160);
+    auto const levels = [&] {
+        std::vector<float> all;
+        for (std::size_t at = 0; at < sound.size(); at += 160) {
+            std::vector<float> frame(sound.begin() + static_cast<long>(at),
+                                     sound.begin() + static_cast<long>(at + 160));
+            cleaner->cleanNoise(frame);
+            all.push_back(frame.front());
+        }
+        return all;
+    };
+    auto const first = levels();
+    EXPECT_EQ(test_support::countAllocations([&] { EXPECT_TRUE(cleaner->resetSession()); }), 0U);
+    EXPECT_EQ(levels(), first);
+}
 
 // What is left of the level when nothing is removed, 90 dB below a full-scale input.
 TEST(NoiseLevelOfIdentity, IsBelowMinus50) {

@@ -7,6 +7,7 @@
 #include "noise_canceller/noise_cleaner_generations.h"
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
 #include "noise_canceller/noise_db_cleaner_v0_0_1.h"
+#include "noise_canceller/vad_cleaner_v0_0_1.h"
 #include "support/captured_output.h"
 #include "support/weight_writer.h"
 
@@ -27,7 +28,7 @@ inline void setText(ModelEnvironment const& model, std::string const& key, char 
     model->second.insert<std::string>(key, text, MORVA::CONTAINERS::InsertMode::keep);
 }
 
-// The cleaner of a generation, 1 to 6, or the noise-level model (0).
+// The cleaner of a generation, 1 to 6, the noise-level model (0) or voice activity (7).
 inline std::unique_ptr<NoiseCleaner> makeCleaner(int generation, ModelEnvironment const& model,
                                                  std::size_t frameMs) {
     using namespace MORVA::NOISE_CANCELLER;
@@ -43,7 +44,8 @@ inline std::unique_ptr<NoiseCleaner> makeCleaner(int generation, ModelEnvironmen
                                    of.template operator()<NoiseCleaner_v0_0_3>(),
                                    of.template operator()<NoiseCleaner_v0_0_4>(),
                                    of.template operator()<NoiseCleaner_v0_0_5>(),
-                                   of.template operator()<NoiseCleaner_v0_0_6>()};
+                                   of.template operator()<NoiseCleaner_v0_0_6>(),
+                                   of.template operator()<VadCleaner_v0_0_1>()};
     test_support::CapturedOutput const quiet(1);
     return makers[generation](model, frameMs);
 }

@@ -2,9 +2,13 @@
 // both sources are seen where cleaners with random parameters are compared with the reference.)
 #include <gtest/gtest.h>
 
+#include <clocale>
 #include <cmath>
+#include <cstdlib>
 
 #include "models.h"
+#include "support/temp_dir.h"
+#include "utils/exception.h"
 
 using namespace cleaner_test;
 using test_support::randomNcWeight;
@@ -112,4 +116,61 @@ TEST(Parameters, OneWordSwitchesOnAndTheOthersOff) {
     // Volume brings the limiter with it, and says so every time.
     EXPECT_EQ(read("VOLUME_UP", &Params::enableClipFix, "TRUE"),
               (Reading{1.0, "WARNING: Enabled Clip fix, because VolumeUp is Enabled\n"}));
+}
+
+// Each missing value is the first that its model names. A value of the wrong type counts as
+// missing.
+TEST(Parameters, MissingValuesAreNamedInTheOrderOfReading) {
+    using Names = std::vector<std::string>;
+    Names const structure = {"SampleRate",  "Step",          "FiltrBegin",       "FiltrEnd",
+                             "FrameLength", "PreviewFrames", "CoefficientNumber"};
+    Names const learned = {
+        "MU",        "SD",     "WeightLinear", "WeightNonLinear", "BaesLinear", "BaesNonLinear",
+        "WeightGRU", "BaesGRU"};
+    Names const normed = {"WeightGRU_reset", "BiasGRU_reset",     "GainLinearNorm",
+                          "BiasLinearNorm",  "GainNonLinearNorm", "BiasNonLinearNorm"};
+    auto const joined = [](std::initializer_list<Names> parts) {
+        Names all;
+        for (auto const& part : parts) all.insert(all.end(), part.begin(), part.end());
+        return all;
+    };
+    auto const named = [](int model, std::string const& weight, Names missing) {
+        Names order;
+        while (!missing.empty()) {
+            WeightWriter front;
+            for (auto const& name : missing) front.add(name, "text");
+            try {
+                makeCleaner(model, modelFrom(front.bytes() + weight), 10);
+                return Names{"none"};
+            } catch (MORVA::UTILS::MORVA_Exception const& failure) {
+                std::string const text = failure.what();
+                auto const at = text.find("Key: ") + 5;
+                order.push_back(text.substr(at, text.rfind("doesn't") - at));
+            }
+            if (std::erase(missing, order.back()) == 0) return order;
+        }
+        return order;
+    };
+    auto const older = randomNcWeight({.version = "0.0.5"});
+    auto order = joined({structure, learned, normed});
+    EXPECT_EQ(named(6, randomNcWeight({}), {order.rbegin(), order.rend()}), order);
+    order = joined({learned, structure});
+    for (int model : {0, 5}) EXPECT_EQ(named(model, older, {order.rbegin(), order.rend()}), order);
+    order = joined({learned, {"SampleRate", "FrameLength"}});
+    EXPECT_EQ(named(7, test_support::randomVadWeight({}), {order.rbegin(), order.rend()}), order);
+}
+
+// In a host whose numbers have a decimal comma.
+TEST(Parameters, TheHostsLocaleDoesNotMatter) {
+    test_support::TempDir const folder;
+    std::string const command =
+        "localedef -i de_DE -f UTF-8 " + (folder.path() / "comma").string() + " >/dev/null 2>&1";
+    [[maybe_unused]] int const warned = std::system(command.c_str());
+    setenv("LOCPATH", folder.path().c_str(), 1);
+    if (std::setlocale(LC_ALL, "comma") == nullptr) GTEST_SKIP() << "no locale to be had";
+    EXPECT_EQ(std::strtod("0,25", nullptr), 0.25);
+    EXPECT_EQ(read("SMOOT_COEF", &Params::smootCoef, "0.25").value, 0.25);
+    EXPECT_EQ(read("CLIP_FIX_POINT", &Params::clipFixPoint, "+1000.9").value, 1000);
+    std::setlocale(LC_ALL, "C");
+    unsetenv("LOCPATH");
 }

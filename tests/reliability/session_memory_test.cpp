@@ -1,27 +1,11 @@
-// What is remembered, and for how long: closed sessions not at all, a sound's level for three
-// seconds.
+// What is remembered, and for how long: a sound's level for three seconds.
 #include "morva-sdk/engine.h"
-#include "morva-sdk/instance.h"
 #include "noise_canceller/noise_cleaner_generations.h"
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
 #include "noise_canceller/spectral_cleaner.h"
 #include "weights/model_environment.h"
 
 using namespace sdk_test;
-using MORVA::MORVA_SDK::MorvaInstanceT;
-using MORVA::MORVA_SDK::MorvaSessionT;
-
-TEST(SessionMemory, AClosedSessionIsUnknown) {
-    Engine engine;
-    Engine::addIdentity("id", 16000, 20);
-    auto const& instance = *MorvaInstanceT::Instance(MorvaInstanceT::MODE::get, nullptr);
-    auto* const first = static_cast<MorvaSessionT*>(openNc(16000, 16000, 10, "id"));
-    auto* const second = static_cast<MorvaSessionT*>(openNc(16000, 16000, 10, "id"));
-    ASSERT_TRUE(instance.isSessionTrue(first));
-    ASSERT_EQ(Morva_NC_CloseSession(first), 0);
-    EXPECT_FALSE(instance.isSessionTrue(first));
-    EXPECT_TRUE(instance.isSessionTrue(second));
-}
 
 // Features of two streams that hear one sound after frames of different loudness.
 TEST(SessionMemory, LoudnessIsForgottenAfterThreeSeconds) {

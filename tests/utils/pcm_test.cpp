@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "support/random.h"
-#include "utils/flush_to_zero.h"
+#include "utils/float_control.h"
 
 using namespace MORVA::UTILS;
 using test_support::Random;
@@ -51,13 +51,13 @@ TEST(Pcm, SixteenBitSamplesGoThereAndBack) {
     EXPECT_EQ(back, all);
 }
 
-TEST(Pcm, UnitScaleDropsWhatIsNoSound) {
+TEST(Pcm, UnitScaleDropsWhatIsNoSoundAndBoundsWhatIsTooLoud) {
     Samples const in = anyFloats(1);
     Samples out(in.size());
     unitToPcm16Scale(in, out);
     for (std::size_t i = 0; i < in.size(); ++i) {
-        float const scaled = in[i] * 32768.0f;
-        ASSERT_EQ(out[i], std::abs(scaled) <= 32768e6f ? scaled : 0.0f) << in[i];
+        float const wanted = std::isfinite(in[i]) ? clipped(in[i], -1e6f, 1e6f) : 0.0f;
+        ASSERT_EQ(out[i], wanted * 32768.0f) << in[i];
     }
 }
 
@@ -80,15 +80,18 @@ TEST(Pcm, ConversionTruncatesAndSaturates) {
     }
 }
 
-TEST(FlushToZero, HoldsForItsScopeOnly) {
+TEST(FloatControl, HoldsForItsScopeOnly) {
     float volatile tiny = 1e-39f;
     auto const denormalSurvives = [&] { return tiny * 1.0f != 0.0f; };
-    ASSERT_TRUE(denormalSurvives());
+    unsigned const before = _mm_getcsr();
     {
-        ScopedFlushToZero const outer;
+        ScopedFloatControl const outer(Denormals::asZero);
         EXPECT_FALSE(denormalSurvives());
-        { ScopedFlushToZero const inner; }
+        {
+            ScopedFloatControl const inner(Denormals::kept);
+            EXPECT_TRUE(denormalSurvives());
+        }
         EXPECT_FALSE(denormalSurvives());
     }
-    EXPECT_TRUE(denormalSurvives());
+    EXPECT_EQ(_mm_getcsr(), before);
 }
