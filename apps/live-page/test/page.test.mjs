@@ -147,6 +147,7 @@ test('a dropped file comes back cleaned, as long, and drawn; another model clean
   });
 
   await page.click('#play');
+  await page.selectOption('#model', 'small_NC'); // and at once, in the middle of the sound, another
   await page.selectOption('#model', 'small_NC_8k');
   await page.getByText('cleaned with small_NC_8k').waitFor();
   const second = await finished(page);

@@ -6,7 +6,7 @@
  *
  * Threads: Setup and Reset take locks and may print, keep them off the audio path. Process takes no
  * lock. One session belongs to one thread at a time; different sessions may run on different
- * threads. They may go on while the process ends: nothing of the module is destroyed then.
+ * threads. They may go on while the process ends: nothing that they need is destroyed then.
  */
 #ifndef QUORRAL_VALTO_H
 #define QUORRAL_VALTO_H

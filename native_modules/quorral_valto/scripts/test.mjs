@@ -2,10 +2,10 @@
 // into an empty folder that has the layout of this repository, then all suites from there. Before that the
 // checks of the sources: lint, publint, types.
 //
-//   node scripts/test.mjs [--build <folder of a preset>] [--sanitizer] [test files]
+//   node scripts/test.mjs [--build <folder of a preset>] [--sanitizer | --suites] [test files]
 //
-// --sanitizer: the build carries AddressSanitizer; its library is preloaded into the runtime and the
-// checks of the sources are left out.
+// --suites: the checks of the sources are left out.
+// --sanitizer: these too; the build carries AddressSanitizer, whose library is preloaded into the runtime.
 import { execFileSync, spawnSync } from 'node:child_process';
 import {
   cpSync,
@@ -30,6 +30,7 @@ const { values: settings, positionals } = parseArgs({
   options: {
     build: { type: 'string', default: path.join(repository, 'build/release') },
     sanitizer: { type: 'boolean', default: false },
+    suites: { type: 'boolean', default: false },
   },
 });
 const build = path.resolve(settings.build);
@@ -92,7 +93,8 @@ function suite(folder) {
 
 const work = mkdtempSync(path.join(os.tmpdir(), 'quorral-package-'));
 process.on('exit', () => rmSync(work, { recursive: true, force: true }));
-if (!settings.sanitizer) {
+const checksSources = !settings.sanitizer && !settings.suites;
+if (checksSources) {
   say('lint');
   run(bin('biome'), ['check'], { cwd: repository });
 }
@@ -100,7 +102,7 @@ say('pack and install');
 const tarball = pack(work);
 const app = path.join(work, 'app with space');
 install(tarball, app);
-if (!settings.sanitizer) {
+if (checksSources) {
   say('publint');
   run(bin('publint'), ['run', '--strict', tarball]);
   say('types');

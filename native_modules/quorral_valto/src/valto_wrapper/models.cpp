@@ -2,6 +2,7 @@
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
 
 #include <algorithm>
+#include <memory>
 #include <utility>
 
 #include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
@@ -9,10 +10,19 @@
 
 namespace quorral {
 
-std::vector<NcModel> gNcModels;
-std::string gNcModel;
-std::vector<std::string> gVadModels;
-std::string gVadModel;
+namespace {
+
+template <class T>
+T& NeverDestroyed() {
+    return *std::make_unique<T>().release();
+}
+
+}  // namespace
+
+std::vector<NcModel>& gNcModels = NeverDestroyed<std::vector<NcModel>>();
+std::string& gNcModel = NeverDestroyed<std::string>();
+std::vector<std::string>& gVadModels = NeverDestroyed<std::vector<std::string>>();
+std::string& gVadModel = NeverDestroyed<std::string>();
 
 namespace {
 

@@ -19,10 +19,11 @@ struct NcModel {
     std::int32_t maxSampleRate = 0;
 };
 
-extern std::vector<NcModel> gNcModels;       // in registration order
-extern std::string gNcModel;                 // empty: choose by sampling rate
-extern std::vector<std::string> gVadModels;  // in registration order
-extern std::string gVadModel;                // used by new voice-activity sessions
+// Never destroyed: an audio thread may still open sessions while the process exits.
+extern std::vector<NcModel>& gNcModels;       // in registration order
+extern std::string& gNcModel;                 // empty: choose by sampling rate
+extern std::vector<std::string>& gVadModels;  // in registration order
+extern std::string& gVadModel;                // used by new voice-activity sessions
 
 // Serialises start-up, model choice and session set-up. Recursive: a set-up with a model of its own
 // sets the choice, opens through the ordinary entry point and restores, all under one lock.
