@@ -13,6 +13,7 @@ import json
 import math
 import os
 import sys
+import threading
 from collections.abc import Iterable, Iterator
 from concurrent.futures import ThreadPoolExecutor, as_completed
 from dataclasses import dataclass
@@ -69,6 +70,7 @@ class Journal:
     def __init__(self, folder: Path) -> None:
         folder.mkdir(parents=True, exist_ok=True)
         self._path = folder / JOURNAL
+        self._lock = threading.Lock()
         self._done: dict[str, str] = {}
         for entry in self._read():
             if entry.get("error") is None:
@@ -96,7 +98,7 @@ class Journal:
             "error": error,
         }
         # The leading newline ends a line that a crash may have cut.
-        with self._path.open("a") as file:
+        with self._lock, self._path.open("a") as file:
             file.write("\n" + json.dumps(entry))
 
 
@@ -115,15 +117,19 @@ def run(jobs: list[Job], journal: Journal, workers: int, *, progress: bool = Tru
     todo = [job for job in jobs if not journal.is_done(job)]
     if len(todo) < len(jobs):
         print(f"{len(jobs) - len(todo)} of {len(jobs)} files are done already", file=sys.stderr)
+
+    def noted(job: Job) -> str | None:
+        error = clean(job)
+        journal.add(job, error)
+        return error
+
     failures: dict[str, str] = {}
     pool = ThreadPoolExecutor(workers)
     try:
-        futures = {pool.submit(clean, job): job for job in todo}
+        futures = {pool.submit(noted, job): job for job in todo}
         for future in tqdm(as_completed(futures), total=len(todo), unit="file", disable=not progress):
-            job, error = futures[future], future.result()
-            journal.add(job, error)
-            if error is not None:
-                failures[str(job.source)] = error
+            if (error := future.result()) is not None:
+                failures[str(futures[future].source)] = error
     finally:
         pool.shutdown(cancel_futures=True)  # when interrupted: the files under way are finished, no others begun
     return failures
