@@ -6,6 +6,8 @@ import json
 import sys
 from pathlib import Path
 
+import composite
+import lost_speech
 import metrics
 import mixtures
 import noise_level
@@ -30,7 +32,40 @@ def test_si_sdr_is_the_ratio_and_ignores_scale_mean_and_delay(snr: float) -> Non
     result = 0.1 * (clean + noise(12, 2) * 10 ** (-snr / 20))
     assert si_sdr(clean, result + 5) == pytest.approx(snr, abs=0.1)
     reference, shifted = metrics.aligned(clean, np.concatenate([np.zeros(320), result]), 16000)
-    assert len(reference) == len(clean) - 320 and si_sdr(reference, shifted) == pytest.approx(snr, abs=0.1)
+    assert len(reference) == len(clean) and si_sdr(reference, shifted) == pytest.approx(snr, abs=0.1)
+
+
+@pytest.mark.parametrize("late", [-7, 0, 1, 100])
+def test_alignment_takes_fractions_of_a_sample_out(late: int) -> None:
+    """Sound below a quarter of the rate, `late` sevenths of a sample late."""
+    low = np.fft.rfft(noise(1, 4))[:4000] * 7
+    fine = np.fft.irfft(low, 7 * 16000)
+    reference, shifted = metrics.aligned(fine[::7], np.roll(fine, late)[::7], 16000)
+    assert si_sdr(reference[200:-200], shifted[200:-200]) > 40
+
+
+def test_what_is_lost_of_the_speech_whatever_noise_is_left() -> None:
+    """Bursts of hiss; above 4 kHz and in their first 30 ms halved, and noise of their own level added."""
+    rate = 32000
+    gates = np.repeat(np.arange(40) % 4 == 3, rate // 10)
+    speech = np.where(gates, noise(4, 5, rate), 0)
+    heard = speech.copy()
+    for start in np.flatnonzero(np.diff(gates.astype(int)) == 1):
+        heard[start : start + rate * 3 // 100] *= 0.5
+    spectrum = np.fft.rfft(heard)
+    spectrum[4 * 4000 :] *= 0.5
+    lost = lost_speech.losses(speech, np.fft.irfft(spectrum) + noise(4, 6, rate), rate)
+    assert lost.octaves[2000] == pytest.approx(lost.octaves[8000] - 6.0, abs=0.5)
+    assert lost.octaves[8000] == pytest.approx(lost.treble, abs=0.3)
+    assert 6 < lost.consonants < 8.5 and 9 < lost.onsets < 12
+
+
+def test_composite_ratings_fall_with_noise_and_with_a_bent_envelope() -> None:
+    clean, rate = score.read(ROOT / "examples/audio/clean.flac", 16000)
+    bent = np.append(clean[0], clean[1:] - 0.9 * clean[:-1])
+    same, noisy, tilted = (composite.composite(clean, x, rate, 4.5) for x in (clean, clean + noise(10, 7), bent))
+    assert same[:3] == pytest.approx((5, 5, 5), abs=0.6) and same.llr == pytest.approx(0, abs=1e-6)
+    assert noisy.cbak < same.cbak - 1 and tilted.llr > 0.5 and tilted.csig < same.csig
 
 
 def test_pauses() -> None:
