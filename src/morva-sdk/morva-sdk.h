@@ -110,8 +110,7 @@ MORVA_API int Morva_VAD_CloseSession(void* session);
 MORVA_API int Morva_NoiseDB_CloseSession(void* session);
 
 /* [the session's thread, between frames] Brings a noise-level session back to its start: the same
- * input then gives bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle.
- * Rebuilds the energy statistics, so it does allocate. */
+ * input then gives bit-equal results again. Returns 1 (one) on success, -3 for a wrong handle. */
 MORVA_API int Morva_NoiseDB_ResetSession(void* session);
 
 /* [audio thread] Clean one frame. `inputSize` is the frame size at the input rate, `outputSize` at
@@ -135,7 +134,7 @@ MORVA_API float Morva_VAD_FrameFloat(void* session, float const* input, unsigned
  * above (a level equal to one of those codes cannot be told from it). The Float call answers only
  * levels within 0..1 dB; every other level is refused like a wrong handle: "THE CLEANING ERROR
  * OUTPUT result <level>" and the wrong-session line are printed and -4.0 returned, while the
- * session goes on as usual. Use the Int16 call for levels. */
+ * session goes on as usual. MorvaExt_NoiseDB_FrameFloat (morva-ext.h) gives every level. */
 MORVA_API float Morva_NoiseDB_FrameInt16(void* session, short const* input, unsigned int inputSize);
 MORVA_API float Morva_NoiseDB_FrameFloat(void* session, float const* input, unsigned int inputSize);
 

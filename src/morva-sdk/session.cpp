@@ -51,14 +51,13 @@ void printSizeError(char const* error, std::size_t inputSize, std::string const&
 }  // namespace
 
 MorvaSessionT::Path MorvaSessionT::openPath(char const* modelName) const {
-    bool const isSound = type_ == MorvaSessionType::NoiseCancellation;
     // A missing model is what the caller hears about first, even when the duration is wrong as
     // well.
     auto const checkDuration = [this] {
         if (isFrameDuration(duration_)) return;
         UTILS::raise("RESAMPLER WORKS WITH WRONG FRAMEDURATION ", kUnit, "MorvaSessionT");
     };
-    if (isSound) {
+    if (type_ == MorvaSessionType::NoiseCancellation) {
         auto model = NOISE_CANCELLER::createNoiseModel(inputRate_, duration_, modelName);
         checkDuration();
         return Path(std::in_place_type<SoundPath>, std::move(model), inputFrameSize_,

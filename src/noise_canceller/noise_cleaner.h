@@ -1,8 +1,8 @@
 // The model interface that a session holds, and the choice of a model for a new session.
 //
 // A cleaner is bound to one registered model: it keeps the model's weight alive, reads it only, and
-// owns all the state of one stream. One thread at a time per cleaner; cleaners of one model may run
-// on different threads at the same time.
+// owns all the state of one stream. Cleaners of one model may run on different threads at the same
+// time.
 #pragma once
 
 #include <cstddef>

@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 #include <map>
+#include <memory>
 #include <mutex>
 #include <numbers>
 #include <numeric>
@@ -48,9 +49,15 @@ std::vector<float> makeKernel() {
     return kernel;
 }
 
+// Threads may still open sessions while the process exits, so nothing here is destroyed then.
+template <class T>
+T& keepForEver(T value) {
+    return *std::make_unique<T>(std::move(value)).release();
+}
+
 // The grid point of a tap; the right wing ends one point earlier than the left one.
 float coefficient(std::int64_t point, bool right) {
-    static std::vector<float> const kernel = makeKernel();
+    static auto const& kernel = keepForEver(makeKernel());
     std::int64_t const end = right ? wing - 1 : wing;
     return point < end ? kernel[static_cast<std::size_t>(std::max<std::int64_t>(point, 0))] : 0.0f;
 }
@@ -64,11 +71,10 @@ std::size_t roundUp(std::size_t n) {
 std::shared_ptr<InterpolationFilter const> InterpolationFilter::forRates(std::uint64_t inRate,
                                                                          std::uint64_t outRate) {
     static std::mutex lock;
-    static std::map<std::pair<std::uint64_t, std::uint64_t>,
-                    std::weak_ptr<InterpolationFilter const>>
-        known;
+    using Steps = std::pair<std::uint64_t, std::uint64_t>;
+    static auto& known = keepForEver(std::map<Steps, std::weak_ptr<InterpolationFilter const>>());
     std::uint64_t const divisor = std::gcd(inRate, outRate);
-    std::pair const steps(inRate / divisor, outRate / divisor);
+    Steps const steps(inRate / divisor, outRate / divisor);
     std::lock_guard const guard(lock);
     if (auto shared = known[steps].lock()) return shared;
     auto made = std::make_shared<InterpolationFilter const>(steps.first, steps.second);

@@ -1,6 +1,6 @@
 // Bounds-checked cursor over a byte stream that nobody vouches for: every request is compared with
 // the bytes that are left before anything is read or allocated. Units: counts are elements, sizes
-// are bytes; numbers are little-endian. One thread at a time.
+// are bytes; numbers are little-endian.
 #pragma once
 
 #include <bit>

@@ -1,5 +1,5 @@
 // The two sources of weight data, a file and a copy of a memory block, behind one bounded reader.
-// One thread at a time.
+// Write mode and the operators are there for callers; the engine itself only uses the reader.
 #pragma once
 
 #include <fstream>

@@ -34,7 +34,12 @@ static void waitForFrames(int count) {
 }
 
 static void lastCalls(void) {
-    waitForFrames(100);
+    waitForFrames(50);
+    void* late =
+        Morva_NC_CreateSession(MORVA_RATE_48000, MORVA_RATE_44100, MORVA_FRAME_10_MS, "model");
+    expect(late != NULL, "session");
+    expect(Morva_NC_CloseSession(late) == 0, "close");
+    waitForFrames(50);
 }
 
 int main(int count, char** arguments) {

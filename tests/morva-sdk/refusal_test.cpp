@@ -29,8 +29,8 @@ struct Model {
     void* (*open)(char const*);
 };
 Model const kKinds[] = {{randomNcWeight({}), openNc16},
-                       {randomNcWeight({.version = "0.0.5"}), openNc16},
-                       {randomVadWeight({}), openVad16}};
+                        {randomNcWeight({.version = "0.0.5"}), openNc16},
+                        {randomVadWeight({}), openVad16}};
 
 // The first value of a name counts: what is written in front of a weight replaces its own.
 auto openChanged(Model const& kind, std::string const& change) {

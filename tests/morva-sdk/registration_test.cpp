@@ -87,8 +87,13 @@ TEST_F(Registration, ControlFiles) {
     std::string const weight = "WEIGHT a.mvw\n";
     Row const rows[] = {
         {"WEIGHT \t a.mvw \r\n", 0, weight},
-        {"# a comment\n  K   two  words \nWEIGHT a.mvw", 0,
+        {"# a comment\n\n \t\r\n#\n  K  \f\v two  words \r\nWEIGHT a.mvw", 0,
          "ENVIRONMENT KEY-\"K\" VALUE-\"two  words\"\n" + weight},
+        {" # word\nWEIGHT a.mvw\n", 0, "ENVIRONMENT KEY-\"#\" VALUE-\"word\"\n" + weight},
+        {"\xc3\xa4 \xa0v\xa0\nk v\rw\nWEIGHT a.mvw", 0,  // no blank above 127, no line at a \r
+         "ENVIRONMENT KEY-\"\xc3\xa4\" VALUE-\"\xa0v\xa0\"\nENVIRONMENT KEY-\"k\" "
+         "VALUE-\"v\rw\"\n" +
+             weight},
         {"WEIGHT a.mvw\nWEIGHT b.mvw\n", 0,
          weight + "WARNING multiple weight including, weight exists.\n"},
         {"WEIGHT none.mvw\nWEIGHT a.mvw\n", 0,

@@ -1,21 +1,16 @@
-// What the registry reads beside weights: the identifier of a weight, and control files. (What
-// registration says and does: see the tests of the C interface.)
-#include <gmock/gmock.h>
+// The identifier by which a weight that is loaded already is recognised. (What registration says
+// and does, control files included: see the tests of the C interface.)
+#include <gtest/gtest.h>
 
 #include <sstream>
-#include <tuple>
 
-#include "support/temp_dir.h"
-#include "weights/control_file.h"
+#include "support/record_writer.h"
 #include "weights/model_registry.h"
 
 namespace {
 
 using namespace MORVA;
-using namespace std::string_literals;
 using test_support::WeightWriter;
-using Entry = std::pair<std::string, std::string>;
-using Entries = std::vector<Entry>;
 
 std::string identify(WeightWriter const& writer, std::string const& expectedOutput) {
     auto const weight = std::make_shared<WEIGHTS::Weight>();
@@ -58,39 +53,6 @@ TEST(Identifier, NeedsAllFiveValues) {
             for (auto const* name : {"SampleRate", "FrameLength"}) add(name, 16000, 16000.0F);
             EXPECT_EQ(identify(writer, "ERROR INVALID WEIGHT\n"), "") << dropped << mistyped;
         }
-    }
-}
-
-TEST(ControlFile, ReadsItsEntriesInOrder) {
-    test_support::TempDir const dir;
-    std::string const longKey(3'000'000, 'k');
-    std::string const longValue(5'000'000, 'v');
-    for (auto const& [text, good, expected] :
-         std::initializer_list<std::tuple<std::string, bool, Entries>>{
-             {"", true, {}},
-             {"\n\n \t\n#\n# a b\n#word\r\n", true, {}},
-             {"a 1\r\nb 2", true, {{"a", "1"}, {"b", "2"}}},  // Windows lines, no final newline
-             {"a 1\na 2\n", true, {{"a", "1"}, {"a", "2"}}},
-             {"\t k \f\v inner  blanks stay \r", true, {{"k", "inner  blanks stay"}}},
-             {"\xc3\xa4 \xa0v\xa0", true, {{"\xc3\xa4", "\xa0v\xa0"}}},  // no blank above 127
-             {" # x\n", true, {{"#", "x"}}},
-             {" #x\n", false, {}},
-             {"a 1\nword\nb 2\n", false, {{"a", "1"}}},
-             {"\0\0\n"s, false, {}},
-             {"\0 \0\n"s, true, {{"\0"s, "\0"s}}},
-             {"a 1\rb 2\n", true, {{"a", "1\rb 2"}}},
-             {longKey + std::string(1'000'000, ' ') + longValue, true, {{longKey, longValue}}},
-         }) {
-        Entries entries;
-        auto const file = dir.write("model.cfg", text).wstring();
-        EXPECT_EQ(UTILS::readControlFile(entries, UTILS::Path(file.c_str())), good);
-        EXPECT_EQ(entries, expected);
-    }
-    EXPECT_EQ(UTILS::getKeyValue("  word \t "), Entry("word", ""));
-    for (auto const& path : {dir.path(), dir.path() / "missing.cfg"}) {
-        Entries entries = {{"already", "there"}};
-        EXPECT_FALSE(UTILS::readControlFile(entries, UTILS::Path(path.wstring().c_str()))) << path;
-        EXPECT_EQ(entries.size(), 1U);
     }
 }
 
