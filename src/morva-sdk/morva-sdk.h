@@ -68,12 +68,12 @@ extern "C" {
 #define MORVA_FRAME_DURATIONS(X) X(10) X(20) X(30) X(40)
 
 /* MORVA_RATE_8000 = 8000 ... MORVA_RATE_96000 = 96000 */
-#define MORVA_RATE_ENTRY(hz) MORVA_RATE_##hz = hz,
+#define MORVA_RATE_ENTRY(hz) MORVA_RATE_##hz = (hz),
 typedef MORVA_ENUM(MorvaSamplingRate){MORVA_SAMPLING_RATES(MORVA_RATE_ENTRY)} MorvaSamplingRate;
 #undef MORVA_RATE_ENTRY
 
 /* MORVA_FRAME_10_MS = 10 ... MORVA_FRAME_40_MS = 40 */
-#define MORVA_FRAME_ENTRY(ms) MORVA_FRAME_##ms##_MS = ms,
+#define MORVA_FRAME_ENTRY(ms) MORVA_FRAME_##ms##_MS = (ms),
 typedef MORVA_ENUM(MorvaFrameDuration){MORVA_FRAME_DURATIONS(MORVA_FRAME_ENTRY)} MorvaFrameDuration;
 #undef MORVA_FRAME_ENTRY
 

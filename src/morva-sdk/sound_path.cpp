@@ -3,7 +3,7 @@
 #include <cmath>
 #include <utility>
 
-#include "noise_canceller/mask_controls.h"
+#include "noise_canceller/sound_controls.h"
 #include "utils/pcm.h"
 
 namespace MORVA::MORVA_SDK {
@@ -37,7 +37,7 @@ SoundPath::SoundPath(NOISE_CANCELLER::NoiseModel model, std::size_t inputFrame,
     : controls_(model.controls),
       model_(std::move(model.cleaner), inputFrame, duration),
       toOutput_(model_.modelFrame(), outputFrame),
-      latency_(std::lround(latencyOf(model_.converter(), model.delay, toOutput_))),
+      latency_(std::lround(latencyOf(model_.converter(), controls_.delay(), toOutput_))),
       bypass_(inputFrame, outputFrame, static_cast<std::size_t>(latency_)) {}
 
 void SoundPath::clean(std::vector<float>& frame) {

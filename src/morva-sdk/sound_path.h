@@ -64,7 +64,7 @@ public:
     float noiseLevelDb() const;
 
 private:
-    NOISE_CANCELLER::MaskControls& controls_;  // of the model
+    NOISE_CANCELLER::SoundControls& controls_;  // of the model
     ModelStage model_;
     FrameConverter toOutput_;
     long latency_;

@@ -2,7 +2,6 @@
 #include <algorithm>
 #include <iterator>
 
-#include "noise_canceller/hop_pipeline.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "noise_canceller/noise_cleaner_generations.h"
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
@@ -29,10 +28,8 @@ constexpr char const* kUnsupported = "Unsupported weight version";
 template <class Cleaner>
 NoiseModel buildNoiseModel(ModelEnvironment environment, std::size_t frameMs) {
     auto cleaner = std::make_unique<Cleaner>(std::move(environment), frameMs);
-    auto const [rate, modelMs] = cleaner->environment()->first->getWeightInfo();
-    auto const delayMs = pipelineDelayMs(static_cast<std::size_t>(modelMs), frameMs);
-    MaskControls& controls = *cleaner;
-    return {std::move(cleaner), controls, delayMs * static_cast<std::size_t>(rate) / 1000};
+    SoundControls& controls = cleaner->controls();
+    return {std::move(cleaner), controls};
 }
 
 struct NoiseRow {

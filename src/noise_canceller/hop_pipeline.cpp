@@ -2,6 +2,9 @@
 
 #include <algorithm>
 #include <array>
+#include <string>
+
+#include "utils/exception.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {
@@ -20,14 +23,15 @@ constexpr DelayRow kDelays[] = {
     {32, {31, 28, 28, 30, 16, 28}},
 };
 
-}  // namespace
-
+// 0 for a pair that is not supported.
 std::size_t pipelineDelayMs(std::size_t modelFrameMs, std::size_t sessionFrameMs) {
     auto const column = std::ranges::find(kSessionFramesMs, sessionFrameMs);
     auto const row = std::ranges::find(kDelays, modelFrameMs, &DelayRow::modelFrameMs);
     if (column == kSessionFramesMs.end() || row == std::end(kDelays)) return 0;
     return row->delayMs[static_cast<std::size_t>(column - kSessionFramesMs.begin())];
 }
+
+}  // namespace
 
 HopPipeline::HopPipeline(Shape const& shape)
     : shape_(shape),
@@ -45,6 +49,12 @@ void HopPipeline::reset() {
     output_.push_backNULL(delay_);
 }
 
+void HopPipeline::refuseFrame(std::size_t length) const {
+    UTILS::raise("a frame of " + std::to_string(length) + " samples, must be " +
+                     std::to_string(sessionFrame()),
+                 "src/noise_canceller/hop_pipeline", "process");
+}
+
 void HopPipeline::overlapAdd() {
     output_.push_backNULL(shape_.hop);
     float* const target = output_.data.data() + output_.end - modelFrame_.size();
@@ -56,7 +66,6 @@ std::span<float const> HopPipeline::completedOutput() const {
 }
 
 void HopPipeline::takeOutput(std::vector<float>& frame) {
-    frame.resize(shape_.rateHz * shape_.sessionFrameMs / 1000);
     std::copy_n(output_.readPosition(), frame.size(), frame.begin());
     output_.start += frame.size();
 }

@@ -12,10 +12,6 @@
 
 namespace MORVA::NOISE_CANCELLER {
 
-// The pipeline's delay in milliseconds for a model frame and a session frame of these lengths; 0
-// for a pair that is not supported.
-std::size_t pipelineDelayMs(std::size_t modelFrameMs, std::size_t sessionFrameMs);
-
 class HopPipeline {
 public:
     struct Shape {
@@ -33,14 +29,19 @@ public:
 
     explicit HopPipeline(Shape const& shape);
 
+    // From sound in to sound out; 0 for a pair of frame lengths that is not supported.
+    std::size_t delay() const { return delay_; }
+
     // Empties both queues and fills them with their initial silence.
     void reset();
 
     // `model(float const* in, std::vector<float>& out)` reads two hops and leaves two windowed
     // hops. `observe(CompletedHop)` is called after each of them. `frame` holds one session frame;
-    // it is replaced by as many delayed output samples.
+    // it is replaced by as many delayed output samples. Throws MORVA_Exception for a frame of
+    // another length and for a pair of frame lengths that is not supported.
     template <class Model, class Observe>
     void process(std::vector<float>& frame, Model&& model, Observe&& observe) {
+        if (frame.size() != sessionFrame() || delay_ == 0) refuseFrame(frame.size());
         input_.push_back(frame.data(), frame.size());
         while (input_.unread() >= 2 * shape_.hop) {
             model(input_.readPosition(), modelFrame_);
@@ -57,6 +58,8 @@ public:
     }
 
 private:
+    std::size_t sessionFrame() const { return shape_.rateHz * shape_.sessionFrameMs / 1000; }
+    [[noreturn]] void refuseFrame(std::size_t length) const;
     void overlapAdd();
     std::span<float const> completedOutput() const;
     void takeOutput(std::vector<float>& frame);

@@ -1,6 +1,6 @@
 // Everything that the noise cleaners have in common: the hop pipeline around a spectral cleaner
-// with its network, and the meter of what it removes. Which network it is follows from the type of
-// its weights. One thread at a time, but for the mask floor, which any thread may set.
+// with its network and stage, and the meter of what it removes. Which parts they are follows from
+// the generation.
 #pragma once
 
 #include <algorithm>
@@ -9,50 +9,53 @@
 #include <vector>
 
 #include "noise_canceller/feature_statistics.h"
+#include "noise_canceller/generations.h"
 #include "noise_canceller/hop_pipeline.h"
 #include "noise_canceller/networks.h"
 #include "noise_canceller/noise_level_meter.h"
+#include "noise_canceller/sound_controls.h"
 #include "noise_canceller/spectral_cleaner.h"
-#include "noise_canceller/spectral_params.h"
 
 namespace MORVA::NOISE_CANCELLER {
 
-template <class NetworkWeights>
-class MaskModel {
+template <int number>
+class MaskModel final : public SoundControls {
 public:
+    using Network = NetworkOf<number>;
+    using Stage = StageOf<number>;
+
     // The values that the model reads; its checks make every frame call safe.
-    struct Params : FeatureStatistics, NetworkWeights, SpectralParams {
-        Params(SpectralParams::Environment& environment, std::size_t frameMs,
-               Generation const& generation)
-            : FeatureStatistics(inOrder(*environment.first, generation)),
-              NetworkWeights(*environment.first),
-              SpectralParams(environment, frameMs, generation) {
+    struct Params : FeatureStatistics, Network, SpectralParams, Stage::Params {
+        Params(SpectralParams::Environment& environment, std::size_t frameMs)
+            : FeatureStatistics(inOrder(*environment.first)),
+              Network(*environment.first),
+              SpectralParams(environment, frameMs, generation(number)),
+              Stage::Params(ParameterReader(environment, generation(number).suffix)) {
             if (mu.empty() || sd.empty()) refuseWeight("MU or SD is empty");
             if (std::ranges::count(sd, 0.0f) > 0) refuseWeight("SD holds a zero");
-            NetworkWeights::check(featureWidth(), bands.bands());
-            std::size_t const layers = NetworkWeights::weightNonLinear.size();
-            NetworkWeights::packed =
-                sharedPackedNetwork(environment.second, static_cast<NetworkWeights const&>(*this),
-                                    {layers, layers - 1});
+            Network::check(featureWidth(), bands.bands());
+            std::size_t const layers = Network::weightNonLinear.size();
+            Network::packed = sharedPackedNetwork(
+                environment.second, static_cast<Network const&>(*this), {layers, layers - 1});
         }
-        std::size_t stateWidth() const { return NetworkWeights::stateWidth(featureWidth()); }
+        std::size_t stateWidth() const { return Network::stateWidth(featureWidth()); }
 
     private:
         // What a weight lacks is named in the order in which a generation reads.
-        static WEIGHTS::Weight const& inOrder(WEIGHTS::Weight const& weight,
-                                              Generation const& generation) {
-            if (generation.structureFirst) Structure const missed(weight);
+        static WEIGHTS::Weight const& inOrder(WEIGHTS::Weight const& weight) {
+            if (generation(number).structureFirst) Structure const missed(weight);
             return weight;
         }
     };
 
-    MaskModel(Params const& params, CONTAINERS::AnyMap& environment, Generation const& generation,
+    MaskModel(SpectralParams::Environment& environment, std::size_t frameMs,
               Synthesis synthesis = Synthesis::FromKept)
-        : params_(params),
-          spectral_(params, params, environment, generation, synthesis),
-          pipeline_(params.pipelineShape()),
-          state_(params.stateWidth()) {
-        std::size_t const widest = params.widest(params.stateWidth() + params.featureWidth());
+        : params_(environment, frameMs),
+          spectral_(params_, params_, environment.second, generation(number), synthesis),
+          stage_(params_, params_.modelFrameMs, spectral_.synthesisWindow()),
+          pipeline_(params_.pipelineShape()),
+          state_(params_.stateWidth()) {
+        std::size_t const widest = params_.widest(params_.stateWidth() + params_.featureWidth());
         x_.reserve(widest);
         scratch_.reserve(widest);
     }
@@ -66,19 +69,16 @@ public:
         silentInput_ = false;
     }
 
-    // One session frame at the model's rate, in place.
-    template <class Stage>
-    void process(std::vector<float>& frame, Stage&& stage) {
+    // One session frame at the model's rate, in place; `step` cleans a model frame, as run() does.
+    template <class Step>
+    void process(std::vector<float>& frame, Step&& step) {
         examineInput(frame);
-        pipeline_.process(
-            frame, [&](float const* in, std::vector<float>& out) { run(in, out, stage); },
-            [&](HopPipeline::CompletedHop const& hop) { meter_.measure(hop); });
+        pipeline_.process(frame, step,
+                          [&](HopPipeline::CompletedHop const& hop) { meter_.measure(hop); });
     }
 
-    // One model frame: FrameLength samples in, as many windowed, cleaned samples out. `stage` may
-    // change the cleaned frame before it is windowed.
-    template <class Stage>
-    bool run(float const* in, std::vector<float>& out, Stage&& stage) {
+    // One model frame: FrameLength samples in, as many windowed, cleaned samples out.
+    bool run(float const* in, std::vector<float>& out) {
         spectral_.analyse(in, x_);
         if (silentInput_) {
             // As long as the output layer; the state is left alone.
@@ -87,16 +87,15 @@ public:
             runNetwork(state_, x_, params_, scratch_);
         }
         spectral_.applyMask(x_, maskFloor_.load(std::memory_order_relaxed));
-        stage(spectral_.frame());
+        stage_(spectral_.frame());
         spectral_.finish(out);
         return true;
     }
 
-    std::vector<float> const& synthesisWindow() const { return spectral_.synthesisWindow(); }
-
-    // Lowest gain of a bin, 0..1.
-    void setMaskFloor(float floor) { maskFloor_.store(floor, std::memory_order_relaxed); }
-    float noiseLevelDb() const { return meter_.levelDb(); }
+    void setMaskFloor(float floor) override { maskFloor_.store(floor, std::memory_order_relaxed); }
+    bool switchBackgroundSpeaker(bool on) override { return stage_.switchTo(on); }
+    float noiseLevelDb() const override { return meter_.levelDb(); }
+    std::size_t delay() const override { return pipeline_.delay(); }
 
 private:
     // Digital silence can bypass the network.
@@ -106,8 +105,9 @@ private:
         silentInput_ = SpectralParams::kSkipThreshold >= std::max(std::abs(high), std::abs(low));
     }
 
-    Params const& params_;
+    Params const params_;
     SpectralCleaner spectral_;
+    Stage stage_;
     HopPipeline pipeline_;
     NoiseLevelMeter meter_;
     std::atomic<float> maskFloor_ = 0.0f;

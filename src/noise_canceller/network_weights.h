@@ -34,8 +34,7 @@ struct FeedForwardWeights {
     Matrices const& weightNonLinear;
     Vectors const& baesLinear;
     Vectors const& baesNonLinear;
-    // Optional: without it the products run on the matrices above.
-    std::shared_ptr<PackedNetwork const> packed;
+    std::shared_ptr<PackedNetwork const> packed;  // what the products run on; set once checked
 
     std::vector<CONTAINERS::Matrix const*> gates() const { return {}; }
     // The network has no recurrent state.

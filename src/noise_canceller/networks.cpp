@@ -12,42 +12,22 @@
 namespace MORVA::NOISE_CANCELLER {
 namespace {
 
-using CONTAINERS::Matrix;
-using CONTAINERS::PackedMatrix;
-
-// One affine layer, x W + b, on the packed matrix where there is one.
-void affine(std::vector<float> const& x, Matrix const& matrix, PackedMatrix const* packed,
-            std::vector<float> const& bias, std::vector<float>& out) {
-    if (packed == nullptr) {
-        UTIL_FUNCTIONS::matMulPlusB(x, matrix, bias, out);
-        return;
-    }
-    out.resize(packed->cols());
-    packed->affine(x.data(), bias.data(), out.data());
-}
-
-// The packed form of matrix `index` in a list of the network, if the network is packed.
-PackedMatrix const* packedIn(FeedForwardWeights const& weights,
-                             std::vector<PackedMatrix> PackedNetwork::*list, std::size_t index) {
-    return weights.packed ? &((*weights.packed).*list)[index] : nullptr;
-}
+using UTIL_FUNCTIONS::matMulPlusB;
 
 void nonLinearLayer(std::vector<float> const& x, FeedForwardWeights const& weights,
                     std::size_t layer, std::vector<float>& out) {
-    affine(x, weights.weightNonLinear[layer], packedIn(weights, &PackedNetwork::nonLinear, layer),
-           weights.baesNonLinear[layer], out);
+    matMulPlusB(x, weights.packed->nonLinear[layer], weights.baesNonLinear[layer], out);
 }
 
 void linearLayer(std::vector<float> const& x, FeedForwardWeights const& weights, std::size_t layer,
                  std::vector<float>& out) {
-    affine(x, weights.weightLinear[layer], packedIn(weights, &PackedNetwork::linear, layer),
-           weights.baesLinear[layer], out);
+    matMulPlusB(x, weights.packed->linear[layer], weights.baesLinear[layer], out);
 }
 
-// `index` 0 is the update gate, 1 the reset gate.
-void gateLayer(std::vector<float> const& x, FeedForwardWeights const& weights, std::size_t index,
-               Matrix const& matrix, std::vector<float> const& bias, std::vector<float>& out) {
-    affine(x, matrix, packedIn(weights, &PackedNetwork::gates, index), bias, out);
+// Of the update gate or the reset gate.
+void gateLayer(std::vector<float> const& x, CONTAINERS::PackedMatrix const& matrix,
+               std::vector<float> const& bias, std::vector<float>& out) {
+    matMulPlusB(x, matrix, bias, out);
     NOISE_CLEANER_FUNCTIONS::sigmoid(out);
 }
 
@@ -96,7 +76,7 @@ void branches(std::vector<float> const& x, std::size_t layer, FeedForwardWeights
 }
 
 void updateGate(std::vector<float> const& x, GatedWeights const& weights, NetworkScratch& scratch) {
-    gateLayer(x, weights, 0, weights.weightGRU, weights.baesGRU, scratch.gate);
+    gateLayer(x, weights.packed->gates[0], weights.baesGRU, scratch.gate);
 }
 
 // Hidden layers without normalisation; `afterFirst` sees the first layer's output.
@@ -153,7 +133,7 @@ void calcRMForwardProp_GRU_Layernorm(std::vector<float>& state, std::vector<floa
                                      LayernormWeights const& weights, NetworkScratch& scratch) {
     joinState(state, x, scratch);
     updateGate(x, weights, scratch);
-    gateLayer(x, weights, 1, weights.weightGRUReset, weights.biasGRUReset, scratch.reset);
+    gateLayer(x, weights.packed->gates[1], weights.biasGRUReset, scratch.reset);
     for (std::size_t i = 0; i < state.size(); ++i) x[i] *= scratch.reset[i];
 
     std::size_t const hidden = weights.weightNonLinear.size() - 1;

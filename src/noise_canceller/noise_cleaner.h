@@ -52,13 +52,12 @@ private:
     ModelEnvironment environment_;
 };
 
-class MaskControls;
+class SoundControls;
 
 // A noise cleaner with what its session may change and read beside its frames.
 struct NoiseModel {
     std::unique_ptr<NoiseCleaner> cleaner;
-    MaskControls& controls;  // of the cleaner
-    std::size_t delay;       // from sound in to sound out, in samples at the model's rate
+    SoundControls& controls;  // of the cleaner
 };
 
 // NoiseCleaner::create for noise-cancellation sessions.

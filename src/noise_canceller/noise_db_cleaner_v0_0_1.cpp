@@ -5,12 +5,11 @@
 namespace MORVA::NOISE_CANCELLER {
 
 NoiseDBCleaner_v0_0_1::NoiseDBCleaner_v0_0_1(ModelEnvironment model, std::size_t frameMs)
-    : NoiseCleaner(std::move(model)),
-      params_(*environment(), frameMs, generation(5)),
-      model_(params_, environment()->second, generation(5), Synthesis::FromRemoved) {}
+    : NoiseCleaner(std::move(model)), model_(*environment(), frameMs, Synthesis::FromRemoved) {}
 
 bool NoiseDBCleaner_v0_0_1::cleanNoise(std::vector<float>& frame) {
-    model_.process(frame, [](std::vector<float>&) {});
+    model_.process(frame,
+                   [this](float const* in, std::vector<float>& out) { model_.run(in, out); });
     frame.assign(1, model_.noiseLevelDb());
     return true;
 }

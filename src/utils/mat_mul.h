@@ -1,5 +1,5 @@
-// The affine product of a layer over the math library's BLAS: the plain form, for matrices that
-// nobody packed (sessions run on packed_matrix.h).
+// The affine product of a layer. Every layer of a model runs the form over a packed matrix; the
+// others, over the math library's BLAS, are here for callers who expect them.
 //
 // Shapes: W has `rows` x `cols` elements, row-major. x * W + b takes rows inputs and gives cols
 // outputs; W * x + b the reverse. Lengths of x and b are the caller's promise (checked once, where
@@ -11,10 +11,18 @@
 #include <vector>
 
 #include "utils/matrix.h"
+#include "utils/packed_matrix.h"
 
 namespace MORVA::UTIL_FUNCTIONS {
 
 using CONTAINERS::Matrix;
+
+// out = x * W + b, in the fixed order of sums that packed_matrix.h promises
+inline void matMulPlusB(std::vector<float> const& x, CONTAINERS::PackedMatrix const& W,
+                        std::vector<float> const& b, std::vector<float>& out) {
+    out.resize(W.cols());
+    W.affine(x.data(), b.data(), out.data());
+}
 
 // out = W * x + b
 void matMulPlusB(Matrix const& W, std::vector<float> const& x, Matrix const& b,

@@ -1,11 +1,9 @@
 #include "utils/vector_math.h"
 
-#include <mkl_vml.h>
-
 namespace MORVA::UTIL_FUNCTIONS {
 
 void multiply(float const* a, float const* b, float* out, std::size_t n) {
-    vsMul(static_cast<MKL_INT>(n), a, b, out);
+    for (std::size_t i = 0; i < n; ++i) out[i] = a[i] * b[i];
 }
 
 }  // namespace MORVA::UTIL_FUNCTIONS

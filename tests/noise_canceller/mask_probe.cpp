@@ -6,7 +6,6 @@
 #include <vector>
 
 #include "noise_canceller/mask_model.h"
-#include "noise_canceller/noise_cleaner_generations.h"
 #include "weights/model_environment.h"
 
 namespace {
@@ -20,10 +19,10 @@ struct Recording {
 };
 
 // Writes frames x bands values from `masks` on, `room` at most; the number of values written.
-template <class NetworkWeights>
-std::size_t networkOutput(CONTAINERS::ModelEnvironment const& environment, int number,
+template <int number>
+std::size_t networkOutput(CONTAINERS::ModelEnvironment const& environment,
                           Recording const& recording, float* masks, std::size_t room) {
-    typename MaskModel<NetworkWeights>::Params const params(*environment, 10, generation(number));
+    typename MaskModel<number>::Params const params(*environment, 10);
     SpectralCleaner spectral(params, params, environment->second, generation(number),
                              Synthesis::FromKept);
     std::vector<float> state(params.stateWidth());
@@ -51,8 +50,8 @@ extern "C" __attribute__((visibility("default"))) std::size_t mask_probe(
     environment->first->read(weight, size);
     bool const newest = environment->first->getReference<std::string>("Version") == "0.0.6";
     Recording const recording{samples, count};
-    return newest ? networkOutput<LayernormWeights>(environment, 6, recording, masks, room)
-                  : networkOutput<GatedWeights>(environment, 5, recording, masks, room);
+    return newest ? networkOutput<6>(environment, recording, masks, room)
+                  : networkOutput<5>(environment, recording, masks, room);
 } catch (...) {
     return 0;
 }
