@@ -105,15 +105,13 @@ def test_output_format_follows_the_ending(morva, model, tmp_path, source_format,
 
 
 @pytest.mark.parametrize(
-    ("rate", "name"),
-    [(4000, "NC_small_8k"), (8000, "NC_small_8k"), (11025, "NC_small_16k"), (16000, "NC_small_16k")]
-    + [(22050, "c6.xs.f.ca03f4"), (96000, "c6.xs.f.ca03f4")],
+    ("name", "rates"),
+    [("NC_small_8k", [4000, 8000]), ("NC_small_16k", [11025, 16000]), ("c6.xs.f.ca03f4", [22050, 96000])],
 )
-def test_the_shipped_model_follows_the_rate(morva, recording, tmp_path, rate, name):
-    source = recording(np.zeros(rate // 10), rate)
-    done = morva("denoise", source, "-o", tmp_path / "out.wav", "--models", SOURCE / "models")
-    assert name + ".mvw" in done.stderr
-    assert done.stdout == ""
+def test_the_shipped_model_follows_the_rate(morva, recording, tmp_path, name, rates):
+    for rate in rates:
+        source = recording(np.zeros(rate // 10), rate)
+        assert name + ".mvw" in morva("denoise", source, tmp_path / "o.wav", "--models", SOURCE / "models").stderr
 
 
 @pytest.mark.parametrize("text", ["MORVA_VOLUME_UP_v0_0_6 TRUE\nMORVA_VOLUME_UP_PERCENT_v0_0_6 100\n", ""])

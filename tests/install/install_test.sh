@@ -28,19 +28,15 @@ export PKG_CONFIG_PATH
 cc -std=c11 -D_POSIX_C_SOURCE=200809L "$source/examples/c/denoise.c" -o "$work/denoise" \
     $(pkg-config --cflags --libs morva)
 models=$(pkg-config --variable=modelsdir morva)
-LD_LIBRARY_PATH=$(echo "$prefix"/lib*)
-export LD_LIBRARY_PATH
+clean() { LD_LIBRARY_PATH=$(echo "$prefix"/lib*) "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" "$1"; }
 for size in 0 2 96002; do # no whole number of frames
-    head -c $size /dev/urandom | "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" 48000 >"$work/quiet.raw" 2>"$work/log"
-    [ "$(stat -c %s "$work/quiet.raw")" = $size ] || fail "C example: $(cat "$work/log")"
+    [ "$(head -c $size /dev/urandom | clean 48000 2>"$work/log" | wc -c)" = $size ] || fail "C example: $(cat "$work/log")"
 done
-! "$work/denoise" "$models/c6.xs.f.ca03f4.mvw" 22050 </dev/null 2>"$work/log" || fail "C example takes any rate"
-unset LD_LIBRARY_PATH
+! clean 22050 </dev/null 2>"$work/log" || fail "the C example takes any rate"
 
 echo "-- command line"
 "$prefix/bin/morva" --version | grep -qx "$(pkg-config --modversion morva)" || fail "versions differ"
 "$prefix/bin/morva" denoise -q "$source/examples/audio/noisy.flac" "$work/clean.wav" # finds its models
-[ -s "$work/clean.wav" ] || fail "no cleaned file"
 
 # Every option that the program has stands in the man page and is completed, and no other.
 # shellcheck source=/dev/null
