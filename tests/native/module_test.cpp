@@ -1,13 +1,10 @@
 // The host module without script: start-up, also when memory runs out, and entry points.
 #include <gtest/gtest.h>
 
-#include <atomic>
 #include <filesystem>
-#include <random>
 #include <sstream>
 #include <stdexcept>
 #include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
@@ -134,44 +131,6 @@ TEST_F(EntryPointsTest, Codes) {
     EXPECT_EQ(ValtoNCReset(cleaner), -3);
     EXPECT_EQ(ValtoVADReset(detector), 0);
     EXPECT_EQ(ValtoVADReset(detector), -3);
-}
-
-TEST_F(EntryPointsTest, AThreadCleansAsEverWhileOthersListAndSwitchModels) {
-    const auto clean = [](std::atomic<bool>& isSetUp) {
-        void* const cleaner = ValtoNCSetup(48000, 10);
-        void* const detector = ValtoVADSetup(48000, 10);
-        isSetUp = true;
-        std::vector<float> heard;
-        std::mt19937 random(7);
-        for (int n = 0; n < 300; ++n) {
-            std::vector<short> frame(480);
-            for (auto& sample : frame) sample = static_cast<short>(random() % 4096);
-            heard.push_back(ValtoVADProcess(detector, frame.data(), 480));
-            EXPECT_EQ(ValtoNCProcess(cleaner, frame.data(), 480, frame.data(), 480), 0);
-            heard.insert(heard.end(), frame.begin(), frame.end());
-        }
-        EXPECT_EQ(ValtoNCReset(cleaner), 0);
-        EXPECT_EQ(ValtoVADReset(detector), 0);
-        return heard;
-    };
-    std::atomic<bool> isSetUp{false};
-    const auto expected = clean(isSetUp);
-    isSetUp = false;
-    std::vector<float> heard;
-    std::atomic<bool> isDone{false};
-    std::jthread engine([&] {
-        heard = clean(isSetUp);
-        isDone = true;
-    });
-    while (!isSetUp) std::this_thread::yield();
-    do {
-        for (const auto& name : NcModelNames()) {
-            EXPECT_TRUE(ChooseNcModel(name));
-            ValtoNCReset(OpenNcSession(8000, 10, name).session);
-        }
-    } while (!isDone);
-    engine.join();
-    EXPECT_EQ(heard, expected);
 }
 
 // Fails the first, second, ... allocation of a start-up until it gets by without reaching it.
