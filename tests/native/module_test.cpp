@@ -1,7 +1,6 @@
 // The host module without script: start-up, also when memory runs out, and entry points.
 #include <gtest/gtest.h>
 
-#include <filesystem>
 #include <sstream>
 #include <stdexcept>
 #include <string>
@@ -45,13 +44,6 @@ TEST(TextTest, BothDirectionsAgreeOnlyWithinTheBasicPlane) {
     EXPECT_EQ(units, (std::wstring{L'a', wchar_t{0xD83D}, wchar_t{0xDE00}}));
     EXPECT_EQ(util::ToUTF8(std::wstring{wchar_t{0x1F600}}), "\xF0\x9F\x98\x80");
     EXPECT_THROW(util::ToUTF16("\xC3("), std::range_error);
-}
-
-TEST(ModuleBasePathTest, IsTheFolderOfThisProgram) {
-    const std::string path = util::ModuleBasePath();
-    EXPECT_TRUE(path.empty() || path.back() != '/');
-    const auto folder = std::filesystem::read_symlink("/proc/self/exe").parent_path();
-    EXPECT_TRUE(std::filesystem::equivalent(path.empty() ? "." : path, folder)) << path;
 }
 
 // The module as it was before its start-up.
