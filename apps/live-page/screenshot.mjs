@@ -4,8 +4,8 @@ import { execFileSync } from 'node:child_process';
 import { mkdtempSync, rmSync, writeFileSync } from 'node:fs';
 import os from 'node:os';
 import path from 'node:path';
+import { findChromium, openBrowser, openPage } from './browser.mjs';
 import { startServer } from './server.mjs';
-import { findChromium, openBrowser, openPage } from './test/harness.mjs';
 
 const [target] = process.argv.slice(2);
 if (!target) throw new Error('usage: node apps/live-page/screenshot.mjs FILE.png');

@@ -1,13 +1,9 @@
 // The host module without script: start-up, also when memory runs out, and entry points.
 #include <gtest/gtest.h>
 
-#include <atomic>
-#include <filesystem>
-#include <random>
 #include <sstream>
 #include <stdexcept>
 #include <string>
-#include <thread>
 #include <utility>
 #include <vector>
 
@@ -48,13 +44,6 @@ TEST(TextTest, BothDirectionsAgreeOnlyWithinTheBasicPlane) {
     EXPECT_EQ(units, (std::wstring{L'a', wchar_t{0xD83D}, wchar_t{0xDE00}}));
     EXPECT_EQ(util::ToUTF8(std::wstring{wchar_t{0x1F600}}), "\xF0\x9F\x98\x80");
     EXPECT_THROW(util::ToUTF16("\xC3("), std::range_error);
-}
-
-TEST(ModuleBasePathTest, IsTheFolderOfThisProgram) {
-    const std::string path = util::ModuleBasePath();
-    EXPECT_TRUE(path.empty() || path.back() != '/');
-    const auto folder = std::filesystem::read_symlink("/proc/self/exe").parent_path();
-    EXPECT_TRUE(std::filesystem::equivalent(path.empty() ? "." : path, folder)) << path;
 }
 
 // The module as it was before its start-up.
@@ -134,44 +123,6 @@ TEST_F(EntryPointsTest, Codes) {
     EXPECT_EQ(ValtoNCReset(cleaner), -3);
     EXPECT_EQ(ValtoVADReset(detector), 0);
     EXPECT_EQ(ValtoVADReset(detector), -3);
-}
-
-TEST_F(EntryPointsTest, AThreadCleansAsEverWhileOthersListAndSwitchModels) {
-    const auto clean = [](std::atomic<bool>& isSetUp) {
-        void* const cleaner = ValtoNCSetup(48000, 10);
-        void* const detector = ValtoVADSetup(48000, 10);
-        isSetUp = true;
-        std::vector<float> heard;
-        std::mt19937 random(7);
-        for (int n = 0; n < 300; ++n) {
-            std::vector<short> frame(480);
-            for (auto& sample : frame) sample = static_cast<short>(random() % 4096);
-            heard.push_back(ValtoVADProcess(detector, frame.data(), 480));
-            EXPECT_EQ(ValtoNCProcess(cleaner, frame.data(), 480, frame.data(), 480), 0);
-            heard.insert(heard.end(), frame.begin(), frame.end());
-        }
-        EXPECT_EQ(ValtoNCReset(cleaner), 0);
-        EXPECT_EQ(ValtoVADReset(detector), 0);
-        return heard;
-    };
-    std::atomic<bool> isSetUp{false};
-    const auto expected = clean(isSetUp);
-    isSetUp = false;
-    std::vector<float> heard;
-    std::atomic<bool> isDone{false};
-    std::jthread engine([&] {
-        heard = clean(isSetUp);
-        isDone = true;
-    });
-    while (!isSetUp) std::this_thread::yield();
-    do {
-        for (const auto& name : NcModelNames()) {
-            EXPECT_TRUE(ChooseNcModel(name));
-            ValtoNCReset(OpenNcSession(8000, 10, name).session);
-        }
-    } while (!isDone);
-    engine.join();
-    EXPECT_EQ(heard, expected);
 }
 
 // Fails the first, second, ... allocation of a start-up until it gets by without reaching it.

@@ -5,7 +5,8 @@ import { mkdtempSync, readFileSync, rmSync } from 'node:fs';
 import os from 'node:os';
 import path from 'node:path';
 import { after, before, test } from 'node:test';
-import { findChromium, openBrowser, openPage, serve } from './harness.mjs';
+import { findChromium, openBrowser, openPage } from '../browser.mjs';
+import { serve } from './harness.mjs';
 
 const underSanitizer = (process.env.LD_PRELOAD ?? '').includes('asan');
 const skip =

@@ -39,12 +39,6 @@ const endings = {
      probe.deliverForever(() => { if (++n === 30) process.exit(0); });`,
     '',
   ],
-  'two loads of the module in one environment': [
-    `const first = loadRaw(); const second = again(BINARY);
-     console.log(first !== second, first._initialize !== second._initialize);
-     second._getNcModels(() => first._getNcModels(() => console.log('both')));`,
-    'true true\nboth\n',
-  ],
   'sessions left open': [
     `const { initialize, NoiseCanceller, VoiceActivityDetector } = require(PACKAGE);
      initialize();

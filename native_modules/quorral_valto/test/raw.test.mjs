@@ -15,24 +15,19 @@ const REFUSALS = {
 
 test('arguments are counted and typed, and nothing happens before', async () => {
   assert.deepEqual(Reflect.ownKeys(raw), PROPERTIES);
-  const count = (expected, received) =>
-    `Invalid argument count: expected ${expected}; received ${received}`;
-  const cases = [
-    ...[[1], [undefined], [1, 2, 3]].map((args) => ['_initialize', args, count(0, args.length)]),
-    ...PROPERTIES.slice(1).flatMap((name) => [
-      [name, [], count(1, 0)],
-      [name, [NOTHING, NOTHING], count(1, 2)],
-    ]),
-    ...['_getNcModels', '_getVadModels'].flatMap((name) =>
-      [7, 'f', null, undefined, {}, [], Symbol('s'), 1n].map((other) => [
-        name,
-        [other],
-        'Invalid argument at index 0: type mismatch',
-      ]),
-    ),
-    ['setNcModel', NC_MODELS.slice(0, 1), REFUSALS.setNcModel],
-    ['setVadModel', VAD_MODELS, REFUSALS.setVadModel],
-  ];
+  const count = (expected, { length }) =>
+    `Invalid argument count: expected ${expected}; received ${length}`;
+  const mismatch = 'Invalid argument at index 0: type mismatch';
+  const cases = [[1], [undefined], [1, 2, 3]].map((args) => ['_initialize', args, count(0, args)]);
+  for (const name of PROPERTIES.slice(1)) {
+    for (const args of [[], [NOTHING, NOTHING]]) cases.push([name, args, count(1, args)]);
+    if (name in REFUSALS) continue;
+    for (const other of [7, 'f', null, undefined, {}, [], Symbol('s'), 1n]) {
+      cases.push([name, [other], mismatch]);
+    }
+  }
+  cases.push(['setNcModel', [NC_MODELS[0]], REFUSALS.setNcModel]);
+  cases.push(['setVadModel', [VAD_MODELS[0]], REFUSALS.setVadModel]);
   for (const [name, args, message] of cases) {
     assert.throws(() => raw[name](...args), { name: 'Error', message }, `${name} ${args.length}`);
   }
@@ -40,23 +35,14 @@ test('arguments are counted and typed, and nothing happens before', async () => 
   assert.deepEqual(await names(raw._getVadModels), [[]]);
 });
 
-test('setters take registered names, treat anything but a string as none', async () => {
+test('setters want exact names; callbacks come on later turns, microtasks between them', async () => {
   assert.equal(raw._initialize(), undefined);
-  for (const name of NC_MODELS) assert.equal(raw.setNcModel(name), undefined);
-  assert.equal(raw.setVadModel(VAD_MODELS[0]), undefined);
   for (const [setter, message] of Object.entries(REFUSALS)) {
-    for (const other of [null, undefined, 3, {}, NOTHING]) {
-      assert.equal(raw[setter](other), undefined);
-    }
+    for (const other of [null, undefined, 3, {}]) assert.equal(raw[setter](other), undefined);
     for (const unknown of ['', 'small', 'small_NC\0', 'SMALL_NC', 'default_VAD ']) {
       assert.throws(() => raw[setter](unknown), { message });
     }
   }
-  assert.throws(() => raw._initialize(), { message: /error code: -4$/ });
-  assert.deepEqual(await names(raw._getVadModels), [VAD_MODELS]);
-});
-
-test('callbacks come on later turns, in order, microtasks between them', async () => {
   const order = [];
   const answers = new Promise((resolve) => {
     assert.equal(

@@ -12,26 +12,26 @@ const OPTIONS = { sampleRate: 16000, frameMs: 10 };
 const KINDS = [NoiseCanceller, VoiceActivityDetector];
 
 test('options that are none', () => {
-  for (const Session of KINDS) {
-    assert.throws(() => new Session(OPTIONS), coded('ERR_VALTO_NOT_INITIALIZED'));
-  }
-  valto.initialize();
-  const wrong = {
-    ERR_VALTO_SAMPLE_RATE: [22050, 0, -8000, 192000, '16000', NaN, undefined, null, 16000n].map(
-      (sampleRate) => ({ ...OPTIONS, sampleRate }),
-    ),
-    ERR_VALTO_FRAME_DURATION: [15, 32, 25, 0, '10', undefined].map((frameMs) => {
-      return { ...OPTIONS, frameMs };
-    }),
-    ERR_VALTO_ARGUMENT: [undefined, null, 16000, 'x', { ...OPTIONS, model: 5 }],
-    ERR_VALTO_MODEL: [{ ...OPTIONS, model: 'no such' }],
-  };
-  for (const Session of KINDS) {
-    for (const [code, all] of Object.entries(wrong)) {
+  const expect = (code, all) => {
+    for (const Session of KINDS) {
       for (const options of all) assert.throws(() => new Session(options), coded(code));
     }
-    assert.throws(() => Session(OPTIONS), TypeError);
-  }
+  };
+  expect('ERR_VALTO_NOT_INITIALIZED', [OPTIONS]);
+  valto.initialize();
+  const rates = [22050, 0, -8000, 192000, '16000', NaN, undefined, null, 16000n];
+  const durations = [15, 32, 25, 0, '10', undefined];
+  expect(
+    'ERR_VALTO_SAMPLE_RATE',
+    rates.map((sampleRate) => ({ ...OPTIONS, sampleRate })),
+  );
+  expect(
+    'ERR_VALTO_FRAME_DURATION',
+    durations.map((frameMs) => ({ ...OPTIONS, frameMs })),
+  );
+  expect('ERR_VALTO_ARGUMENT', [undefined, null, 16000, 'x', { ...OPTIONS, model: 5 }]);
+  expect('ERR_VALTO_MODEL', [{ ...OPTIONS, model: 'no such' }]);
+  for (const Session of KINDS) assert.throws(() => Session(OPTIONS), TypeError);
 });
 
 test('every rate and duration, in place and apart', () => {

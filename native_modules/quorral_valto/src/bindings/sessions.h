@@ -12,8 +12,7 @@
 //   processVad(session, input): number          the voice score, negative on failure
 //   latency(session): number                    delay of a noise-cancellation session, in samples
 //   close(session): undefined                   repeated calls do nothing
-//   weightFiles: string[]                       names, in the order of the start-up codes -5, -6,
-//   ...
+//   weightFiles: string[]                       in the order of the start-up codes from -5 down
 // These are for the package's own loader, which checks arguments and words the errors.
 // Thread rule: the thread of the script environment; a session belongs to the environment that
 // opened it. A session that script has forgotten is closed on the turn of the event loop after its

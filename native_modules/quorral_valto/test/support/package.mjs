@@ -69,7 +69,6 @@ const BINARY = ${JSON.stringify(binaryFile)};
 const PACKAGE = ${JSON.stringify(packageDir)};
 const loadRaw = () => require(BINARY);
 const loadProbe = () => require(${JSON.stringify(probePath)});
-const again = (file) => { const m = { exports: {} }; process.dlopen(m, file); return m.exports; };
 const startWorker = (code, options = {}) => new Worker(PRELUDE + code, { eval: true, ...options });
 `;
 const WITH_WORKERS = `const PRELUDE = ${JSON.stringify(PRELUDE)} + 'const PRELUDE = "";';\n`;

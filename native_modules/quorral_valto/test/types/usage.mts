@@ -1,31 +1,24 @@
 // Compiled, not run: the types as an application uses them.
 import * as valto from 'quorral_valto';
 
-export async function start(): Promise<readonly string[]> {
-  try {
-    valto.initialize();
-  } catch (error) {
-    if (!(error instanceof valto.ValtoError)) throw error;
+export async function use(error: unknown, rate: valto.SampleRate): Promise<Int16Array> {
+  if (error instanceof valto.ValtoError) {
     const [code, native]: [valto.ValtoErrorCode, number | undefined] = [
       error.code,
       error.nativeCode,
     ];
     console.error(code, native);
   }
-  const names: string[] = await valto.getNcModels();
+  const names: string[] = [...(await valto.getNcModels()), ...(await valto.getVadModels())];
   valto.setNcModel(names[0] ?? null);
-  for (const name of await valto.getVadModels()) valto.setVadModel(name);
   valto.raw._getNcModels((list: string[]) => list.length);
-  return names;
-}
-
-export function clean(rate: valto.SampleRate, frame: Int16Array): Int16Array | number {
   const frameMs: valto.FrameDuration = valto.FRAME_DURATIONS[0] ?? 10;
   const options: valto.SessionOptions = { sampleRate: rate, frameMs, model: null };
   using canceller = new valto.NoiseCanceller(options);
   using detector = new valto.VoiceActivityDetector({ sampleRate: 48000, frameMs: 20 });
+  const frame: Int16Array = canceller.process(new Int16Array(canceller.frameSize));
   const score: number = detector.process(frame);
-  return score > 0.5 ? canceller.process(frame, new Int16Array(canceller.frameSize)) : score;
+  return canceller.process(frame, new Int16Array(score > 0.5 ? frame.length : 0));
 }
 
 // @ts-expect-error a rate that the engine does not take
