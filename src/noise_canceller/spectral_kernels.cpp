@@ -23,10 +23,10 @@ void calcRescaleAbsAndFiltr(std::vector<std::complex<float>> const& spectrum,
 
 void calcFeatures(std::vector<std::complex<float>> const& spectrum, std::vector<float>& out,
                   float gain, SpectralParams const& params) {
-    constexpr float featureOffset = 1000.0f;  // keeps the logarithm of silent bands finite
+    constexpr float kFeatureOffset = 1000.0f;  // keeps the logarithm of silent bands finite
     calcRescaleAbsAndFiltr(spectrum, out, gain, params);
     params.bands.compress(out);
-    for (float& value : out) value = std::log(value + featureOffset);
+    for (float& value : out) value = std::log(value + kFeatureOffset);
 }
 
 void applyClipFix(std::vector<float>& frame, SpectralParams const& params) {

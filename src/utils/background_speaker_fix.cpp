@@ -9,14 +9,14 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr unsigned long maxRunFrames = 100000;
+constexpr unsigned long kMaxRunFrames = 100000;
 
 void require(bool condition, char const* message) {
     if (!condition) raise(message, "src/utils/background_speaker_fix", "BackgroundSpeakerFix");
 }
 
 std::size_t checkedRunFrames(unsigned long count) {
-    require(count >= 1 && count <= maxRunFrames,
+    require(count >= 1 && count <= kMaxRunFrames,
             "The run frame count of the background speaker stage must be 1..100000");
     return count;
 }

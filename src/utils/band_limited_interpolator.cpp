@@ -8,19 +8,19 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr std::size_t usualCapacity = 4096;
-constexpr std::size_t vectorLanes = 8;
-constexpr double noDrift = 1e-15;
+constexpr std::size_t kUsualCapacity = 4096;
+constexpr std::size_t kVectorLanes = 8;
+constexpr double kNoDrift = 1e-15;
 
 // `taps` is a multiple of eight. Two sums hide the latency of the fused product.
 float dot(float const* x, float const* row, std::size_t taps) {
     __m256 even = _mm256_setzero_ps();
     __m256 odd = _mm256_setzero_ps();
     std::size_t i = 0;
-    for (; i + 2 * vectorLanes <= taps; i += 2 * vectorLanes) {
+    for (; i + 2 * kVectorLanes <= taps; i += 2 * kVectorLanes) {
         even = _mm256_fmadd_ps(_mm256_loadu_ps(x + i), _mm256_loadu_ps(row + i), even);
-        odd = _mm256_fmadd_ps(_mm256_loadu_ps(x + i + vectorLanes),
-                              _mm256_loadu_ps(row + i + vectorLanes), odd);
+        odd = _mm256_fmadd_ps(_mm256_loadu_ps(x + i + kVectorLanes),
+                              _mm256_loadu_ps(row + i + kVectorLanes), odd);
     }
     if (i < taps) even = _mm256_fmadd_ps(_mm256_loadu_ps(x + i), _mm256_loadu_ps(row + i), even);
     __m256 const sum = _mm256_add_ps(even, odd);
@@ -37,8 +37,8 @@ BandLimitedInterpolator::BandLimitedInterpolator(unsigned long inRate, unsigned 
       step_(1.0 / (static_cast<double>(outRate) / static_cast<double>(inRate))),
       margin_(
           InterpolationFilter::margin(static_cast<double>(outRate) / static_cast<double>(inRate))),
-      capacity_(std::max(2 * margin_ + 10, usualCapacity)),
-      window_(capacity_ + vectorLanes, 0.0f) {  // rows are padded to whole vectors
+      capacity_(std::max(2 * margin_ + 10, kUsualCapacity)),
+      window_(capacity_ + kVectorLanes, 0.0f) {  // rows are padded to whole vectors
     reset();
 }
 
@@ -94,9 +94,9 @@ float BandLimitedInterpolator::interpolate() {
     double const fraction = filter_->fraction(phase_);
     double const base = std::nearbyint(clock_ - fraction);
     double const drift = (clock_ - base) - fraction;
-    auto const side = drift > noDrift    ? InterpolationFilter::Drift::ahead
-                      : drift < -noDrift ? InterpolationFilter::Drift::behind
-                                         : InterpolationFilter::Drift::none;
+    auto const side = drift > kNoDrift    ? InterpolationFilter::Drift::ahead
+                      : drift < -kNoDrift ? InterpolationFilter::Drift::behind
+                                          : InterpolationFilter::Drift::none;
     float const* const x = window_.data() + static_cast<std::ptrdiff_t>(base) + filter_->firstTap();
     float const value = dot(x, filter_->row(phase_, side), filter_->taps());
     clock_ += step_;

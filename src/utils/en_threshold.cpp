@@ -8,8 +8,8 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr double openDivisor = 15.0;
-constexpr double closedDivisor = 80.0;
+constexpr double kOpenDivisor = 15.0;
+constexpr double kClosedDivisor = 80.0;
 
 std::size_t checked(std::size_t frames) {
     if (frames == 0) {
@@ -59,8 +59,8 @@ bool EnThreshold::applyEnThreshold(std::vector<float>& frame) {
 
 float EnThreshold::gate() const {
     if (activeCount == 0) return 1.0f;
-    double const high = activeEnergySum / (openDivisor * static_cast<double>(activeCount));
-    double const low = activeEnergySum / (closedDivisor * static_cast<double>(activeCount));
+    double const high = activeEnergySum / (kOpenDivisor * static_cast<double>(activeCount));
+    double const low = activeEnergySum / (kClosedDivisor * static_cast<double>(activeCount));
     if (frameEnergySum <= low) return 0.0f;
     if (frameEnergySum >= high) return 1.0f;
     double const position = (frameEnergySum - low) / (high - low);

@@ -14,13 +14,13 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr std::int64_t gridPoints = 4096;  // per zero crossing
-constexpr std::int64_t crossings = 17;     // to each side
-constexpr std::int64_t wing = gridPoints * crossings;
-constexpr double cutoff = 0.9;
-constexpr double kaiserBeta = 6.0;
-constexpr std::size_t vectorLanes = 8;
-constexpr std::size_t maxCoefficients = std::size_t{1} << 22;  // 16 MiB
+constexpr std::int64_t kGridPoints = 4096;  // per zero crossing
+constexpr std::int64_t kCrossings = 17;     // to each side
+constexpr std::int64_t kWing = kGridPoints * kCrossings;
+constexpr double kCutoff = 0.9;
+constexpr double kKaiserBeta = 6.0;
+constexpr std::size_t kVectorLanes = 8;
+constexpr std::size_t kMaxCoefficients = std::size_t{1} << 22;  // 16 MiB
 
 // The zeroth modified Bessel function, by its power series.
 double besselI0(double x) {
@@ -36,15 +36,15 @@ double besselI0(double x) {
 
 // One wing of the kernel on the grid.
 std::vector<float> makeKernel() {
-    std::vector<float> kernel(static_cast<std::size_t>(wing));
-    double const atCentre = besselI0(kaiserBeta);
-    for (std::int64_t i = 0; i < wing; ++i) {
+    std::vector<float> kernel(static_cast<std::size_t>(kWing));
+    double const atCentre = besselI0(kKaiserBeta);
+    for (std::int64_t i = 0; i < kWing; ++i) {
         double const angle =
-            std::numbers::pi * cutoff * static_cast<double>(i) / static_cast<double>(gridPoints);
+            std::numbers::pi * kCutoff * static_cast<double>(i) / static_cast<double>(kGridPoints);
         double const sinc = i == 0 ? 1.0 : std::sin(angle) / angle;
-        double const edge = static_cast<double>(i) / static_cast<double>(wing - 1);
-        double const window = besselI0(kaiserBeta * std::sqrt(1.0 - edge * edge)) / atCentre;
-        kernel[static_cast<std::size_t>(i)] = static_cast<float>(cutoff * sinc * window);
+        double const edge = static_cast<double>(i) / static_cast<double>(kWing - 1);
+        double const window = besselI0(kKaiserBeta * std::sqrt(1.0 - edge * edge)) / atCentre;
+        kernel[static_cast<std::size_t>(i)] = static_cast<float>(kCutoff * sinc * window);
     }
     return kernel;
 }
@@ -58,12 +58,12 @@ T& keepForEver(T value) {
 // The grid point of a tap; the right wing ends one point earlier than the left one.
 float coefficient(std::int64_t point, bool right) {
     static auto const& kernel = keepForEver(makeKernel());
-    std::int64_t const end = right ? wing - 1 : wing;
+    std::int64_t const end = right ? kWing - 1 : kWing;
     return point < end ? kernel[static_cast<std::size_t>(std::max<std::int64_t>(point, 0))] : 0.0f;
 }
 
 std::size_t roundUp(std::size_t n) {
-    return (n + vectorLanes - 1) / vectorLanes * vectorLanes;
+    return (n + kVectorLanes - 1) / kVectorLanes * kVectorLanes;
 }
 
 }  // namespace
@@ -86,9 +86,9 @@ InterpolationFilter::InterpolationFilter(std::uint64_t inStep, std::uint64_t out
     : inStep_(inStep),
       outStep_(outStep),
       scale_(std::min(1.0, static_cast<double>(outStep) / static_cast<double>(inStep))),
-      reach_(static_cast<std::ptrdiff_t>(crossings / scale_)),
+      reach_(static_cast<std::ptrdiff_t>(kCrossings / scale_)),
       taps_(roundUp(2 * static_cast<std::size_t>(reach_) + 2)) {
-    if (outStep > maxCoefficients / (kRowsPerPhase * taps_)) {
+    if (outStep > kMaxCoefficients / (kRowsPerPhase * taps_)) {
         raise("The resampler's filter for these rates would be too large",
               "src/utils/interpolation_filter", "InterpolationFilter");
     }
@@ -106,14 +106,14 @@ InterpolationFilter::InterpolationFilter(std::uint64_t inStep, std::uint64_t out
 }
 
 std::size_t InterpolationFilter::margin(double factor) {
-    return static_cast<std::size_t>((crossings + 1) * std::max(1.0, 1.0 / factor) + 10.0);
+    return static_cast<std::size_t>((kCrossings + 1) * std::max(1.0, 1.0 / factor) + 10.0);
 }
 
 // No drift: the position is the double nearest to the fraction, and distances grow by a double
 // step from tap to tap.
 InterpolationFilter::Row InterpolationFilter::exactRow(std::uint64_t phase) const {
     Row row(taps_, 0.0f);
-    double const step = static_cast<double>(gridPoints) * scale_;
+    double const step = static_cast<double>(kGridPoints) * scale_;
     double const fraction = static_cast<double>(phase) / static_cast<double>(outStep_);
     float const gain = static_cast<float>(scale_);
     double left = fraction * step;
@@ -135,7 +135,7 @@ InterpolationFilter::Row InterpolationFilter::driftedRow(std::uint64_t phase, Dr
     float const gain = static_cast<float>(scale_);
     std::uint64_t const denominator = std::max(inStep_, outStep_);
     auto const point = [&](std::uint64_t distance, bool towardsCentre) {
-        std::uint64_t const scaled = distance * static_cast<std::uint64_t>(gridPoints);
+        std::uint64_t const scaled = distance * static_cast<std::uint64_t>(kGridPoints);
         bool const hit = scaled % denominator == 0;
         return static_cast<std::int64_t>(scaled / denominator) - (hit && towardsCentre ? 1 : 0);
     };

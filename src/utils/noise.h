@@ -1,8 +1,8 @@
 // Running mean of the last K feature frames in one pass per frame, whatever K.
 //
-// Use: fillWithSilence(), or K times addNullFrameNoise(); then per frame addFrameNoiseRemoveBack(f) and exactly one
-// calculateNoise(). Frames are stored divided by K once folded in, so that removing one is a
-// subtraction. One thread at a time; a step of fixed frame length allocates nothing.
+// Use: fillWithSilence(), or K times addNullFrameNoise(); then per frame addFrameNoiseRemoveBack(f)
+// and exactly one calculateNoise(). Frames are stored divided by K once folded in, so that removing
+// one is a subtraction. One thread at a time; a step of fixed frame length allocates nothing.
 #pragma once
 
 #include <cstddef>

@@ -7,10 +7,10 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr float fullScale = 32768.0f;
-constexpr float pcmMin = -32768.0f;
-constexpr float pcmMax = 32767.0f;
-constexpr float unitLimit = 1e6f;
+constexpr float kFullScale = 32768.0f;
+constexpr float kPcmMin = -32768.0f;
+constexpr float kPcmMax = 32767.0f;
+constexpr float kUnitLimit = 1e6f;
 
 // Written with selections only, so that the loops below become vector code.
 constexpr float limited(float x, float low, float high) {
@@ -28,22 +28,22 @@ void pcm16ToFloat(std::span<short const> in, std::span<float> out) {
 void unitToPcm16Scale(std::span<float const> in, std::span<float> out) {
     for (std::size_t i = 0; i < in.size(); ++i) {
         bool const finite = std::abs(in[i]) <= std::numeric_limits<float>::max();
-        out[i] = finite ? limited(in[i], -unitLimit, unitLimit) * fullScale : 0.0f;
+        out[i] = finite ? limited(in[i], -kUnitLimit, kUnitLimit) * kFullScale : 0.0f;
     }
 }
 
 void clipToPcm16(std::span<float> samples) {
-    for (float& sample : samples) sample = limited(sample, pcmMin, pcmMax);
+    for (float& sample : samples) sample = limited(sample, kPcmMin, kPcmMax);
 }
 
 void floatToPcm16(std::span<float const> in, std::span<short> out) {
     for (std::size_t i = 0; i < in.size(); ++i) {
-        out[i] = static_cast<short>(static_cast<std::int32_t>(limited(in[i], pcmMin, pcmMax)));
+        out[i] = static_cast<short>(static_cast<std::int32_t>(limited(in[i], kPcmMin, kPcmMax)));
     }
 }
 
 void pcm16ScaleToUnit(std::span<float const> in, std::span<float> out) {
-    for (std::size_t i = 0; i < in.size(); ++i) out[i] = in[i] * (1.0f / fullScale);
+    for (std::size_t i = 0; i < in.size(); ++i) out[i] = in[i] * (1.0f / kFullScale);
 }
 
 }  // namespace MORVA::UTILS

@@ -7,8 +7,8 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr unsigned long largestRatio = 256;
-constexpr std::size_t usualBlock =
+constexpr unsigned long kLargestRatio = 256;
+constexpr std::size_t kUsualBlock =
     3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
 
 }  // namespace
@@ -16,13 +16,13 @@ constexpr std::size_t usualBlock =
 Resampler::Resampler(unsigned long inRate, unsigned long outRate)
     : inRate_(inRate), outRate_(outRate) {
     bool const near =
-        (inRate - 1) / largestRatio < outRate && (outRate - 1) / largestRatio < inRate;
+        (inRate - 1) / kLargestRatio < outRate && (outRate - 1) / kLargestRatio < inRate;
     if (inRate == 0 || outRate == 0 || !near) {
         raise("The resampler cannot convert between these rates", "src/utils/resampler",
               "Resampler");
     }
     converter_ = makeStreamConverter(inRate, outRate);
-    if (!isIdentity()) buffer_.reserve(static_cast<std::size_t>(extraRoom_) + usualBlock);
+    if (!isIdentity()) buffer_.reserve(static_cast<std::size_t>(extraRoom_) + kUsualBlock);
 }
 
 unsigned Resampler::resample(std::vector<float> const& in, std::vector<float>& out) {

@@ -14,7 +14,7 @@ public:
     int process(float const* in, int inCount, int& used, float* out, int room) override {
         // The library's interface lacks the const; it only reads its input.
         return resample_process(handle_.get(), factor_, const_cast<float*>(in), inCount,
-                                streamGoesOn, &used, out, room);
+                                kStreamGoesOn, &used, out, room);
     }
 
     void reset() override { handle_ = open(); }
@@ -25,11 +25,11 @@ private:
     };
     using Handle = std::unique_ptr<void, Close>;
 
-    static constexpr int highQuality = 1;
-    static constexpr int streamGoesOn = 0;
+    static constexpr int kHighQuality = 1;
+    static constexpr int kStreamGoesOn = 0;
 
     Handle open() const {
-        Handle handle(resample_open(highQuality, factor_, factor_));
+        Handle handle(resample_open(kHighQuality, factor_, factor_));
         if (!handle) {
             raise("The resampler's filter could not be opened", "src/utils/resampler", "Resampler");
         }

@@ -11,11 +11,12 @@ namespace MORVA::UTILS {
 // `square` maps a float sample to its square as a double.
 template <class Square>
 double sumOver(std::span<float const> samples, Square square) {
-    constexpr std::size_t lanes = 8;
-    std::array<double, lanes> partial{};
-    std::size_t const whole = samples.size() - samples.size() % lanes;
-    for (std::size_t i = 0; i < whole; i += lanes) {
-        for (std::size_t lane = 0; lane < lanes; ++lane) partial[lane] += square(samples[i + lane]);
+    constexpr std::size_t kLanes = 8;
+    std::array<double, kLanes> partial{};
+    std::size_t const whole = samples.size() - samples.size() % kLanes;
+    for (std::size_t i = 0; i < whole; i += kLanes) {
+        for (std::size_t lane = 0; lane < kLanes; ++lane)
+            partial[lane] += square(samples[i + lane]);
     }
     for (std::size_t i = whole; i < samples.size(); ++i) partial[i - whole] += square(samples[i]);
     return ((partial[0] + partial[4]) + (partial[1] + partial[5])) +

@@ -6,22 +6,22 @@
 namespace MORVA::UTIL_FUNCTIONS {
 namespace {
 
-constexpr double pi = std::numbers::pi;
+constexpr double kPi = std::numbers::pi;
 
 }  // namespace
 
 void generateHammingWindowVector(std::size_t n, float* out, std::size_t) {
-    double const step = 2.0 * pi / (static_cast<double>(n) - 1.0);
+    double const step = 2.0 * kPi / (static_cast<double>(n) - 1.0);
     for (std::size_t i = 0; i < n; ++i) {
         out[i] = static_cast<float>(0.54 - 0.46 * std::cos(static_cast<double>(i) * step));
     }
 }
 
 void generateVorbisWindowVector(std::size_t n, float* out, std::size_t) {
-    double const step = pi / static_cast<double>(n);
+    double const step = kPi / static_cast<double>(n);
     for (std::size_t i = 0; i < n; ++i) {
         double const s = std::sin(static_cast<double>(i) * step);
-        out[i] = static_cast<float>(std::sin(pi / 2.0 * s * s));
+        out[i] = static_cast<float>(std::sin(kPi / 2.0 * s * s));
     }
 }
 

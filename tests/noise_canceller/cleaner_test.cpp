@@ -11,6 +11,7 @@
 #include "support/allocation_counter.h"
 #include "support/error_bound.h"
 #include "support/random.h"
+#include "utils/exception.h"
 
 using namespace cleaner_test;
 using reference::Tunables;
@@ -18,6 +19,7 @@ using reference::Values;
 using test_support::ErrorBound;
 using test_support::NcShape;
 using test_support::Random;
+using test_support::randomNcWeight;
 using test_support::WeightWriter;
 
 namespace {
@@ -223,6 +225,18 @@ TEST(NoiseLevelReset, IsLikeNewAndAllocatesNothing) {
     auto const first = levels();
     EXPECT_EQ(test_support::countAllocations([&] { EXPECT_TRUE(cleaner->resetSession()); }), 0U);
     EXPECT_EQ(levels(), first);
+}
+
+TEST(Pipeline, RefusesFramesOfAnotherLength) {
+    for (int generation : {0, 6}) {
+        auto const model =
+            modelFrom(randomNcWeight({.version = generation == 0 ? "0.0.5" : "0.0.6"}));
+        for (std::size_t const length : {0, 159, 161, 4000}) {
+            std::vector<float> frame(length);
+            EXPECT_THROW(makeCleaner(generation, model, 10)->cleanNoise(frame),
+                         MORVA::UTILS::MORVA_Exception);
+        }
+    }
 }
 
 // What is left of the level when nothing is removed, 90 dB below a full-scale input.

@@ -238,27 +238,6 @@ TEST(VoiceActivity, CalibrationIsPiecewiseLinearAndLimited) {
     }
 }
 
-TEST(VoiceActivity, WatchdogCountsLowScores) {
-    // `lowShare` of every 20 frames are low; returns the frames at which the state is cleared.
-    auto const clearings = [](int lowOf20) {
-        StateWatchdog watchdog;
-        std::vector<int> at;
-        for (int i = 1; i <= 1000; ++i) {
-            if (watchdog.observe(i % 20 < lowOf20 ? -3.0F : 3.0F)) at.push_back(i);
-        }
-        return at;
-    };
-    EXPECT_EQ(clearings(20), (std::vector{300, 600, 900}));
-    EXPECT_TRUE(clearings(19).empty());  // 95 % are not more than 95 %
-    EXPECT_TRUE(clearings(0).empty());
-    StateWatchdog watchdog;
-    for (int i = 0; i < 600; ++i)
-        EXPECT_FALSE(watchdog.observe(1.0987F));  // a score just above 0.75
-    int until = 0;
-    while (!watchdog.observe(1.0985F)) ++until;  // just below
-    EXPECT_EQ(until, 190);
-}
-
 // Both keys of the environment, then the weight's own entry.
 TEST(VoiceActivity, WatchdogSwitch) {
     std::string const key = "MORVA_VAD_ENABLE_STATE_RESET_v0_0_1";

