@@ -6,6 +6,9 @@
 
 #include "bench_engine.h"
 #include "bench_sound.h"
+#include "kernels/fft.h"
+#include "kernels/packed_matrix.h"
+#include "kernels/vector_math.h"
 #include "noise_canceller/feature_context.h"
 #include "noise_canceller/hop_pipeline.h"
 #include "noise_canceller/mask_shaper.h"
@@ -15,10 +18,7 @@
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
 #include "noise_canceller/spectral_cleaner.h"
 #include "noise_canceller/spectral_kernels.h"
-#include "utils/fft.h"
-#include "utils/packed_matrix.h"
-#include "utils/resampler.h"
-#include "utils/vector_math.h"
+#include "resampler/resampler.h"
 #include "weights/model_environment.h"
 
 namespace {

@@ -12,8 +12,8 @@
 
 #include "bench_engine.h"
 #include "cpu_clock.h"
-#include "utils/interpolation_filter.h"
-#include "utils/packed_matrix.h"
+#include "kernels/packed_matrix.h"
+#include "resampler/interpolation_filter.h"
 #include "weights/weight.h"
 
 namespace morva_bench {

@@ -11,8 +11,8 @@
 #include <span>
 #include <vector>
 
+#include "resampler/resampler.h"
 #include "utils/cyclic_block_data.h"
-#include "utils/resampler.h"
 
 namespace MORVA::MORVA_SDK {
 

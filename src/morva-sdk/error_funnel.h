@@ -7,9 +7,9 @@
 #include <iostream>
 #include <string>
 
+#include "kernels/float_control.h"
 #include "morva-sdk/last_error.h"
 #include "utils/exception.h"
-#include "utils/float_control.h"
 
 namespace MORVA::MORVA_SDK {
 

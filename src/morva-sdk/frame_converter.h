@@ -4,7 +4,7 @@
 #include <cstddef>
 #include <vector>
 
-#include "utils/resampler.h"
+#include "resampler/resampler.h"
 
 namespace MORVA::MORVA_SDK {
 

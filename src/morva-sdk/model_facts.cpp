@@ -4,7 +4,7 @@
 #include <string>
 #include <vector>
 
-#include "utils/matrix.h"
+#include "kernels/matrix.h"
 #include "weights/value_types.h"
 
 namespace MORVA::MORVA_SDK {

@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "utils/pcm.h"
+#include "kernels/pcm.h"
 
 namespace MORVA::MORVA_SDK {
 

@@ -5,13 +5,13 @@
 #include <iostream>
 #include <mutex>
 
+#include "kernels/math_setup.h"
 #include "morva-sdk/cpu_support.h"
 #include "morva-sdk/error_funnel.h"
 #include "morva-sdk/handles.h"
 #include "morva-sdk/instance.h"
 #include "morva-sdk/last_error.h"
 #include "morva-sdk/vocabulary.h"
-#include "utils/math_setup.h"
 
 namespace {
 

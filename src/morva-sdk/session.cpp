@@ -4,11 +4,11 @@
 #include <string>
 #include <utility>
 
+#include "kernels/float_control.h"
+#include "kernels/pcm.h"
 #include "morva-sdk/error_funnel.h"
 #include "noise_canceller/noise_cleaner.h"
 #include "utils/exception.h"
-#include "utils/float_control.h"
-#include "utils/pcm.h"
 
 namespace MORVA::MORVA_SDK {
 namespace {

@@ -3,8 +3,8 @@
 #include <cmath>
 #include <utility>
 
+#include "kernels/pcm.h"
 #include "noise_canceller/sound_controls.h"
-#include "utils/pcm.h"
 
 namespace MORVA::MORVA_SDK {
 namespace {

@@ -7,7 +7,7 @@
 #include <vector>
 
 #include "noise_canceller/parameter_reader.h"
-#include "utils/background_speaker_fix.h"
+#include "statistics/background_speaker_fix.h"
 
 namespace MORVA::NOISE_CANCELLER {
 

@@ -11,8 +11,8 @@
 #include <memory>
 #include <vector>
 
-#include "utils/matrix.h"
-#include "utils/packed_matrix.h"
+#include "kernels/matrix.h"
+#include "kernels/packed_matrix.h"
 #include "weights/weight.h"
 
 namespace MORVA::NOISE_CANCELLER {

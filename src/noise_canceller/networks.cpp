@@ -6,8 +6,8 @@
 #include <array>
 #include <numeric>
 
-#include "utils/mat_mul.h"
-#include "utils/vector_rms.h"
+#include "kernels/mat_mul.h"
+#include "kernels/vector_math.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {

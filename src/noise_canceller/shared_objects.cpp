@@ -1,6 +1,6 @@
 #include "noise_canceller/shared_objects.h"
 
-#include "utils/windows.h"
+#include "kernels/windows.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {

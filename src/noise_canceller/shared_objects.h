@@ -7,8 +7,8 @@
 #include <memory>
 #include <vector>
 
+#include "kernels/fft.h"
 #include "noise_canceller/network_weights.h"
-#include "utils/fft.h"
 #include "weights/model_environment.h"
 
 namespace MORVA::NOISE_CANCELLER {

@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <cmath>
 
+#include "kernels/vector_math.h"
 #include "noise_canceller/spectral_kernels.h"
-#include "utils/vector_math.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {

@@ -20,9 +20,9 @@
 #include "noise_canceller/mask_shaper.h"
 #include "noise_canceller/shared_objects.h"
 #include "noise_canceller/spectral_params.h"
-#include "utils/en_threshold.h"
-#include "utils/mean_energy.h"
-#include "utils/noise.h"
+#include "statistics/en_threshold.h"
+#include "statistics/mean_energy.h"
+#include "statistics/noise.h"
 
 namespace MORVA::NOISE_CANCELLER {
 

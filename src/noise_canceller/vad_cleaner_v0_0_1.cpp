@@ -5,7 +5,7 @@
 #include <iostream>
 #include <utility>
 
-#include "utils/vector_math.h"
+#include "kernels/vector_math.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {

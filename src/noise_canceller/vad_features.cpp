@@ -4,7 +4,7 @@
 #include <cmath>
 #include <numeric>
 
-#include "utils/sum_of_squares.h"
+#include "kernels/vector_math.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {

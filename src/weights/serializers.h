@@ -6,7 +6,7 @@
 #include <sstream>
 #include <string>
 
-#include "utils/matrix.h"
+#include "kernels/matrix.h"
 #include "utils/path.h"
 #include "weights/bounded_reader.h"
 

@@ -6,7 +6,7 @@
 #include <string_view>
 #include <vector>
 
-#include "utils/matrix.h"
+#include "kernels/matrix.h"
 #include "weights/any_map.h"
 
 namespace MORVA::WEIGHTS {

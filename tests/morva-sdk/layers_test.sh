@@ -4,9 +4,9 @@
 set -eu
 cd "$1"
 words='morva-sdk/\(morva-sdk\|vocabulary\)\.h'
-above='weights/\|noise_canceller/\|morva-sdk/'
-for layer in utils weights noise_canceller; do
-    if [ "$layer" != utils ]; then above=${above#*|}; fi
+above='kernels/\|statistics/\|resampler/\|weights/\|noise_canceller/\|morva-sdk/'
+for layer in utils kernels statistics resampler weights noise_canceller; do
+    above=${above#"$layer/\\|"}
     if grep -rn "#include \"\($above\)" "$layer" | grep -v "\"$words\""; then
         echo "upward include in src/$layer"
         exit 1

@@ -11,7 +11,7 @@
 #include <variant>
 #include <vector>
 
-#include "utils/matrix.h"
+#include "kernels/matrix.h"
 #include "weights/weight.h"
 
 namespace reference {

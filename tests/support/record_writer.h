@@ -10,7 +10,7 @@
 #include <string_view>
 #include <vector>
 
-#include "utils/matrix.h"
+#include "kernels/matrix.h"
 
 namespace test_support {
 

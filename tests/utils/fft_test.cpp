@@ -1,11 +1,11 @@
-#include "utils/fft.h"
+#include "kernels/fft.h"
 
 #include <gtest/gtest.h>
 
+#include "kernels/math_setup.h"
 #include "support/aligned_copy.h"
 #include "support/error_bound.h"
 #include "support/random.h"
-#include "utils/math_setup.h"
 
 using MORVA::UTILS::FFT;
 using test_support::OffsetBuffer;

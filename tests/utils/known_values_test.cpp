@@ -5,14 +5,13 @@
 #include <cmath>
 #include <limits>
 
-#include "utils/background_speaker_fix.h"
-#include "utils/en_threshold.h"
+#include "kernels/vector_math.h"
+#include "kernels/windows.h"
+#include "statistics/background_speaker_fix.h"
+#include "statistics/en_threshold.h"
+#include "statistics/mean_energy.h"
+#include "statistics/noise.h"
 #include "utils/exception.h"
-#include "utils/mean_energy.h"
-#include "utils/noise.h"
-#include "utils/sum_of_squares.h"
-#include "utils/vector_rms.h"
-#include "utils/windows.h"
 
 using namespace MORVA::UTIL_FUNCTIONS;
 using namespace MORVA::UTILS;

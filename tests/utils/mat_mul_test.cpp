@@ -1,4 +1,4 @@
-#include "utils/mat_mul.h"
+#include "kernels/mat_mul.h"
 
 #include <gtest/gtest.h>
 #include <immintrin.h>
@@ -6,10 +6,10 @@
 #include <algorithm>
 #include <cmath>
 
+#include "kernels/math_setup.h"
 #include "support/aligned_copy.h"
 #include "support/error_bound.h"
 #include "support/random.h"
-#include "utils/math_setup.h"
 
 using MORVA::CONTAINERS::Matrix;
 using MORVA::CONTAINERS::PackedMatrix;

@@ -1,4 +1,4 @@
-#include "utils/pcm.h"
+#include "kernels/pcm.h"
 
 #include <gtest/gtest.h>
 
@@ -8,8 +8,8 @@
 #include <limits>
 #include <vector>
 
+#include "kernels/float_control.h"
 #include "support/random.h"
-#include "utils/float_control.h"
 
 using namespace MORVA::UTILS;
 using test_support::Random;

@@ -1,16 +1,16 @@
 // The converter and the block-exact resampler on it against the bare library: the same number of
 // samples at every call, the same samples to 90 dB and better, for white noise, which leaves no
 // part of the band untested.
-#include "utils/resampler.h"
+#include "resampler/resampler.h"
 
 #include <gtest/gtest.h>
 
 #include <cmath>
 
+#include "resampler/band_limited_interpolator.h"
 #include "support/error_bound.h"
 #include "support/library_resampler.h"
 #include "support/random.h"
-#include "utils/band_limited_interpolator.h"
 #include "utils/exception.h"
 
 using MORVA::UTILS::BandLimitedInterpolator;

@@ -8,8 +8,8 @@
 #include <memory>
 #include <vector>
 
-#include "utils/interpolation_filter.h"
-#include "utils/stream_converter.h"
+#include "resampler/interpolation_filter.h"
+#include "resampler/stream_converter.h"
 
 namespace MORVA::UTILS {
 

@@ -1,9 +1,9 @@
-#include "utils/mean_energy.h"
+#include "statistics/mean_energy.h"
 
 #include <algorithm>
 #include <iterator>
 
-#include "utils/energy_history.h"
+#include "statistics/energy_history.h"
 #include "utils/exception.h"
 
 namespace MORVA::UTILS {
@@ -11,7 +11,8 @@ namespace {
 
 std::size_t checked(std::size_t frames) {
     if (frames == 0) {
-        raise("The energy mean needs at least one frame", "src/utils/mean_energy", "MeanEnergy");
+        raise("The energy mean needs at least one frame", "src/statistics/mean_energy",
+              "MeanEnergy");
     }
     return frames;
 }

@@ -1,4 +1,4 @@
-#include "utils/resampler.h"
+#include "resampler/resampler.h"
 
 #include <algorithm>
 
@@ -18,7 +18,7 @@ Resampler::Resampler(unsigned long inRate, unsigned long outRate)
     bool const near =
         (inRate - 1) / kLargestRatio < outRate && (outRate - 1) / kLargestRatio < inRate;
     if (inRate == 0 || outRate == 0 || !near) {
-        raise("The resampler cannot convert between these rates", "src/utils/resampler",
+        raise("The resampler cannot convert between these rates", "src/resampler/resampler",
               "Resampler");
     }
     converter_ = makeStreamConverter(inRate, outRate);

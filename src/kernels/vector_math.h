@@ -1,14 +1,16 @@
-// Sums of squares in double, in a fixed order of eight interleaved partial sums: the same value
-// from run to run, and two vector registers wide.
+// Element-wise products and sums over raw arrays. No state; any thread.
 #pragma once
 
 #include <array>
 #include <cstddef>
 #include <span>
+#include <vector>
 
 namespace MORVA::UTILS {
 
-// `square` maps a float sample to its square as a double.
+// The sum of square(x) over the samples, in double and in a fixed order of eight interleaved
+// partial sums: the same value from run to run, and two vector registers wide. `square` maps a
+// sample to its square as a double.
 template <class Square>
 double sumOver(std::span<float const> samples, Square square) {
     constexpr std::size_t kLanes = 8;
@@ -29,3 +31,14 @@ inline double sumOfSquares(std::span<float const> samples) {
 }
 
 }  // namespace MORVA::UTILS
+
+namespace MORVA::UTIL_FUNCTIONS {
+
+// out_i = a_i b_i for i < n; `out` may be either operand.
+void multiply(float const* a, float const* b, float* out, std::size_t n);
+
+// sqrt(mean of the squares) + 1e-6: never 0, so that callers may divide by it. Squares are rounded
+// to float and summed in double. An empty vector gives NaN.
+float vectorRMS(std::vector<float> const& v);
+
+}  // namespace MORVA::UTIL_FUNCTIONS

@@ -1,4 +1,4 @@
-#include "utils/math_setup.h"
+#include "kernels/math_setup.h"
 
 #include <mkl_service.h>
 #include <mkl_types.h>

@@ -1,5 +1,5 @@
-#include "utils/band_limited_interpolator.h"
-#include "utils/stream_converter.h"
+#include "resampler/band_limited_interpolator.h"
+#include "resampler/stream_converter.h"
 
 namespace MORVA::UTILS {
 

@@ -1,4 +1,4 @@
-#include "utils/interpolation_filter.h"
+#include "resampler/interpolation_filter.h"
 
 #include <algorithm>
 #include <cmath>
@@ -90,7 +90,7 @@ InterpolationFilter::InterpolationFilter(std::uint64_t inStep, std::uint64_t out
       taps_(roundUp(2 * static_cast<std::size_t>(reach_) + 2)) {
     if (outStep > kMaxCoefficients / (kRowsPerPhase * taps_)) {
         raise("The resampler's filter for these rates would be too large",
-              "src/utils/interpolation_filter", "InterpolationFilter");
+              "src/resampler/interpolation_filter", "InterpolationFilter");
     }
     phases_.reserve(outStep);
     for (std::uint64_t phase = 0; phase < outStep; ++phase) {

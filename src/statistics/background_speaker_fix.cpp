@@ -1,10 +1,10 @@
-#include "utils/background_speaker_fix.h"
+#include "statistics/background_speaker_fix.h"
 
 #include <cmath>
 #include <iterator>
 
+#include "kernels/vector_math.h"
 #include "utils/exception.h"
-#include "utils/sum_of_squares.h"
 
 namespace MORVA::UTILS {
 namespace {
@@ -12,7 +12,7 @@ namespace {
 constexpr unsigned long kMaxRunFrames = 100000;
 
 void require(bool condition, char const* message) {
-    if (!condition) raise(message, "src/utils/background_speaker_fix", "BackgroundSpeakerFix");
+    if (!condition) raise(message, "src/statistics/background_speaker_fix", "BackgroundSpeakerFix");
 }
 
 std::size_t checkedRunFrames(unsigned long count) {

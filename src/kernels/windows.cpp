@@ -1,4 +1,4 @@
-#include "utils/windows.h"
+#include "kernels/windows.h"
 
 #include <cmath>
 #include <numbers>

@@ -9,8 +9,8 @@
 #include <memory>
 #include <vector>
 
+#include "resampler/stream_converter.h"
 #include "utils/non_copyable.h"
-#include "utils/stream_converter.h"
 
 namespace MORVA::UTILS {
 

@@ -1,4 +1,4 @@
-#include "utils/band_limited_interpolator.h"
+#include "resampler/band_limited_interpolator.h"
 
 #include <immintrin.h>
 

@@ -1,4 +1,4 @@
-#include "utils/noise.h"
+#include "statistics/noise.h"
 
 #include <algorithm>
 #include <iterator>
@@ -9,7 +9,7 @@ namespace MORVA::UTILS {
 
 Noise::Noise(std::size_t K, std::size_t valuesPerFrame)
     : windowFrames(K), frameSize(valuesPerFrame), mean(valuesPerFrame, 0.0f) {
-    if (K == 0) raise("The noise mean needs at least one frame", "src/utils/noise", "Noise");
+    if (K == 0) raise("The noise mean needs at least one frame", "src/statistics/noise", "Noise");
 }
 
 void Noise::fillWithSilence() {

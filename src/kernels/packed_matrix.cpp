@@ -1,11 +1,11 @@
-#include "utils/packed_matrix.h"
+#include "kernels/packed_matrix.h"
 
 #include <immintrin.h>
 
 #include <algorithm>
 #include <array>
 
-#include "utils/float_control.h"
+#include "kernels/float_control.h"
 
 namespace MORVA::CONTAINERS {
 namespace {

@@ -1,8 +1,8 @@
-#include "utils/en_threshold.h"
+#include "statistics/en_threshold.h"
 
 #include <algorithm>
 
-#include "utils/energy_history.h"
+#include "statistics/energy_history.h"
 #include "utils/exception.h"
 
 namespace MORVA::UTILS {
@@ -13,7 +13,8 @@ constexpr double kClosedDivisor = 80.0;
 
 std::size_t checked(std::size_t frames) {
     if (frames == 0) {
-        raise("The energy gate needs at least one frame", "src/utils/en_threshold", "EnThreshold");
+        raise("The energy gate needs at least one frame", "src/statistics/en_threshold",
+              "EnThreshold");
     }
     return frames;
 }

@@ -1,10 +1,12 @@
-#include "utils/vector_rms.h"
+#include "kernels/vector_math.h"
 
 #include <cmath>
 
-#include "utils/sum_of_squares.h"
-
 namespace MORVA::UTIL_FUNCTIONS {
+
+void multiply(float const* a, float const* b, float* out, std::size_t n) {
+    for (std::size_t i = 0; i < n; ++i) out[i] = a[i] * b[i];
+}
 
 float vectorRMS(std::vector<float> const& v) {
     double const sum = UTILS::sumOver(v, [](float x) { return static_cast<double>(x * x); });

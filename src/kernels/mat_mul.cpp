@@ -1,4 +1,4 @@
-#include "utils/mat_mul.h"
+#include "kernels/mat_mul.h"
 
 #include <mkl_cblas.h>
 

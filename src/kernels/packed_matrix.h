@@ -12,7 +12,7 @@
 #include <new>
 #include <vector>
 
-#include "utils/matrix.h"
+#include "kernels/matrix.h"
 
 namespace MORVA::CONTAINERS {
 

@@ -1,9 +1,9 @@
-#include "utils/fft.h"
+#include "kernels/fft.h"
 
 #include <mkl_dfti.h>
 #include <mkl_service.h>
 
-#include "utils/math_setup.h"
+#include "kernels/math_setup.h"
 #include "utils/non_copyable.h"
 
 namespace MORVA::UTILS {

@@ -5,7 +5,7 @@
 #include <list>
 #include <span>
 
-#include "utils/sum_of_squares.h"
+#include "kernels/vector_math.h"
 
 namespace MORVA::UTILS {
 

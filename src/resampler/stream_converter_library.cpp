@@ -1,7 +1,7 @@
 #include <libresample.h>
 
+#include "resampler/stream_converter.h"
 #include "utils/exception.h"
-#include "utils/stream_converter.h"
 
 namespace MORVA::UTILS {
 namespace {
@@ -31,7 +31,8 @@ private:
     Handle open() const {
         Handle handle(resample_open(kHighQuality, factor_, factor_));
         if (!handle) {
-            raise("The resampler's filter could not be opened", "src/utils/resampler", "Resampler");
+            raise("The resampler's filter could not be opened", "src/resampler/resampler",
+                  "Resampler");
         }
         return handle;
     }

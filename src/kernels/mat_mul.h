@@ -10,8 +10,8 @@
 #include <cstddef>
 #include <vector>
 
-#include "utils/matrix.h"
-#include "utils/packed_matrix.h"
+#include "kernels/matrix.h"
+#include "kernels/packed_matrix.h"
 
 namespace MORVA::UTIL_FUNCTIONS {
 

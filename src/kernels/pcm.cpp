@@ -1,4 +1,4 @@
-#include "utils/pcm.h"
+#include "kernels/pcm.h"
 
 #include <cmath>
 #include <cstdint>
