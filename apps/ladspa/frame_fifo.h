@@ -1,5 +1,5 @@
 // Fits host blocks of any length to frames of a fixed one: sample in, sample out, always exactly
-// one frame later. No allocation after construction. One thread at a time.
+// one frame later. No allocation after construction.
 #pragma once
 
 #include <algorithm>

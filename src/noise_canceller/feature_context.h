@@ -1,4 +1,4 @@
-// The last P feature frames, oldest first, as one standardised network input. One thread at a time.
+// The last P feature frames, oldest first, as one standardised network input.
 #pragma once
 
 #include <cstddef>

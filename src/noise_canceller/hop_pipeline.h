@@ -1,7 +1,6 @@
 // Fits the caller's frames to the model's hops: queues samples, calls the model once per hop on a
 // frame of two hops, overlap-adds what it returns, and hands back frames of the caller's length at
-// a fixed delay. All lengths in samples at the model's rate unless a name says Ms. One thread at a
-// time.
+// a fixed delay. All lengths in samples at the model's rate unless a name says Ms.
 #pragma once
 
 #include <cstddef>

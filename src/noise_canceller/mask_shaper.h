@@ -1,5 +1,5 @@
 // Turns the network's compressed mask into the full mask that the spectrum is multiplied by:
-// expansion to bins, squaring, smoothing over time, expansion of low values. One thread at a time.
+// expansion to bins, squaring, smoothing over time, expansion of low values.
 #pragma once
 
 #include <vector>

@@ -1,8 +1,11 @@
 // The model interface that a session holds, and the choice of a model for a new session.
 //
 // A cleaner is bound to one registered model: it keeps the model's weight alive, reads it only, and
-// owns all the state of one stream. Cleaners of one model may run on different threads at the same
-// time.
+// owns all the state of one stream.
+//
+// Threads, here and in everything that a session is made of: an object is used by one thread at a
+// time, different ones by different threads at the same time; what several share (weights, windows,
+// transforms, filters) is only read. Functions that any thread may call meanwhile say [any thread].
 #pragma once
 
 #include <cstddef>

@@ -1,6 +1,6 @@
 // Smoothed level of what a cleaner removes: the mean square of input minus output over a hop,
 // smoothed by 0.9 per hop, in decibels re one squared unit of the 16-bit sample scale (-60 for
-// nothing). One thread at a time.
+// nothing).
 #pragma once
 
 #include "noise_canceller/hop_pipeline.h"

@@ -2,13 +2,12 @@
 // network runs between the two halves and belongs to the model class:
 //
 //   analyse(in, x)  window, FFT, level reference, band powers, log features, context
-//   ... network: x from features to compressed mask ...
+//   ... network: x from features to compressed mask ..
 //   applyMask(x)    mask shaping, energy gate, inverse FFT, output gain: then there is a frame()
-//   ... stages that work on the cleaned frame ...
+//   ... stages that work on the cleaned frame ..
 //   finish(out)     synthesis window, peak limiter
 //
-// Samples are on the 16-bit scale. One thread at a time; windows and transform are shared and only
-// read.
+// Samples are on the 16-bit scale. Windows and transform are shared and only read.
 #pragma once
 
 #include <complex>

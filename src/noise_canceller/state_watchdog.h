@@ -1,6 +1,6 @@
 // Decides when a recurrent state has listened to non-speech for so long that it should start
 // afresh: more than 95 % of the last 200 scores were low, and the last restart is at least 300
-// frames ago. One thread at a time.
+// frames ago.
 #pragma once
 
 #include <array>

@@ -1,6 +1,6 @@
 // Voice activity: one speech score per session frame. Level normalisation, Hamming-windowed
 // spectrum of the newest FrameLength samples, pooled log energies, five frames of context, a small
-// gated network, and a calibration of its output. One thread at a time.
+// gated network, and a calibration of its output.
 #pragma once
 
 #include <vector>

@@ -1,5 +1,5 @@
 // Spectral features of the voice-activity model: log energies of pooled bins, and the level tracker
-// that brings every frame to one loudness before they are taken. One thread at a time.
+// that brings every frame to one loudness before they are taken.
 #pragma once
 
 #include <cstddef>

@@ -1,7 +1,7 @@
 // Streaming sample-rate conversion by band-limited interpolation: the built-in filter.
 //
 // Delivers, call by call, as many samples at the same positions as the library that it stands in
-// for. One thread at a time; process() allocates nothing.
+// for. A call of process() allocates nothing.
 #pragma once
 
 #include <cstddef>

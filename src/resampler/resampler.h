@@ -1,8 +1,8 @@
 // Sample-rate conversion of one mono stream, block by block, with exact block lengths.
 //
 // Rates are ratios only: two block lengths of the same duration serve as well as two rates. The
-// first block is shifted right by leadingZeros() samples, the filter's delay. One thread at a time;
-// one resampler per stream and direction. No allocation after the first block of the largest size.
+// first block is shifted right by leadingZeros() samples, the filter's delay. No allocation after
+// the first block of the largest size.
 #pragma once
 
 #include <cstddef>
@@ -25,7 +25,8 @@ public:
     // `out` is a copy). `in` and `out` may be the same vector.
     unsigned resample(std::vector<float> const& in, std::vector<float>& out);
 
-    // Plain streaming conversion without padding; returns the number of samples written.
+    // Plain streaming conversion without padding, for callers that expect it; the engine converts
+    // blocks. Returns the number of samples written.
     int resample(float* in, int inCount, float* out, int outCapacity);
 
     // Back to the state of a new object; always true. Throws when the filter cannot be built.

@@ -1,7 +1,7 @@
 // The filter behind Resampler: an endless stream at one rate to the same stream at another.
 //
 // Which one is built in is a build option (MORVA_RESAMPLER): each choice comes as a source file
-// that defines makeStreamConverter. One thread at a time.
+// that defines makeStreamConverter.
 #pragma once
 
 #include <memory>

@@ -2,7 +2,7 @@
 //
 // Works on time frames before the synthesis window, samples on the 16-bit scale. The distance to a
 // slowly adapting reference energy is mapped linearly, in decibels, to a cut: none up to the cut
-// start, -60 at the cut end, growing on beyond it. One thread at a time; a frame allocates nothing.
+// start, -60 at the cut end, growing on beyond it. A frame allocates nothing.
 #pragma once
 
 #include <cstddef>

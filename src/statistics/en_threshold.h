@@ -1,8 +1,7 @@
 // Energy gate: closes when the recent frames are quiet against the recent active frames.
 //
 // Energies are mean squares of samples on the 16-bit scale. Fully open from 1/15 of the mean active
-// energy upwards, fully closed up to 1/80, a squared ramp between. One thread at a time; a frame
-// allocates nothing.
+// energy upwards, fully closed up to 1/80, a squared ramp between. A frame allocates nothing.
 #pragma once
 
 #include <cstddef>

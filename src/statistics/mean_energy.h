@@ -1,7 +1,6 @@
 // Running mean of the energy of active frames: what the level normalisation divides by.
 //
-// Energies are mean squares of samples on the 16-bit scale. One thread at a time; a frame allocates
-// nothing.
+// Energies are mean squares of samples on the 16-bit scale. A frame allocates nothing.
 #pragma once
 
 #include <cstddef>

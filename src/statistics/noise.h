@@ -2,7 +2,7 @@
 //
 // Use: fillWithSilence(), or K times addNullFrameNoise(); then per frame addFrameNoiseRemoveBack(f)
 // and exactly one calculateNoise(). Frames are stored divided by K once folded in, so that removing
-// one is a subtraction. One thread at a time; a step of fixed frame length allocates nothing.
+// one is a subtraction. A step of fixed frame length allocates nothing.
 #pragma once
 
 #include <cstddef>

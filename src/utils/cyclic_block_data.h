@@ -1,7 +1,7 @@
 // Sample queue between a session's frames and a model's overlapping analysis blocks.
 //
 // Storage is one linear array: the unread samples always lie contiguous at readPosition(). Nothing
-// is allocated after construction. One thread at a time.
+// is allocated after construction.
 #pragma once
 
 #include <cstddef>
