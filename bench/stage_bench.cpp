@@ -110,7 +110,7 @@ void analysis(benchmark::State& state) {
                                              NOISE_CANCELLER::generation(6),
                                              NOISE_CANCELLER::Synthesis::FromKept);
     std::vector<float> x;
-    for (auto _ : state) cleaner.analyse(full.sound.data(), x);
+    for (auto _ : state) cleaner.analyse({full.sound.data(), full.params->frameLength}, x);
 }
 BENCHMARK(analysis);
 
@@ -146,8 +146,8 @@ void overlapAdd(benchmark::State& state) {
     NOISE_CANCELLER::HopPipeline pipeline(full.params->pipelineShape());
     std::vector<float> frame(full.params->step, 100.0f);
     for (auto _ : state) {
-        pipeline.process(frame, [&](float const* in, std::vector<float>& out) {
-            out.assign(in, in + full.params->frameLength);
+        pipeline.process(frame, [&](std::span<float const> in, std::vector<float>& out) {
+            out.assign(in.begin(), in.end());
         });
         benchmark::DoNotOptimize(frame.data());
     }
@@ -161,7 +161,7 @@ void synthesis(benchmark::State& state) {
                                              NOISE_CANCELLER::Synthesis::FromKept);
     std::vector<float> x;
     std::vector<float> out;
-    cleaner.analyse(full.sound.data(), x);
+    cleaner.analyse({full.sound.data(), full.params->frameLength}, x);
     std::vector<float> const mask(full.params->bands.bands(), 1.0f);
     for (auto _ : state) {
         cleaner.applyMask(mask, 0.0f);

@@ -34,16 +34,16 @@ public:
     // Empties both queues and fills them with their initial silence.
     void reset();
 
-    // `model(float const* in, std::vector<float>& out)` reads two hops and leaves two windowed
-    // hops. `observe(CompletedHop)` is called after each of them. `frame` holds one session frame;
-    // it is replaced by as many delayed output samples. Throws MORVA_Exception for a frame of
-    // another length and for a pair of frame lengths that is not supported.
+    // `model(std::span<float const> in, std::vector<float>& out)` reads two hops and leaves two
+    // windowed hops. `observe(CompletedHop)` is called after each of them. `frame` holds one
+    // session frame; it is replaced by as many delayed output samples. Throws MORVA_Exception for a
+    // frame of another length and for a pair of frame lengths that is not supported.
     template <class Model, class Observe>
     void process(std::vector<float>& frame, Model&& model, Observe&& observe) {
         if (frame.size() != sessionFrame() || delay_ == 0) refuseFrame(frame.size());
         input_.push_back(frame.data(), frame.size());
         while (input_.unread() >= 2 * shape_.hop) {
-            model(input_.readPosition(), modelFrame_);
+            model(std::span<float const>(input_.readPosition(), 2 * shape_.hop), modelFrame_);
             overlapAdd();
             observe(CompletedHop{{input_.readPosition(), shape_.hop}, completedOutput()});
             input_.start += shape_.hop;

@@ -6,6 +6,7 @@
 #include <algorithm>
 #include <atomic>
 #include <cmath>
+#include <span>
 #include <vector>
 
 #include "noise_canceller/feature_statistics.h"
@@ -78,7 +79,7 @@ public:
     }
 
     // One model frame: FrameLength samples in, as many windowed, cleaned samples out.
-    bool run(float const* in, std::vector<float>& out) {
+    bool run(std::span<float const> in, std::vector<float>& out) {
         spectral_.analyse(in, x_);
         if (silentInput_) {
             // As long as the output layer; the state is left alone.
@@ -90,6 +91,11 @@ public:
         stage_(spectral_.frame());
         spectral_.finish(out);
         return true;
+    }
+
+    // The same for a caller who vouches for the length.
+    bool run(float const* in, std::vector<float>& out) {
+        return run({in, params_.frameLength}, out);
     }
 
     void setMaskFloor(float floor) override { maskFloor_.store(floor, std::memory_order_relaxed); }

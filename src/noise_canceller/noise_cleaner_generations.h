@@ -18,8 +18,7 @@ public:
         : NoiseCleaner(std::move(model)), model_(*environment(), frameMs) {}
 
     bool cleanNoise(std::vector<float>& frame) override {
-        model_.process(frame,
-                       [this](float const* in, std::vector<float>& out) { mainCleaner(in, out); });
+        model_.process(frame, [this](auto in, auto& out) { mainCleaner(in.data(), out); });
         return true;
     }
 

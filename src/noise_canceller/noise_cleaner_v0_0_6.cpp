@@ -9,8 +9,7 @@ NoiseCleaner_v0_0_6::NoiseCleaner_v0_0_6(ModelEnvironment model, std::size_t fra
     : NoiseCleaner(std::move(model)), model_(*environment(), frameMs) {}
 
 bool NoiseCleaner_v0_0_6::cleanNoise(std::vector<float>& frame) {
-    model_.process(frame,
-                   [this](float const* in, std::vector<float>& out) { mainCleaner(in, out); });
+    model_.process(frame, [this](auto in, auto& out) { mainCleaner(in.data(), out); });
     return true;
 }
 

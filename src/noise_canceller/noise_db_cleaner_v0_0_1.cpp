@@ -8,8 +8,7 @@ NoiseDBCleaner_v0_0_1::NoiseDBCleaner_v0_0_1(ModelEnvironment model, std::size_t
     : NoiseCleaner(std::move(model)), model_(*environment(), frameMs, Synthesis::FromRemoved) {}
 
 bool NoiseDBCleaner_v0_0_1::cleanNoise(std::vector<float>& frame) {
-    model_.process(frame,
-                   [this](float const* in, std::vector<float>& out) { model_.run(in, out); });
+    model_.process(frame, [this](auto in, auto& out) { model_.run(in, out); });
     frame.assign(1, model_.noiseLevelDb());
     return true;
 }

@@ -81,14 +81,14 @@ void SpectralCleaner::buildStatistics() {
     }
 }
 
-float SpectralCleaner::levelGain(float const* in) {
+float SpectralCleaner::levelGain(std::span<float const> in) {
     if (!meanEnergy_) return 1.0f;
-    float const energy = meanEnergy_->setCurrentData(in, params_.frameLength);
+    float const energy = meanEnergy_->setCurrentData(in.data(), in.size());
     return energy > kSilentEnergy ? params_.rescaleRefAmpl / std::sqrt(energy) : 1.0f;
 }
 
-void SpectralCleaner::analyse(float const* in, std::vector<float>& x) {
-    UTIL_FUNCTIONS::multiply(in, analysis_->data(), windowed_.data(), windowed_.size());
+void SpectralCleaner::analyse(std::span<float const> in, std::vector<float>& x) {
+    UTIL_FUNCTIONS::multiply(in.data(), analysis_->data(), windowed_.data(), windowed_.size());
     if (gate_) gate_->setCurrentData(windowed_);
     transform_->computeForward(windowed_, spectrum_);
     NOISE_CLEANER_FUNCTIONS::calcFeatures(spectrum_, features_, levelGain(in), params_);

@@ -12,6 +12,7 @@
 
 #include <complex>
 #include <optional>
+#include <span>
 #include <vector>
 
 #include "noise_canceller/feature_context.h"
@@ -41,7 +42,7 @@ public:
     void reset();
 
     // `in` holds FrameLength samples; `x` receives the network's input.
-    void analyse(float const* in, std::vector<float>& x);
+    void analyse(std::span<float const> in, std::vector<float>& x);
     // `mask` holds one value per band. No bin is multiplied by less than `floor`, which the mask
     // that the next frame is smoothed against does not see.
     void applyMask(std::vector<float> const& mask, float floor);
@@ -55,7 +56,7 @@ public:
 private:
     void buildStatistics();
     void synthesise(std::vector<float> const& mask, float floor);
-    float levelGain(float const* in);
+    float levelGain(std::span<float const> in);
 
     SpectralParams const& params_;
     FeatureStatistics const& statistics_;
