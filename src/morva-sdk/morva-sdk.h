@@ -21,8 +21,9 @@
  *   modes and traps of the thread change no result.
  *
  * Processor
- *   The engine needs an x86-64 processor with AVX2, FMA and BMI2; on any other Morva_SDK_GlobalInit
- *   says so on standard error and returns -3, and nothing else can be called with success.
+ *   The engine needs an x86-64 processor of level v3 (AVX2, FMA, F16C, BMI, LZCNT, MOVBE); on any
+ *   other Morva_SDK_GlobalInit says so on standard error and returns -3, and nothing else can be
+ *   called with success.
  *
  * Errors
  *   No exception leaves this interface. Functions that return int answer with
