@@ -8,6 +8,7 @@
 
 #include "harness.h"
 #include "support/reference_reader.h"
+#include "support/temp_dir.h"
 #include "weights/value_types.h"
 #include "weights/weight.h"
 
@@ -135,8 +136,14 @@ void runValues(void* session, float (*frame)(void*, short const*, unsigned), uns
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size) {
-    fuzz::Engine const engine;
     std::string const bytes(reinterpret_cast<char const*>(data), size);
+    static test_support::TempDir const folder;
+    MORVA::WEIGHTS::Weight weight;
+    MORVA::UTILS::Path const file(folder.write("weight.mvw", bytes).wstring().c_str());
+    bool const isRead = size % 8 == 0 ? weight.read(file) : weight.read(bytes.data(), size);
+    auto const expected = test_support::ReferenceReader(bytes).read();
+    fuzz::require(isRead && test_support::writeBack(weight.values()) == expected, "read in full");
+    fuzz::Engine const engine;
     if (fuzz::Engine::setModel(bytes, "model") != 0) return 0;
     fuzz::run(8000, 8000, 40, "model");
     fuzz::run(48000, 16000, 10, "model");

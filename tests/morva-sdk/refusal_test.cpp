@@ -4,6 +4,8 @@
 // parameters.)
 #include <gtest/gtest.h>
 
+#include <sstream>
+
 #include "engine.h"
 #include "weights/value_types.h"
 #include "weights/weight.h"
@@ -129,9 +131,9 @@ TEST(RefusedParameters, OfTheBackgroundSpeakerStage) {
     test_support::TempDir dir;
     Engine engine(dir.path().wstring().c_str());
     dir.write("a.mvw", randomNcWeight({}));
-    auto const expectOpen = [&](bool opens, std::string const& key,
-                                std::vector<std::string> const& values) {
-        for (std::string const& value : values) {
+    auto const expectOpen = [&](bool opens, std::string const& key, std::string const& values) {
+        std::istringstream words(values);
+        for (std::string value; words >> value;) {
             auto const name = key + value;
             dir.write(name + ".cfg", "WEIGHT a.mvw\nMORVA_BACKGROUND_SPEAKER_FIX_" + key +
                                          "_v0_0_6 " + value + "\n");
@@ -140,11 +142,10 @@ TEST(RefusedParameters, OfTheBackgroundSpeakerStage) {
             EXPECT_EQ(seen.result != nullptr, opens) << name;
         }
     };
-    expectOpen(false, "RUN_FRAME_COUNT",
-               {"0", "0.9", "-1", "100001", "nan", "inf", "1e30", "word"});
-    expectOpen(true, "RUN_FRAME_COUNT", {"1", "1.9", "100000"});
-    expectOpen(false, "UTTERANCE_LEN", {"0", "-1", "nan"});
-    expectOpen(false, "CUT_START_DB", {"15"});
-    expectOpen(false, "CUT_END_DB", {"10"});
-    expectOpen(true, "CUT_END_DB", {"9"});
+    expectOpen(false, "RUN_FRAME_COUNT", "0 0.9 -1 100001 nan inf 1e30 word");
+    expectOpen(true, "RUN_FRAME_COUNT", "1 1.9 100000");
+    expectOpen(false, "UTTERANCE_LEN", "0 -1 nan");
+    expectOpen(false, "CUT_START_DB", "15");
+    expectOpen(false, "CUT_END_DB", "10");
+    expectOpen(true, "CUT_END_DB", "9");
 }

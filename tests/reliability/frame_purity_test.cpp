@@ -123,8 +123,8 @@ std::function<void()> framesOf(Kind kind, std::string const& model, int hz, int 
         auto sound = voice(hz, 0.01, 1, 0.3F);
         for (float& s : sound) {
             s *= gain;
-            if (std::is_same_v<Sample, short>) s = 32767.0F * std::clamp(s, -1.0F, 1.0F);
-            if (std::is_same_v<Sample, short> && std::isnan(s)) s = 32767.0F;
+            if (std::is_same_v<Sample, float>) continue;
+            s = 32767.0F * (std::isnan(s) ? 1.0F : std::clamp(s, -1.0F, 1.0F));
         }
         frames.emplace_back(sound.begin(), sound.end());
     }
