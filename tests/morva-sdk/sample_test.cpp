@@ -139,4 +139,6 @@ TEST_F(Samples, TheCallersRoundingChangesNoBit) {
             EXPECT_TRUE(got == wanted) << hz << " Hz, mode " << mode;
         }
     }
+    volatile float const tiny = kTiny;
+    EXPECT_GT(tiny * 2.0F, 0.0F);
 }

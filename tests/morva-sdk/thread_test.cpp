@@ -108,7 +108,7 @@ TEST(Threads, OneOfTwoClosesASession) {
     Engine::addIdentity("id", 16000, 20);
     auto* const session = openNc(16000, 16000, 10, "id");
     std::array<int, 2> codes = {7, 7};
-    observe([&] {
+    auto const seen = observe([&] {
         std::unique_lock lock(MORVA::MORVA_SDK::MorvaInstanceT::mutexForInputs_);
         std::thread first([&] { codes[0] = Morva_NC_CloseSession(session); });
         std::thread second([&] { codes[1] = Morva_NC_CloseSession(session); });
@@ -116,7 +116,8 @@ TEST(Threads, OneOfTwoClosesASession) {
         lock.unlock();
         first.join();
         second.join();
-        return 0;
+        return codes;
     });
-    EXPECT_THAT(codes, ::testing::UnorderedElementsAre(0, -3));
+    EXPECT_THAT(seen.result, ::testing::UnorderedElementsAre(0, -3));
+    EXPECT_EQ(seen.out, "");
 }
