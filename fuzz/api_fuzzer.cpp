@@ -4,6 +4,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cstring>
 #include <functional>
 #include <initializer_list>
 
@@ -31,26 +32,14 @@ public:
 
     // Starting, opening and frames more often than the rest, so that sequences get somewhere.
     void step() {
-        switch (below(16)) {
-            case 0:
-                return answer(Morva_SDK_GlobalDestroy(), {0, -3});
-            case 1:
-            case 2:
-                return start();
-            case 3:
-                return setModel();
-            case 4:
-            case 5:
-            case 6:
-                return open();
-            case 7:
-                return closeOrReset();
-            case 8:
-            case 9:
-                return askOrAdjust();
-            default:
-                return below(2) == 0 ? frame<short>() : frame<float>();
-        }
+        auto const choice = below(16);
+        if (choice == 0) return answer(Morva_SDK_GlobalDestroy(), {0, -3});
+        if (choice < 3) return start();
+        if (choice < 4) return setModel();
+        if (choice < 7) return open();
+        if (choice < 8) return closeOrReset();
+        if (choice < 10) return askOrAdjust();
+        return below(2) == 0 ? frame<short>() : frame<float>();
     }
 
 private:
@@ -95,18 +84,17 @@ private:
         fuzz::Engine::setModel(weights.vad, "vad");
     }
     void setModel() {
-        switch (below(4)) {
-            case 0:
-                return answer(Morva_SDK_SetModel(nullptr, oneOf(names)), {2});
-            case 1:
-                return answer(Morva_SDK_SetModel(L"missing.mvw", oneOf(names)), {2, -3});
-            case 2:
-                return answer(Morva_SDK_SetModel_Blob(nullptr, 5, oneOf(names)), {2});
-            default:
-                auto const bytes = choices_.ConsumeRandomLengthString(64);
-                auto const name = choices_.ConsumeRandomLengthString(8);
-                answer(fuzz::Engine::setModel(bytes, name.c_str()), {0, 2, -3});
-        }
+        auto const choice = below(4);
+        if (choice == 0) return answer(Morva_SDK_SetModel(nullptr, oneOf(names)), {2});
+        if (choice == 2) return answer(Morva_SDK_SetModel_Blob(nullptr, 5, oneOf(names)), {2});
+        auto const bytes = choices_.ConsumeRandomLengthString(64);
+        auto const name = choices_.ConsumeRandomLengthString(8);
+        if (choice > 2) return answer(fuzz::Engine::setModel(bytes, name.c_str()), {0, 2, -3});
+        // A path of any code points.
+        std::wstring path(bytes.size() / sizeof(wchar_t), L'x');
+        std::memcpy(path.data(), bytes.data(), path.size() * sizeof(wchar_t));
+        path = L"missing" + path + L".mvw";
+        answer(Morva_SDK_SetModel(path.c_str(), name.c_str()), {2, -2, -3});
     }
     void open() {
         auto const in = rate();
@@ -168,15 +156,10 @@ private:
         for (Sample const sample : output) finite(static_cast<float>(sample));
     }
     void call(void* session, short const* in, unsigned inSize, short* out, unsigned outSize) {
-        switch (below(3)) {
-            case 0:
-                return answer(Morva_NC_CleanAmbientNoiseInt16(session, in, inSize, out, outSize),
-                              {0, 1, 2, -3});
-            case 1:
-                return finite(Morva_VAD_FrameInt16(session, in, inSize));
-            default:
-                return finite(Morva_NoiseDB_FrameInt16(session, in, inSize));
-        }
+        auto const kind = below(3);
+        if (kind == 1) return finite(Morva_VAD_FrameInt16(session, in, inSize));
+        if (kind == 2) return finite(Morva_NoiseDB_FrameInt16(session, in, inSize));
+        answer(Morva_NC_CleanAmbientNoiseInt16(session, in, inSize, out, outSize), {0, 1, 2, -3});
     }
     void call(void* session, float const* in, unsigned inSize, float* out, unsigned outSize) {
         auto const unit = [](float result) {
@@ -184,18 +167,13 @@ private:
             fuzz::require(inUnit || result == -3.0F || result == -4.0F, "0..1 or a code");
         };
         float level = 0.0F;
-        switch (below(4)) {
-            case 0:
-                return answer(Morva_NC_CleanAmbientNoiseFloat(session, in, inSize, out, outSize),
-                              {0, 1, 2, -3});
-            case 1:
-                return unit(Morva_VAD_FrameFloat(session, in, inSize));
-            case 2:
-                return unit(Morva_NoiseDB_FrameFloat(session, in, inSize));
-            default:
-                answer(MorvaExt_NoiseDB_FrameFloat(session, in, inSize, &level), {0, 1, 2, -3});
-                finite(level);
-        }
+        auto const kind = below(4);
+        if (kind == 1) return unit(Morva_VAD_FrameFloat(session, in, inSize));
+        if (kind == 2) return unit(Morva_NoiseDB_FrameFloat(session, in, inSize));
+        answer(kind == 3 ? MorvaExt_NoiseDB_FrameFloat(session, in, inSize, &level)
+                         : Morva_NC_CleanAmbientNoiseFloat(session, in, inSize, out, outSize),
+               {0, 1, 2, -3});
+        finite(level);
     }
 
     FuzzedDataProvider& choices_;

@@ -1,5 +1,5 @@
-// Any bytes as a control file: parsed with its promises checked, then registered beside a valid
-// weight as the model's parameters, and run.
+// Any bytes as a control file: parsed with its promises checked, registered beside a valid weight
+// as the model's parameters and run, and registered without one, so that they name weights, too.
 #include "harness.h"
 #include "support/temp_dir.h"
 #include "weights/control_file.h"
@@ -35,7 +35,9 @@ void checkEntries(std::filesystem::path const& file) {
 extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size) {
     std::string const text(reinterpret_cast<char const*>(data), size);
     checkEntries(folder().write("model.cfg", "WEIGHT weight.mvw\n" + text));
+    folder().write("other.cfg", text);
     fuzz::Engine const engine(folder().path().wstring().c_str());
     if (Morva_SDK_SetModel(L"model.cfg", "model") == 0) fuzz::run(8000, 8000, 10, "model");
+    Morva_SDK_SetModel(L"other.cfg", "other");
     return 0;
 }

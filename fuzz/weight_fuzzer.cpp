@@ -36,22 +36,12 @@ public:
         if (records.empty()) return bytes;
         auto const victim = std::next(records.begin(), below(static_cast<long>(records.size())));
         std::string tail;
-        switch (below(10)) {
-            case 0:
-                records.erase(victim);
-                break;
-            case 1:
-                replace(records, optionalName());
-                break;
-            case 2:
-                replace(records, victim->first);
-                break;
-            case 3:
-                tail = victim->second.substr(0, below(victim->second.size()));
-                break;
-            default:
-                changeValue(victim->first, victim->second);
-        }
+        auto const choice = below(10);
+        if (choice == 1) replace(records, optionalName());
+        if (choice == 2) replace(records, victim->first);
+        if (choice == 3) tail = victim->second.substr(0, below(victim->second.size()));
+        if (choice > 3) changeValue(victim->first, victim->second);
+        if (choice == 0) records.erase(victim);
         std::string all;
         for (auto const& [name, record] : records) all += record;
         return all + tail;
@@ -135,14 +125,6 @@ private:
     std::mt19937 engine_;
 };
 
-// Some inputs are read from a file, too.
-void checkFile(std::string const& bytes, bool registered) {
-    static test_support::TempDir const folder;
-    auto const file = folder.write("weight.mvw", bytes).wstring();
-    fuzz::require((Morva_SDK_SetModel(file.c_str(), "file") == 0) == registered,
-                  "a file is taken or refused as its bytes are");
-}
-
 void runValues(void* session, float (*frame)(void*, short const*, unsigned), unsigned size) {
     std::vector<short> const sound(size, 5000);
     for (int i = 0; session != nullptr && i < 10; ++i) {
@@ -154,11 +136,15 @@ void runValues(void* session, float (*frame)(void*, short const*, unsigned), uns
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(std::uint8_t const* data, std::size_t size) {
-    fuzz::Engine const engine;
     std::string const bytes(reinterpret_cast<char const*>(data), size);
-    bool const registered = fuzz::Engine::setModel(bytes, "model") == 0;
-    if (size % 8 == 0) checkFile(bytes, registered);
-    if (!registered) return 0;
+    static test_support::TempDir const folder;
+    MORVA::WEIGHTS::Weight weight;
+    MORVA::UTILS::Path const file(folder.write("weight.mvw", bytes).wstring().c_str());
+    bool const isRead = size % 8 == 0 ? weight.read(file) : weight.read(bytes.data(), size);
+    auto const expected = test_support::ReferenceReader(bytes).read();
+    fuzz::require(isRead && test_support::writeBack(weight.values()) == expected, "read in full");
+    fuzz::Engine const engine;
+    if (fuzz::Engine::setModel(bytes, "model") != 0) return 0;
     fuzz::run(8000, 8000, 40, "model");
     fuzz::run(48000, 16000, 10, "model");
     runValues(Morva_VAD_CreateSession(MORVA_RATE_8000, MORVA_FRAME_20_MS, "model"),

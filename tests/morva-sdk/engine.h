@@ -48,9 +48,10 @@ auto observe(Call call) {
     return Outcome<decltype(call())>{result, out.text(), std::move(error)};
 }
 
-// Matches an Outcome that printed exactly this, or nothing on the stream that is not named.
+// Matches an Outcome that printed this, and nothing on the stream that is not named.
 template <class Result>
-auto gives(Result result, std::string const& err = "", std::string const& out = "") {
+auto gives(Result result, ::testing::Matcher<std::string> const& err = std::string(),
+           ::testing::Matcher<std::string> const& out = std::string()) {
     using Seen = Outcome<Result>;
     return ::testing::AllOf(::testing::Field("result", &Seen::result, result),
                             ::testing::Field("stderr", &Seen::err, err),
@@ -62,12 +63,8 @@ auto gives(Result result, std::string const& err = "", std::string const& out = 
 template <class Result>
 auto fails(Result result, std::string const& function, std::string const& message,
            std::string const& place = "[a-z_/0-9-]* Line [0-9]*") {
-    using Seen = Outcome<Result>;
-    return ::testing::AllOf(
-        ::testing::Field("result", &Seen::result, result),
-        ::testing::Field("stderr", &Seen::err,
-                         ::testing::MatchesRegex("MORVA_Exeption in file " + place + " Function " +
-                                                 function + "\n messege " + message + "\n")));
+    auto const text = "MORVA_Exeption in file " + place + " Function " + function + "\n messege ";
+    return gives(result, ::testing::MatchesRegex(text + message + "\n"), ::testing::_);
 }
 
 // The engine for one test, without printing.
@@ -80,23 +77,24 @@ public:
     Engine& operator=(Engine const&) = delete;
     ~Engine() { Morva_SDK_GlobalDestroy(); }
 
-    static int add(char const* name, std::string const& weight) {
+    static auto addBlob(std::string const& bytes, char const* name) {
         return observe([&] {
-                   return Morva_SDK_SetModel_Blob(weight.data(),
-                                                  static_cast<unsigned>(weight.size()), name);
-               })
-            .result;
+            return Morva_SDK_SetModel_Blob(bytes.data(), static_cast<unsigned>(bytes.size()), name);
+        });
+    }
+    static auto addFile(std::string const& file, char const* name) {
+        std::wstring const path(file.begin(), file.end());
+        return observe([&] { return Morva_SDK_SetModel(path.c_str(), name); });
+    }
+    static void add(char const* name, std::string const& weight) {
+        EXPECT_EQ(addBlob(weight, name).result, 0) << name;
     }
     static void addIdentity(char const* name, int hz, int modelMs) {
         test_support::NcShape shape;
         shape.sampleRate = hz;
         shape.frameLength = hz * modelMs / 1000;
         shape.timeStamp = name;
-        EXPECT_EQ(add(name, test_support::identityNcWeight(shape)), 0);
-    }
-    static int addShipped(std::string const& file, char const* name) {
-        std::wstring const path(file.begin(), file.end());
-        return observe([&] { return Morva_SDK_SetModel(path.c_str(), name); }).result;
+        add(name, test_support::identityNcWeight(shape));
     }
 };
 
@@ -104,29 +102,32 @@ inline void* openNc(int in, int out, int ms, char const* model) {
     return Morva_NC_CreateSession(rate(in), rate(out), duration(ms), model);
 }
 
-// One call per sample type, so that tests can be written once.
-inline int clean(void* session, std::vector<short> const& in, std::vector<short>& out) {
-    return Morva_NC_CleanAmbientNoiseInt16(session, in.data(), static_cast<unsigned>(in.size()),
-                                           out.data(), static_cast<unsigned>(out.size()));
+// One call for both sample types, so that tests can be written once.
+template <class Sample>
+int clean(void* session, std::vector<Sample> const& in, std::vector<Sample>& out) {
+    auto const call = [&](auto function) {
+        return function(session, in.data(), static_cast<unsigned>(in.size()), out.data(),
+                        static_cast<unsigned>(out.size()));
+    };
+    if constexpr (std::is_same_v<Sample, short>) return call(Morva_NC_CleanAmbientNoiseInt16);
+    if constexpr (std::is_same_v<Sample, float>) return call(Morva_NC_CleanAmbientNoiseFloat);
 }
-inline int clean(void* session, std::vector<float> const& in, std::vector<float>& out) {
-    return Morva_NC_CleanAmbientNoiseFloat(session, in.data(), static_cast<unsigned>(in.size()),
-                                           out.data(), static_cast<unsigned>(out.size()));
-}
-inline float vad(void* session, std::vector<short> const& in) {
-    return Morva_VAD_FrameInt16(session, in.data(), static_cast<unsigned>(in.size()));
-}
-inline float vad(void* session, std::vector<float> const& in) {
-    return Morva_VAD_FrameFloat(session, in.data(), static_cast<unsigned>(in.size()));
-}
-inline float level(void* session, std::vector<short> const& in) {
-    return Morva_NoiseDB_FrameInt16(session, in.data(), static_cast<unsigned>(in.size()));
-}
-inline float level(void* session, std::vector<float> const& in) {
-    float db = NAN;
-    EXPECT_EQ(
-        MorvaExt_NoiseDB_FrameFloat(session, in.data(), static_cast<unsigned>(in.size()), &db), 0);
-    return db;
+
+enum class Kind { noise, voice, level };
+
+// The value of a model that answers with one.
+template <class Sample>
+float valueOf(Kind kind, void* session, std::vector<Sample> const& in) {
+    auto const size = static_cast<unsigned>(in.size());
+    if constexpr (std::is_same_v<Sample, short>) {
+        auto* const call = kind == Kind::voice ? Morva_VAD_FrameInt16 : Morva_NoiseDB_FrameInt16;
+        return call(session, in.data(), size);
+    } else {
+        if (kind == Kind::voice) return Morva_VAD_FrameFloat(session, in.data(), size);
+        float db = NAN;
+        EXPECT_EQ(MorvaExt_NoiseDB_FrameFloat(session, in.data(), size, &db), 0);
+        return db;
+    }
 }
 
 // Voice-like sound: harmonics of a gliding pitch in syllables, over a little noise. -1..1.
@@ -162,8 +163,9 @@ void forEachFrame(std::vector<Sample> const& sound, std::size_t size, Body body)
 }
 
 // Cleans a sound frame by frame, with `before(k)` ahead of frame k.
-template <class Sample, class Before>
-std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound, Before before) {
+template <class Sample, class Before = void (*)(std::size_t)>
+std::vector<Sample> cleanAll(
+    void* session, std::vector<Sample> const& sound, Before before = [](std::size_t) {}) {
     unsigned inSize = 0;
     unsigned outSize = 0;
     EXPECT_EQ(MorvaExt_SessionFrameSizes(session, &inSize, &outSize), 0);
@@ -176,62 +178,43 @@ std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound, Be
     });
     return all;
 }
-template <class Sample>
-std::vector<Sample> cleanAll(void* session, std::vector<Sample> const& sound) {
-    return cleanAll(session, sound, [](std::size_t) {});
-}
 
-// The values of a model that answers with one per frame.
-template <class Sample, class Frame>
-std::vector<float> valuesOf(std::vector<Sample> const& sound, unsigned frameSize, Frame frame) {
-    std::vector<float> values;
-    forEachFrame(sound, frameSize, [&](std::size_t, auto const& f) { values.push_back(frame(f)); });
-    return values;
-}
+// A session of any kind.
+struct Stream {
+    Kind kind;
+    void* handle;
+    std::size_t inSize;
+    std::size_t outSize;
 
-// A session of any kind, 10 ms, driven through one call.
-enum class Kind { noise, voice, level };
-
-class Stream {
-public:
-    Stream(Kind kind, std::string const& model, int in, int out)
-        : kind_(kind),
-          inSize_(samples(in, 10)),
-          outSize_(kind == Kind::noise ? samples(out, 10) : 1) {
-        auto const* const name = model.c_str();
-        handle_ = kind == Kind::noise   ? openNc(in, out, 10, name)
-                  : kind == Kind::voice ? Morva_VAD_CreateSession(rate(in), duration(10), name)
-                                        : Morva_NoiseDB_CreateSession(rate(in), duration(10), name);
-        EXPECT_NE(handle_, nullptr) << model;
-    }
-    Stream(Stream const&) = delete;
-    Stream& operator=(Stream const&) = delete;
-    ~Stream() {
-        auto* const close = kind_ == Kind::noise   ? Morva_NC_CloseSession
-                            : kind_ == Kind::voice ? Morva_VAD_CloseSession
-                                                   : Morva_NoiseDB_CloseSession;
-        EXPECT_EQ(close(handle_), 0);
+    Stream(Kind ofKind, int in, int out, int ms, std::string const& model)
+        : kind(ofKind),
+          inSize(samples(in, ms)),
+          outSize(kind == Kind::noise ? samples(out, ms) : 1) {
+        auto* const open =
+            kind == Kind::voice ? Morva_VAD_CreateSession : Morva_NoiseDB_CreateSession;
+        handle = kind == Kind::noise ? openNc(in, out, ms, model.c_str())
+                                     : open(rate(in), duration(ms), model.c_str());
+        EXPECT_NE(handle, nullptr) << model;
     }
 
-    void* handle() const { return handle_; }
-    std::size_t inSize() const { return inSize_; }
-    std::size_t outSize() const { return outSize_; }
-
-    template <class Sample>
-    void frame(std::vector<Sample> const& in, std::vector<Sample>& out) const {
-        if (kind_ == Kind::noise) {
-            clean(handle_, in, out);
-        } else {
-            out[0] =
-                static_cast<Sample>(kind_ == Kind::voice ? vad(handle_, in) : level(handle_, in));
+    template <class Sample, class Out>
+    void frame(std::vector<Sample> const& in, std::vector<Out>& out) const {
+        if constexpr (std::is_same_v<Sample, Out>) {
+            if (kind == Kind::noise) return static_cast<void>(clean(handle, in, out));
         }
+        out[0] = static_cast<Out>(valueOf(kind, handle, in));
     }
-
-private:
-    Kind kind_;
-    std::size_t inSize_;
-    std::size_t outSize_;
-    void* handle_ = nullptr;
+    // What comes of the whole frames of a sound.
+    template <class Sample>
+    std::vector<float> run(std::vector<Sample> const& sound) const {
+        std::vector<float> all;
+        std::vector<float> out(outSize);
+        forEachFrame(sound, inSize, [&](std::size_t, std::vector<Sample> const& in) {
+            frame(in, out);
+            all.insert(all.end(), out.begin(), out.end());
+        });
+        return all;
+    }
 };
 
 }  // namespace sdk_test

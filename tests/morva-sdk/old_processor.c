@@ -6,29 +6,20 @@
 #include "morva-sdk/morva-ext.h"
 #include "morva-sdk/morva-sdk.h"
 
-static int failures = 0;
-
-static void expect(int ok, char const* what) {
-    if (ok) return;
-    fprintf(stderr, "wrong: %s\n", what);
-    ++failures;
+static int check(int ok, char const* what) {
+    if (!ok) fprintf(stderr, "wrong: %s\n", what);
+    return !ok;
 }
 
 int main(int count, char** names) {
     char text[64];
     snprintf(text, sizeof text, "does not support %s,", count > 1 ? names[1] : "");
     short frame[480] = {0};
-    int handle = 0;
-    expect(Morva_SDK_GlobalInit(NULL, 1) == -3, "initialise");
-    expect(strstr(MorvaExt_LastError(), text) != NULL, "text");
-    expect(Morva_SDK_SetModel(L"model.mvw", "model") == -3, "file");
-    expect(Morva_SDK_SetModel_Blob("bytes", 5, "model") == -3, "bytes");
-    expect(
-        Morva_NC_CreateSession(MORVA_RATE_48000, MORVA_RATE_48000, MORVA_FRAME_10_MS, NULL) == NULL,
-        "session");
-    expect(Morva_VAD_CreateSession(MORVA_RATE_48000, MORVA_FRAME_10_MS, NULL) == NULL, "voice");
-    expect(Morva_NC_CleanAmbientNoiseInt16(&handle, frame, 480, frame, 480) == -3, "frame");
-    expect(Morva_NC_CloseSession(&handle) == -3, "close");
-    expect(Morva_SDK_GlobalDestroy() == -3, "destroy");
-    return failures;
+    int failures = check(Morva_SDK_GlobalInit(NULL, 1) == -3, "initialise");
+    failures += check(strstr(MorvaExt_LastError(), text) != NULL, "text");
+    failures += check(Morva_SDK_SetModel(L"model.mvw", "model") == -3, "file");
+    failures += check(!Morva_VAD_CreateSession(MORVA_RATE_48000, MORVA_FRAME_10_MS, NULL), "open");
+    failures += check(Morva_NC_CleanAmbientNoiseInt16(text, frame, 480, frame, 480) == -3, "frame");
+    failures += check(Morva_NC_CloseSession(text) == -3, "close");
+    return failures + check(Morva_SDK_GlobalDestroy() == -3, "destroy");
 }
