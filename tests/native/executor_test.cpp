@@ -6,6 +6,7 @@
 
 #include <functional>
 #include <memory>
+#include <stdexcept>
 #include <utility>
 #include <vector>
 
@@ -27,57 +28,44 @@ protected:
     void Submit(std::function<void()> work) {
         executor_->ExecuteInternal(std::make_unique<Task<std::function<void()>>>(std::move(work)));
     }
-    void RunOnce() { uv_run(&loop_, UV_RUN_ONCE); }  // blocks until the async handle has fired
 
     uv_loop_t loop_{};
     std::unique_ptr<Executor> executor_;
 };
 
-TEST_F(ExecutorTest, RunsWhatATaskSubmitsOnALaterWakeUp) {
-    std::vector<int> batches;
-    int batch = 0;
-    Submit([&] {
-        batches.push_back(batch);
-        Submit([&] { batches.push_back(batch); });
-    });
-    executor_->ExecutePending();
-    ++batch;
-    executor_->ExecutePending();
-    EXPECT_EQ(batches, (std::vector{0, 1}));
-    RunOnce();
-}
-
-TEST_F(ExecutorTest, DestroysTheTasksOfABatchFromLastToFirst) {
+TEST_F(ExecutorTest, ABatchRunsWholeAndIsDestroyedFromLastToFirst) {
+    std::vector<int> ran;
     std::vector<int> destroyed;
     for (int i = 0; i < 3; ++i) {
         const std::shared_ptr<void> token(nullptr, [&, i](void*) { destroyed.push_back(i); });
-        Submit([token] {});
+        Submit([&, i, token] {
+            ran.push_back(i);
+            if (i == 0) Submit([&] { ran.push_back(3); });
+            if (i == 1) throw std::runtime_error("of no concern to the others");
+        });
     }
-    EXPECT_TRUE(destroyed.empty());
-    RunOnce();
+    executor_->ExecutePending();
+    EXPECT_EQ(ran, (std::vector{0, 1, 2}));
     EXPECT_EQ(destroyed, (std::vector{2, 1, 0}));
+    uv_run(&loop_, UV_RUN_ONCE);  // blocks until the async handle has fired
+    EXPECT_EQ(ran, (std::vector{0, 1, 2, 3}));
 }
 
-TEST_F(ExecutorTest, DropsPendingTasksUnrunWhenDestroyed) {
+TEST_F(ExecutorTest, DestroyedByATaskItDropsWhatIsPendingUnrun) {
     const auto token = std::make_shared<int>(0);
     bool ran = false;
-    Submit([&ran, token] { ran = true; });
-    EXPECT_EQ(token.use_count(), 2);
-    executor_.reset();
-    EXPECT_EQ(token.use_count(), 1);
-    // The wake-up that was already sent finds no executor and does nothing.
-    uv_run(&loop_, UV_RUN_DEFAULT);
-    EXPECT_FALSE(ran);
-}
-
-TEST_F(ExecutorTest, ATaskMayThrowAndMayDestroyTheExecutorThatRunsIt) {
     bool later = false;
-    Submit(nullptr);  // running an empty function throws
-    Submit([&] { executor_.reset(); });
+    Submit([&, token] {
+        Submit([&, token] { ran = true; });
+        EXPECT_EQ(token.use_count(), 3);
+        executor_.reset();
+        EXPECT_EQ(token.use_count(), 2);
+    });
     Submit([&] { later = true; });
-    RunOnce();
-    EXPECT_EQ(executor_, nullptr);
+    uv_run(&loop_, UV_RUN_DEFAULT);
+    EXPECT_EQ(token.use_count(), 1);
     EXPECT_TRUE(later);  // it was taken out with the batch
+    EXPECT_FALSE(ran);
 }
 
 }  // namespace

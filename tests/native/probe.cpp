@@ -40,14 +40,6 @@ void DeliverFromThreads(Callback callback) {
     }
 }
 
-// The last copy of the callback dies on another thread.
-void DropOnThread(Callback callback) {
-    std::thread([held = std::move(callback)]() mutable {
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-        held = Callback();
-    }).detach();
-}
-
 // A thread that goes on calling back until the process ends.
 void DeliverForever(Callback callback) {
     std::thread([held = std::move(callback)] {
@@ -58,7 +50,7 @@ void DeliverForever(Callback callback) {
     }).detach();
 }
 
-// Callbacks kept beyond their environment, to be called and dropped from another one.
+// Callbacks to be called and dropped on another thread, perhaps beyond their environment.
 std::mutex gKeptLock;
 std::vector<Callback> gKept;
 
@@ -102,20 +94,16 @@ void Deliver(Callback callback) {
 
 void* gModule = nullptr;
 
-// Finds the loaded module whose path is given.
-void Attach(Value path) {
-    gModule = dlopen(TextOf(path).c_str(), RTLD_NOW | RTLD_NOLOAD);
-    if (gModule == nullptr) throw std::runtime_error("the module is not loaded");
-}
-
 template <class F>
 F Find(const char* name) {
     return reinterpret_cast<F>(dlsym(gModule, name));
 }
 
 // An audio engine's threads: one opens, feeds and closes voice sessions, both feed a cleaning
-// session, until the process is gone.
-void RunForever() {
+// session, until the process is gone. The path is that of the host module, which is loaded already.
+void RunForever(Value path) {
+    gModule = dlopen(TextOf(path).c_str(), RTLD_NOW | RTLD_NOLOAD);
+    if (gModule == nullptr) throw std::runtime_error("the module is not loaded");
     for (const bool cleansOnly : {false, true}) {
         std::thread([cleansOnly] {
             constexpr unsigned kFrame = 480;
@@ -156,7 +144,6 @@ NAPI_MODULE_INIT() {
         Environment::Initialize(env);
         const Object target(exports);
         BindFunction(target, "deliverFromThreads", DeliverFromThreads);
-        BindFunction(target, "dropOnThread", DropOnThread);
         BindFunction(target, "deliverForever", DeliverForever);
         BindFunction(target, "keep", Keep);
         BindFunction(target, "callAndDropKept", CallAndDropKept);
@@ -164,7 +151,6 @@ NAPI_MODULE_INIT() {
         BindFunction(target, "echo", Echo);
         BindFunction(target, "failAllocation", FailAllocation);
         BindFunction(target, "deliver", Deliver);
-        BindFunction(target, "attach", Attach);
         BindFunction(target, "runForever", RunForever);
     } catch (const std::exception& failure) {
         napi_throw_error(env, nullptr, failure.what());

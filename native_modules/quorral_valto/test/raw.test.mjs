@@ -1,7 +1,7 @@
 // The five raw properties and the binding layer under them: arguments, errors, delivery.
 import assert from 'node:assert/strict';
 import { test } from 'node:test';
-import { binaryFile, NC_MODELS, probePath, require, run, VAD_MODELS } from './support/package.mjs';
+import { binaryFile, NC_MODELS, probePath, require, VAD_MODELS } from './support/package.mjs';
 
 const raw = require(binaryFile);
 const probe = require(probePath);
@@ -61,7 +61,7 @@ test('setters want exact names; callbacks come on later turns, microtasks betwee
 });
 
 test('errors and strings come through whole', () => {
-  assert.throws(() => probe.attach('/nowhere'), { message: 'the module is not loaded' });
+  assert.throws(() => probe.runForever('/nowhere'), { message: 'the module is not loaded' });
   for (const text of ['', '\u00fc\u4f60\u{1f600}', 'x'.repeat(100_000)]) {
     assert.throws(() => probe.echo(text), { message: `[${text}]` });
   }
@@ -69,20 +69,6 @@ test('errors and strings come through whole', () => {
   for (const other of [1, null, undefined, {}, Symbol('s'), ['a'], new String('a')]) {
     assert.throws(() => probe.echo(other), { message: '[not a string]' });
   }
-});
-
-test('values of several threads arrive on this one, in the order of each', async () => {
-  // Collected in the middle: the held callback keeps function and process alive.
-  const { stdout } = await run(
-    `const next = [0, 0, 0, 0];
-     loadProbe().deliverFromThreads(([thread, count]) => {
-       if (Number(count) !== next[thread]++) throw new Error(thread);
-     });
-     gc();
-     process.on('exit', () => console.log(...next));`,
-    { execArgv: ['--expose-gc'] },
-  );
-  assert.equal(stdout, '100 100 100 100\n');
 });
 
 // Fails the first, second, ... allocation until the work gets by without reaching it; how often it
