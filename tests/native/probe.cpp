@@ -99,13 +99,14 @@ F Find(const char* name) {
     return reinterpret_cast<F>(dlsym(gModule, name));
 }
 
-// An audio engine's threads: one opens, feeds and closes voice sessions, both feed a cleaning
-// session, until the process is gone. The path is that of the host module, which is loaded already.
+// An audio engine's threads: each feeds a cleaning session and opens, feeds and closes voice
+// sessions, until the process is gone. The path is that of the host module, which is loaded
+// already.
 void RunForever(Value path) {
     gModule = dlopen(TextOf(path).c_str(), RTLD_NOW | RTLD_NOLOAD);
     if (gModule == nullptr) throw std::runtime_error("the module is not loaded");
-    for (const bool cleansOnly : {false, true}) {
-        std::thread([cleansOnly] {
+    for (int thread = 0; thread < 2; ++thread) {
+        std::thread([] {
             constexpr unsigned kFrame = 480;
             std::vector<std::int16_t> frame(kFrame);
             void* const cleaner = Find<ValtoNCSetupFn>("ValtoNCSetup")(48000, 10);
@@ -113,7 +114,6 @@ void RunForever(Value path) {
                 for (auto& sample : frame) sample = static_cast<std::int16_t>(n++ * 7919U);
                 Find<ValtoNCProcessFn>("ValtoNCProcess")(cleaner, frame.data(), kFrame,
                                                          frame.data(), kFrame);
-                if (cleansOnly) continue;
                 void* const detector = Find<ValtoVADSetupFn>("ValtoVADSetup")(48000, 10);
                 Find<ValtoVADProcessFn>("ValtoVADProcess")(detector, frame.data(), kFrame);
                 Find<ValtoVADResetFn>("ValtoVADReset")(detector);

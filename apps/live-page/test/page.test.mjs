@@ -6,7 +6,8 @@ import os from 'node:os';
 import path from 'node:path';
 import { after, before, test } from 'node:test';
 import { findChromium, openBrowser, openPage } from '../browser.mjs';
-import { serve } from './harness.mjs';
+import { require } from '../dependencies.mjs';
+import { directly, serve } from './harness.mjs';
 
 const underSanitizer = (process.env.LD_PRELOAD ?? '').includes('asan');
 const skip =
@@ -146,6 +147,9 @@ browsing('a dropped file comes back cleaned, drawn, and again from another model
   const first = await finished(page);
   assert.equal(first.cleaned.name, 'meeting.notes-cleaned.wav');
   assert.ok(Math.abs(first.seconds - 10) < 1e-4); // the browser brings it to its own rate
+  require('quorral_valto').initialize();
+  const { samples, rate } = first.original;
+  assert.deepEqual(first.cleaned.samples, directly(samples, rate, 'full_NC-ca03f4').samples);
   await pausesAreQuiet(page);
   // Drawn with the next refresh of the screen.
   await page.waitForFunction(() => {
@@ -166,12 +170,8 @@ browsing('a dropped file comes back cleaned, drawn, and again from another model
   assert.deepEqual(second.original.samples, first.original.samples);
   assert.notDeepEqual(second.cleaned.samples, first.cleaned.samples);
   await pausesAreQuiet(page);
-  assert.deepEqual(complaints, []);
-});
 
-browsing('before and after are heard at the same position', async (t) => {
-  const { page, complaints } = await visit(t);
-  // Two ramps, one the other's negative: what is heard tells side and position.
+  // Before and after are heard at the same position. Two ramps, one the other's negative: what is heard tells side and position.
   const heard = await page.evaluate(async () => {
     const { Player } = await import('./player.mjs');
     const context = new AudioContext();
@@ -211,34 +211,8 @@ browsing('before and after are heard at the same position', async (t) => {
   assert.deepEqual(complaints, []);
 });
 
-// A page without a server: it lets half of everything through by itself.
-const HALVING_PAGE = `
-  import { Link } from './link.mjs';
-  import { startPage } from './live-page.mjs';
-  import { encodeResult } from './protocol.mjs';
-
-  const HELLO = { models: [{ name: 'half', rate: 48000 }], sampleRates: [44100, 48000], maxSeconds: 600 };
-  class InThisPage extends Link {
-    isOpen = true;
-    connect() {
-      this.receive(JSON.stringify({ type: 'hello', ...HELLO }));
-    }
-    post(message) {
-      if (typeof message !== 'string') {
-        const samples = message.map((sample) => sample / 2);
-        return setTimeout(() => this.receive(encodeResult({ stream: this.id, samples, voice: [], noise: [] })));
-      }
-      const { type, stream = this.id } = JSON.parse(message);
-      this.id = stream;
-      const answer = { start: { type: 'started', stream, latency: 0 }, stop: { type: 'done', stream } }[type];
-      setTimeout(() => this.receive(JSON.stringify(answer)));
-    }
-  }
-  startPage(new InThisPage());`;
-
-browsing('what cannot be opened is put in words; another link cleans elsewhere', async (t) => {
+browsing('what cannot be opened is put in words, and the page still works', async (t) => {
   const { page, complaints, problem } = await visit(t, {
-    main: HALVING_PAGE,
     prelude: `MediaDevices.prototype.getUserMedia = async () => {
       throw new DOMException('x', globalThis.reason);
     };`,
@@ -259,14 +233,8 @@ browsing('what cannot be opened is put in words; another link cleans elsewhere',
   const text = { name: 'x.mp3', mimeType: 'audio/mpeg', buffer: Buffer.from('hello') };
   await page.setInputFiles('#file', text);
   await problem(/"x\.mp3" is no sound/);
-  await page.setInputFiles('#file', made('s.ogg', 2, '-r 22050', 'synth 12 sine 440'));
-  const { original, cleaned, seconds } = await finished(page);
-  assert.ok(Math.abs(seconds - 12) < 0.05);
-  assert.ok(Math.max(...original.samples.subarray(0, 1000)) > 10000);
-  assert.deepEqual(
-    cleaned.samples,
-    original.samples.map((sample) => sample / 2),
-  );
+  await page.setInputFiles('#file', made('s.ogg', 2, '-r 22050', 'synth 1.5 pinknoise'));
+  assert.ok(Math.abs((await finished(page)).seconds - 1.5) < 0.05);
   assert.ok(await page.locator('#problem').isHidden());
   assert.deepEqual(complaints, []);
 });

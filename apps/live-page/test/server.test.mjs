@@ -3,22 +3,68 @@
 import assert from 'node:assert/strict';
 import { once } from 'node:events';
 import fs from 'node:fs';
+import { request } from 'node:http';
 import net from 'node:net';
-import os from 'node:os';
 import path from 'node:path';
 import { test } from 'node:test';
 import { setTimeout as sleep } from 'node:timers/promises';
 import { noise, randomSource } from '../../../native_modules/quorral_valto/test/support/audio.mjs';
+import { temporaryFolder } from '../../../native_modules/quorral_valto/test/support/package.mjs';
 import { require } from '../dependencies.mjs';
 import { decodeResult, MAX_MESSAGE_BYTES } from '../page/protocol.mjs';
 import { namesOf } from '../server.mjs';
-import { ask, connect, greeted, heard, serve } from './harness.mjs';
+import { directly, serve } from './harness.mjs';
 
-const { initialize, NoiseCanceller, SAMPLE_RATES, VoiceActivityDetector } =
-  require('quorral_valto');
+const { WebSocket } = require('ws');
+const { initialize, SAMPLE_RATES } = require('quorral_valto');
 const MODELS = require('../../models/shipped.json')
   .filter(({ kind }) => kind === 'NC')
   .map(({ name }) => name);
+
+/** { status, headers, body } of a request whose path is sent as it stands. */
+async function ask(url, { path: asked = '/', ...options } = {}) {
+  const { hostname, port } = new URL(url);
+  const sent = request({ hostname, port, path: asked, ...options }).end();
+  const [response] = await once(sent, 'response');
+  const body = Buffer.concat(await response.toArray());
+  return { status: response.statusCode, headers: response.headers, body };
+}
+
+/** A socket with `said`, the messages so far, and `closed`, which resolves to { code, reason }. */
+function connect(url, { path: asked = 'audio', origin = new URL(url).origin } = {}) {
+  const socket = new WebSocket(new URL(asked, url.replace('http', 'ws')), { origin });
+  socket.binaryType = 'arraybuffer';
+  socket.said = [];
+  socket.on('message', (data, isBinary) => {
+    socket.said.push(isBinary ? data : JSON.parse(Buffer.from(data).toString()));
+  });
+  socket.closed = new Promise((resolve) => {
+    socket.on('close', (code, reason) => resolve({ code, reason: `${reason}` }));
+  });
+  return socket;
+}
+
+/** The first message of a type, already there or to come; rejects when the connection closes first. */
+async function heard(socket, type) {
+  const closed = socket.closed.then(({ reason }) => {
+    throw new Error(`closed before "${type}": ${reason}`);
+  });
+  closed.catch(() => {}); // when the message wins
+  for (;;) {
+    const found = socket.said.find((message) => message.type === type);
+    if (found) return found;
+    await Promise.race([once(socket, 'message'), closed]);
+  }
+}
+
+/** A connection after its "hello", ended with the test. */
+async function greeted(t, url) {
+  const socket = connect(url);
+  t.after(() => socket.terminate());
+  const hello = await heard(socket, 'hello');
+  const say = (message) => socket.send(JSON.stringify(message));
+  return { socket, hello, say };
+}
 
 test('serves its page and nothing else', async (t) => {
   const { url } = await serve(t);
@@ -111,22 +157,6 @@ test('a message that breaks the rules ends its connection with a reason', async 
   assert.deepEqual([done.stream, done.samples], [2, 80]);
 });
 
-/** What the package makes of a sound: cleaned samples, the delay taken out, and voice scores. */
-function directly(samples, sampleRate, model) {
-  const canceller = new NoiseCanceller({ sampleRate, frameMs: 10, model });
-  const detector = new VoiceActivityDetector({ sampleRate, frameMs: 10 });
-  const { frameSize, latency } = canceller;
-  const padded = new Int16Array(Math.ceil((samples.length + latency) / frameSize) * frameSize);
-  padded.set(samples);
-  const voice = [];
-  for (let at = 0; at < padded.length; at += frameSize) {
-    const frame = padded.subarray(at, at + frameSize);
-    if (at < samples.length) voice.push(detector.process(frame));
-    canceller.process(frame);
-  }
-  return { samples: padded.subarray(latency, latency + samples.length), voice };
-}
-
 test('the sound that comes back is the model’s, in step, also when another takes over', async (t) => {
   initialize();
   const { url } = await serve(t);
@@ -187,8 +217,7 @@ test('a page that does not read is not read either', async (t) => {
 });
 
 test('a module that cannot be loaded is reported in words', async (t) => {
-  const root = fs.mkdtempSync(path.join(os.tmpdir(), 'quorral-live-'));
-  t.after(() => fs.rmSync(root, { recursive: true }));
+  const root = temporaryFolder(t);
   const inside = (name) => path.join(root, name);
   fs.cpSync(new URL('..', import.meta.url), inside('apps/live-page'), { recursive: true });
   const modules = inside('native_modules/quorral_valto/node_modules');
@@ -196,10 +225,8 @@ test('a module that cannot be loaded is reported in words', async (t) => {
   fs.symlinkSync(path.dirname(require.resolve('ws/package.json')), path.join(modules, 'ws'));
   const broken = 'throw Object.assign(Error("x"), { code: "ERR_Y" });';
   fs.writeFileSync(path.join(modules, 'quorral_valto.js'), broken);
-  const { startServer } = await import(inside('apps/live-page/server.mjs'));
-  const server = await startServer();
-  t.after(() => void server.close());
-  const socket = connect(server.url);
+  const other = await import(inside('apps/live-page/server.mjs'));
+  const socket = connect((await serve(t, {}, other.startServer)).url);
   assert.deepEqual(await heard(socket, 'error'), { type: 'error', code: 'ERR_Y', message: 'x' });
   assert.equal((await socket.closed).code, 1011);
 });

@@ -152,23 +152,24 @@ test('a failed load names platform, tried paths and remedy', async (t) => {
 
 test('the example cleans each channel, in step with the original', (t) => {
   const cwd = temporaryFolder(t);
-  const sox = (...args) => execFileSync('sox', args, { cwd, env: { PATH: process.env.PATH } });
+  const call = (...command) =>
+    execFileSync(command[0], command.slice(1), {
+      cwd,
+      stdio: 'pipe',
+      maxBuffer: 1e7,
+      env: { PATH: process.env.PATH },
+    });
   const recording = path.join(repository, 'examples/audio/noisy.flac');
-  sox(recording, '-b', '16', 'noisy.wav', 'remix', '1', '0'); // silence on the right
+  call('sox', recording, '-b', '16', 'noisy.wav', 'remix', '1', '0'); // silence on the right
   const program = path.join(repository, 'examples/node/denoise.mjs');
-  const example = (...files) =>
-    execFileSync(process.execPath, [program, ...files], { cwd, stdio: 'pipe' });
-  assert.match(`${example('noisy.wav', 'clean.wav')}`, /clean\.wav: 10\.0 s cleaned/);
-  const [noisy, clean] = ['noisy.wav', 'clean.wav'].map((name) => {
-    const bytes = fs.readFileSync(path.join(cwd, name));
-    return new Int16Array(
-      bytes.buffer.slice(bytes.byteOffset + 44, bytes.byteOffset + bytes.length),
-    );
-  });
+  call(process.execPath, program, 'noisy.wav', 'clean.wav');
+  const samplesOf = (name) =>
+    new Int16Array(new Uint8Array(call('sox', name, '-t', 'raw', '-')).buffer);
+  const [noisy, clean] = ['noisy.wav', 'clean.wav'].map(samplesOf);
   assert.equal(clean.length, noisy.length);
   assert.ok(clean.every((sample, i) => i % 2 === 0 || sample === 0));
   const product = (a, b) => a.reduce((sum, sample, i) => sum + sample * b[i], 0);
   assert.ok(product(clean, noisy) > 0.7 * Math.sqrt(product(clean, clean) * product(noisy, noisy)));
   assert.ok(product(clean, clean) < 0.9 * product(noisy, noisy));
-  assert.throws(() => example(program, 'clean.wav'), /no chunk "fmt "/);
+  assert.throws(() => call(process.execPath, program, program, 'clean.wav'), /no chunk "fmt "/);
 });

@@ -49,6 +49,8 @@ test('setters want exact names; callbacks come on later turns, microtasks betwee
       raw._getNcModels((...all) => {
         order.push(all);
         queueMicrotask(() => order.push('microtask'));
+        setImmediate(() => order.push('rest of the turn'));
+        raw._getNcModels(() => order.push('asked inside'));
       }),
       undefined,
     );

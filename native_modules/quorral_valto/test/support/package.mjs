@@ -69,8 +69,8 @@ const WITH_WORKERS = `const PRELUDE = ${JSON.stringify(PRELUDE)} + 'const PRELUD
 const REGISTRATION =
   /^(WEIGHT |WARNING weight isn't loaded| weigth file:|Warning Weight name|ERROR )/;
 
-/** { stdout, stderr } of a script that is expected to end with that code; no registration lines. */
-export async function run(script, { execArgv = [], env = {}, code = 0 } = {}) {
+/** { stdout, stderr } of a script that is expected to end well; no registration lines. */
+export async function run(script, { execArgv = [], env = {} } = {}) {
   const child = spawn(
     process.execPath,
     ['--expose-gc', ...execArgv, '-e', `'use strict';${WITH_WORKERS}${PRELUDE}${script}`],
@@ -83,7 +83,7 @@ export async function run(script, { execArgv = [], env = {}, code = 0 } = {}) {
     });
   }
   const ended = await once(child, 'close');
-  assert.deepEqual(ended, [code, null], `${output.stdout}\n${output.stderr}`);
+  assert.deepEqual(ended, [0, null], `${output.stdout}\n${output.stderr}`);
   assert.doesNotMatch(output.stderr, /Sanitizer|runtime error/);
   const lines = output.stdout.split('\n').filter((line) => !REGISTRATION.test(line));
   return { ...output, stdout: lines.join('\n') };

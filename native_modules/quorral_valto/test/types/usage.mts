@@ -3,10 +3,8 @@ import * as valto from 'quorral_valto';
 
 export async function use(error: unknown, rate: valto.SampleRate): Promise<Int16Array> {
   if (error instanceof valto.ValtoError) {
-    const [code, native]: [valto.ValtoErrorCode, number | undefined] = [
-      error.code,
-      error.nativeCode,
-    ];
+    const code: valto.ValtoErrorCode = error.code;
+    const native: number | undefined = error.nativeCode;
     console.error(code, native);
   }
   const names: string[] = [...(await valto.getNcModels()), ...(await valto.getVadModels())];
