@@ -100,14 +100,15 @@ TEST_F(EntryPointsTest, ModelRateAndDurationOfASetUp) {
 TEST_F(EntryPointsTest, Codes) {
     void* const cleaner = ValtoNCSetup(16000, 10);
     void* const detector = ValtoVADSetup(16000, 10);
-    const std::vector<short> in(160, 1000);
-    std::vector<short> out(160);
-    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 160, out.data(), 160), 0);
-    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 159, out.data(), 160), 1);
-    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 160, out.data(), 159), 1);
-    EXPECT_EQ(ValtoNCProcess(detector, in.data(), 160, out.data(), 160), 2);
-    EXPECT_EQ(ValtoVADProcess(detector, in.data(), 161), -3.0F);
-    EXPECT_EQ(ValtoVADProcess(cleaner, in.data(), 160), -4.0F);
+    std::vector<short> frame(160, 1000);
+    const auto clean = [&](void* session, unsigned inputSize, unsigned outputSize) {
+        return ValtoNCProcess(session, frame.data(), inputSize, frame.data(), outputSize);
+    };
+    EXPECT_EQ(clean(cleaner, 159, 160), 1);
+    EXPECT_EQ(clean(cleaner, 160, 159), 1);
+    EXPECT_EQ(clean(detector, 160, 160), 2);
+    EXPECT_EQ(ValtoVADProcess(detector, frame.data(), 161), -3.0F);
+    EXPECT_EQ(ValtoVADProcess(cleaner, frame.data(), 160), -4.0F);
     EXPECT_EQ(ValtoNCReset(detector), -3);
     EXPECT_EQ(ValtoNCReset(cleaner), 0);
     EXPECT_EQ(ValtoVADReset(cleaner), -3);

@@ -4,7 +4,6 @@
 #include <dlfcn.h>
 #include <node_api.h>
 
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <exception>
@@ -38,16 +37,6 @@ void DeliverFromThreads(Callback callback) {
             for (int i = 0; i < 100; ++i) deliver({std::to_string(thread), std::to_string(i)});
         }).detach();
     }
-}
-
-// A thread that goes on calling back until the process ends.
-void DeliverForever(Callback callback) {
-    std::thread([held = std::move(callback)] {
-        for (;;) {
-            InvokeCallback<Names>(held, {"again"});
-            std::this_thread::sleep_for(std::chrono::microseconds(50));
-        }
-    }).detach();
 }
 
 // Callbacks to be called and dropped on another thread, perhaps beyond their environment.
@@ -144,7 +133,6 @@ NAPI_MODULE_INIT() {
         Environment::Initialize(env);
         const Object target(exports);
         BindFunction(target, "deliverFromThreads", DeliverFromThreads);
-        BindFunction(target, "deliverForever", DeliverForever);
         BindFunction(target, "keep", Keep);
         BindFunction(target, "callAndDropKept", CallAndDropKept);
         BindFunction(target, "countEnvironments", CountEnvironments);

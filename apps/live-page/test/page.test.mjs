@@ -203,10 +203,8 @@ browsing('a dropped file comes back cleaned, drawn, and again from another model
   });
   assert.deepEqual(heard.map(Math.sign), [-1, 1, -1, 1]);
   const positions = heard.map(Math.abs);
-  assert.deepEqual(
-    positions,
-    positions.toSorted((a, b) => a - b),
-  );
+  const sorted = positions.toSorted((a, b) => a - b);
+  assert.deepEqual(positions, sorted);
   assert.ok(positions[0] > 3000);
   assert.deepEqual(complaints, []);
 });
@@ -222,9 +220,7 @@ browsing('what cannot be opened is put in words, and the page still works', asyn
     ['NotFoundError', /No microphone was found/],
     ['AbortError', /cannot be opened: x/],
   ]) {
-    await page.evaluate((name) => {
-      globalThis.reason = name;
-    }, reason);
+    await page.evaluate(`globalThis.reason = '${reason}'`);
     await page.click('#record');
     await problem(pattern);
   }

@@ -66,7 +66,7 @@ async function greeted(t, url) {
   return { socket, hello, say };
 }
 
-test('serves its page and nothing else', async (t) => {
+test('serves its page and nothing else, and takes connections from there only', async (t) => {
   const { url } = await serve(t);
   const page = await ask(url);
   assert.equal(page.status, 200);
@@ -82,12 +82,9 @@ test('serves its page and nothing else', async (t) => {
   assert.equal((await ask(url, { headers: { host: 'example.org' } })).status, 421);
   // A browser does not name the usual port.
   assert.deepEqual([...namesOf(80)], ['127.0.0.1', 'localhost']);
-});
 
-test('takes connections from its own page only, up to a number', async (t) => {
-  const server = await serve(t);
   const refusal = async (options) => {
-    const socket = connect(server.url, options);
+    const socket = connect(url, options);
     return await new Promise((resolve) => {
       socket.on('error', ({ message }) => resolve(message)).on('open', () => resolve('taken'));
     });
@@ -95,13 +92,13 @@ test('takes connections from its own page only, up to a number', async (t) => {
   for (const options of [{ origin: 'http://example.org' }, { path: 'other' }, { origin: '' }]) {
     assert.match(await refusal(options), /403/);
   }
-  for (let i = 0; i < 8; ++i) await greeted(t, server.url);
+  for (let i = 0; i < 8; ++i) await greeted(t, url);
   assert.match(await refusal(), /503/);
 
   // One refused client resets its connection, another keeps its half of it: the server bears the first
   // and lets go of the second, which is told when it writes.
   const refused = async () => {
-    const { port, host } = new URL(server.url);
+    const { port, host } = new URL(url);
     const socket = net.connect({ port, host: '127.0.0.1', allowHalfOpen: true });
     t.after(() => socket.destroy());
     const upgrade = 'Connection: Upgrade\r\nUpgrade: websocket\r\n\r\n';
