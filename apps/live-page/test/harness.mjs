@@ -2,7 +2,8 @@
 import { require } from '../dependencies.mjs';
 import { startServer } from '../server.mjs';
 
-const { NoiseCanceller, VoiceActivityDetector } = require('quorral_valto');
+const { initialize, NoiseCanceller, VoiceActivityDetector } = require('quorral_valto');
+initialize();
 
 /** A server that ends with the test. */
 export async function serve(t, options = {}, start = startServer) {

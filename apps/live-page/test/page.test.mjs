@@ -6,7 +6,6 @@ import os from 'node:os';
 import path from 'node:path';
 import { after, before, test } from 'node:test';
 import { findChromium, openBrowser, openPage } from '../browser.mjs';
-import { require } from '../dependencies.mjs';
 import { directly, serve } from './harness.mjs';
 
 const underSanitizer = (process.env.LD_PRELOAD ?? '').includes('asan');
@@ -45,9 +44,7 @@ async function download(page, button) {
   const bytes = readFileSync(await file.path());
   assert.equal(bytes.toString('latin1', 0, 4), 'RIFF');
   assert.equal(bytes.readUInt32LE(40), bytes.length - 44);
-  const samples = new Int16Array(
-    bytes.buffer.slice(bytes.byteOffset + 44, bytes.byteOffset + bytes.length),
-  );
+  const samples = new Int16Array(new Uint8Array(bytes.subarray(44)).buffer);
   return { name: file.suggestedFilename(), samples, rate: bytes.readUInt32LE(24) };
 }
 
@@ -147,7 +144,6 @@ browsing('a dropped file comes back cleaned, drawn, and again from another model
   const first = await finished(page);
   assert.equal(first.cleaned.name, 'meeting.notes-cleaned.wav');
   assert.ok(Math.abs(first.seconds - 10) < 1e-4); // the browser brings it to its own rate
-  require('quorral_valto').initialize();
   const { samples, rate } = first.original;
   assert.deepEqual(first.cleaned.samples, directly(samples, rate, 'full_NC-ca03f4').samples);
   await pausesAreQuiet(page);

@@ -9,17 +9,17 @@ import path from 'node:path';
 import { test } from 'node:test';
 import { setTimeout as sleep } from 'node:timers/promises';
 import { noise, randomSource } from '../../../native_modules/quorral_valto/test/support/audio.mjs';
-import { temporaryFolder } from '../../../native_modules/quorral_valto/test/support/package.mjs';
+import {
+  NC_MODELS as MODELS,
+  temporaryFolder,
+} from '../../../native_modules/quorral_valto/test/support/package.mjs';
 import { require } from '../dependencies.mjs';
 import { decodeResult, MAX_MESSAGE_BYTES } from '../page/protocol.mjs';
 import { namesOf } from '../server.mjs';
 import { directly, serve } from './harness.mjs';
 
 const { WebSocket } = require('ws');
-const { initialize, SAMPLE_RATES } = require('quorral_valto');
-const MODELS = require('../../models/shipped.json')
-  .filter(({ kind }) => kind === 'NC')
-  .map(({ name }) => name);
+const { SAMPLE_RATES } = require('quorral_valto');
 
 /** { status, headers, body } of a request whose path is sent as it stands. */
 async function ask(url, { path: asked = '/', ...options } = {}) {
@@ -61,9 +61,9 @@ async function heard(socket, type) {
 async function greeted(t, url) {
   const socket = connect(url);
   t.after(() => socket.terminate());
-  const hello = await heard(socket, 'hello');
+  await heard(socket, 'hello');
   const say = (message) => socket.send(JSON.stringify(message));
-  return { socket, hello, say };
+  return { socket, say };
 }
 
 test('serves its page and nothing else, and takes connections from there only', async (t) => {
@@ -83,12 +83,11 @@ test('serves its page and nothing else, and takes connections from there only', 
   // A browser does not name the usual port.
   assert.deepEqual([...namesOf(80)], ['127.0.0.1', 'localhost']);
 
-  const refusal = async (options) => {
-    const socket = connect(url, options);
-    return await new Promise((resolve) => {
+  const refusal = (options) =>
+    new Promise((resolve) => {
+      const socket = connect(url, options);
       socket.on('error', ({ message }) => resolve(message)).on('open', () => resolve('taken'));
     });
-  };
   for (const options of [{ origin: 'http://example.org' }, { path: 'other' }, { origin: '' }]) {
     assert.match(await refusal(options), /403/);
   }
@@ -155,7 +154,6 @@ test('a message that breaks the rules ends its connection with a reason', async 
 });
 
 test('the sound that comes back is the model’s, in step, also when another takes over', async (t) => {
-  initialize();
   const { url } = await serve(t);
   for (const [i, sampleRate] of SAMPLE_RATES.entries()) {
     const [model, next] = [MODELS[i % 3], MODELS[(i + 1) % 3]];

@@ -31,8 +31,7 @@ test('arguments are counted and typed, and nothing happens before', async () => 
   for (const [name, args, message] of cases) {
     assert.throws(() => raw[name](...args), { name: 'Error', message }, `${name} ${args.length}`);
   }
-  assert.deepEqual(await names(raw._getNcModels), [[]]);
-  assert.deepEqual(await names(raw._getVadModels), [[]]);
+  for (const get of [raw._getNcModels, raw._getVadModels]) assert.deepEqual(await names(get), [[]]);
 });
 
 test('setters want exact names; callbacks come on later turns, microtasks between them', async () => {

@@ -51,8 +51,7 @@ export function copyPackage(t, name = 'copy') {
   return folder;
 }
 
-// What every child finds defined: the package, the raw module, the probe, workers that start with the same
-// names.
+// What every child finds defined, and every worker of it.
 const PRELUDE = `
 const { Worker, parentPort, workerData } = require('node:worker_threads');
 const { once } = require('node:events');
