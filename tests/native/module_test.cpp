@@ -1,7 +1,6 @@
 // The host module without script: start-up, also when memory runs out, and entry points.
 #include <gtest/gtest.h>
 
-#include <sstream>
 #include <stdexcept>
 #include <string>
 #include <utility>
@@ -27,13 +26,10 @@ TEST(StartUpTest, AnOldProcessorIsRefusedWithItsLineBeforeTheEngineExists) {
         testing::internal::CaptureStdout();
         EXPECT_EQ(ValtoInitialize(query), code);
         EXPECT_EQ(testing::internal::GetCapturedStdout(), refusal + missing);
-        EXPECT_FALSE(InitializeResult().has_value());
-        EXPECT_TRUE(NcModelNames().empty());
         EXPECT_EQ(ValtoNCSetup(16000, 10), nullptr);
         EXPECT_EQ(OpenNcSession(16000, 10, {}).status, OpenStatus::kNotInitialized);
     };
     refuse([] { return CpuFeatures{.sse41 = false, .avx2 = false}; }, -1, "SSE 4.1\n");
-    refuse([] { return CpuFeatures{.sse41 = false, .avx2 = true}; }, -1, "SSE 4.1\n");
     refuse([] { return CpuFeatures{.sse41 = true, .avx2 = false}; }, -2, "AVX2\n");
 }
 
@@ -64,40 +60,34 @@ protected:
 TEST_F(EntryPointsTest, ModelRateAndDurationOfASetUp) {
     struct Case {
         int rateHz, durationMs;
-        std::string model;  // none: no line at all
-        unsigned samples;   // of a frame; 0 when no session opens
-        bool otherRate = false, otherDuration = false;
+        std::string model, otherRate, otherDuration;  // as printed: no line for an empty one
+        unsigned samples;                             // of a frame; 0 when no session opens
         const char* choice = "";
     };
-    const std::vector<Case> cases{{8000, 10, "small_NC_8k", 80},
-                                  {12000, 20, "small_NC", 240},
-                                  {16000, 30, "small_NC", 480},
-                                  {24000, 40, "full_NC-ca03f4", 960},
-                                  {96000, 10, "full_NC-ca03f4", 960},
-                                  {48000, 10, "small_NC", 480, false, false, "small_NC"},
-                                  {192000, 10, "", 0},
-                                  {22050, 10, "full_NC-ca03f4", 160, true},
-                                  {48000, 25, "full_NC-ca03f4", 480, false, true},
-                                  {48000, 15, "full_NC-ca03f4", 0},
-                                  {48000, 32, "full_NC-ca03f4", 0},
-                                  {0, 0, "small_NC_8k", 160, true, true}};
-    for (const auto& [rateHz, durationMs, model, samples, otherRate, otherDuration, choice] :
+    const std::vector<Case> cases{{8000, 10, "small_NC_8k", "", "", 80},
+                                  {16000, 30, "small_NC", "", "", 480},
+                                  {24000, 40, "full_NC-ca03f4", "", "", 960},
+                                  {48000, 10, "small_NC", "", "", 480, "small_NC"},
+                                  {192000, 10, "", "", "", 0},
+                                  {22050, 10, "full_NC-ca03f4", "22050", "", 160},
+                                  {48000, 25, "full_NC-ca03f4", "", "25", 480},
+                                  {48000, 15, "full_NC-ca03f4", "", "", 0},
+                                  {48000, 32, "full_NC-ca03f4", "", "", 0},
+                                  {0, 0, "small_NC_8k", "0", "0", 160}};
+    const std::string what = "The input ", reason = " is not supported; using default: ";
+    for (const auto& [rateHz, durationMs, model, otherRate, otherDuration, samples, choice] :
          cases) {
         SCOPED_TRACE(testing::Message() << rateHz << " Hz, " << durationMs << " ms " << choice);
-        std::ostringstream lines;
-        if (!model.empty()) lines << "Setting Valto model: " << model << '\n';
-        if (otherRate) {
-            lines << "The input sampling rate " << rateHz
-                  << " is not supported; using default: 16000\n";
-        }
-        if (otherDuration) {
-            lines << "The input frame duration " << durationMs
-                  << " is not supported; using default: 10\n";
+        std::string lines;
+        if (!model.empty()) lines += "Setting Valto model: " + model + '\n';
+        if (!otherRate.empty()) lines += what + "sampling rate " + otherRate + reason + "16000\n";
+        if (!otherDuration.empty()) {
+            lines += what + "frame duration " + otherDuration + reason + "10\n";
         }
         gNcModel = choice;
         testing::internal::CaptureStdout();
         void* const session = ValtoNCSetup(rateHz, durationMs);
-        EXPECT_EQ(testing::internal::GetCapturedStdout(), lines.str());
+        EXPECT_EQ(testing::internal::GetCapturedStdout(), lines);
         EXPECT_EQ(session != nullptr, samples != 0);
         std::vector<short> frame(960);
         EXPECT_EQ(ValtoNCProcess(session, frame.data(), samples, frame.data(), samples),
@@ -108,21 +98,19 @@ TEST_F(EntryPointsTest, ModelRateAndDurationOfASetUp) {
 TEST_F(EntryPointsTest, Codes) {
     void* const cleaner = ValtoNCSetup(16000, 10);
     void* const detector = ValtoVADSetup(16000, 10);
-    const std::vector<short> in(160, 1000);
-    std::vector<short> out(160);
-    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 160, out.data(), 160), 0);
-    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 159, out.data(), 160), 1);
-    EXPECT_EQ(ValtoNCProcess(cleaner, in.data(), 160, out.data(), 159), 1);
-    EXPECT_EQ(ValtoNCProcess(cleaner, nullptr, 160, out.data(), 160), 1);
-    EXPECT_EQ(ValtoNCProcess(detector, in.data(), 160, out.data(), 160), 2);
-    EXPECT_GE(ValtoVADProcess(detector, in.data(), 160), 0.0F);
-    EXPECT_EQ(ValtoVADProcess(detector, in.data(), 161), -3.0F);
-    EXPECT_EQ(ValtoVADProcess(cleaner, in.data(), 160), -4.0F);
+    std::vector<short> frame(160, 1000);
+    const auto clean = [&](void* session, unsigned inputSize, unsigned outputSize) {
+        return ValtoNCProcess(session, frame.data(), inputSize, frame.data(), outputSize);
+    };
+    EXPECT_EQ(clean(cleaner, 159, 160), 1);
+    EXPECT_EQ(clean(cleaner, 160, 159), 1);
+    EXPECT_EQ(clean(detector, 160, 160), 2);
+    EXPECT_EQ(ValtoVADProcess(detector, frame.data(), 161), -3.0F);
+    EXPECT_EQ(ValtoVADProcess(cleaner, frame.data(), 160), -4.0F);
     EXPECT_EQ(ValtoNCReset(detector), -3);
     EXPECT_EQ(ValtoNCReset(cleaner), 0);
-    EXPECT_EQ(ValtoNCReset(cleaner), -3);
+    EXPECT_EQ(ValtoVADReset(cleaner), -3);
     EXPECT_EQ(ValtoVADReset(detector), 0);
-    EXPECT_EQ(ValtoVADReset(detector), -3);
 }
 
 // Fails the first, second, ... allocation of a start-up until it gets by without reaching it.

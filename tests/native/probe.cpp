@@ -4,7 +4,6 @@
 #include <dlfcn.h>
 #include <node_api.h>
 
-#include <chrono>
 #include <cstddef>
 #include <cstdint>
 #include <exception>
@@ -40,25 +39,7 @@ void DeliverFromThreads(Callback callback) {
     }
 }
 
-// The last copy of the callback dies on another thread.
-void DropOnThread(Callback callback) {
-    std::thread([held = std::move(callback)]() mutable {
-        std::this_thread::sleep_for(std::chrono::milliseconds(1));
-        held = Callback();
-    }).detach();
-}
-
-// A thread that goes on calling back until the process ends.
-void DeliverForever(Callback callback) {
-    std::thread([held = std::move(callback)] {
-        for (;;) {
-            InvokeCallback<Names>(held, {"again"});
-            std::this_thread::sleep_for(std::chrono::microseconds(50));
-        }
-    }).detach();
-}
-
-// Callbacks kept beyond their environment, to be called and dropped from another one.
+// Callbacks to be called and dropped on another thread, perhaps beyond their environment.
 std::mutex gKeptLock;
 std::vector<Callback> gKept;
 
@@ -102,22 +83,19 @@ void Deliver(Callback callback) {
 
 void* gModule = nullptr;
 
-// Finds the loaded module whose path is given.
-void Attach(Value path) {
-    gModule = dlopen(TextOf(path).c_str(), RTLD_NOW | RTLD_NOLOAD);
-    if (gModule == nullptr) throw std::runtime_error("the module is not loaded");
-}
-
 template <class F>
 F Find(const char* name) {
     return reinterpret_cast<F>(dlsym(gModule, name));
 }
 
-// An audio engine's threads: one opens, feeds and closes voice sessions, both feed a cleaning
-// session, until the process is gone.
-void RunForever() {
-    for (const bool cleansOnly : {false, true}) {
-        std::thread([cleansOnly] {
+// An audio engine's threads: each feeds a cleaning session and opens, feeds and closes voice
+// sessions, until the process is gone. The path is that of the host module, which is loaded
+// already.
+void RunForever(Value path) {
+    gModule = dlopen(TextOf(path).c_str(), RTLD_NOW | RTLD_NOLOAD);
+    if (gModule == nullptr) throw std::runtime_error("the module is not loaded");
+    for (int thread = 0; thread < 2; ++thread) {
+        std::thread([] {
             constexpr unsigned kFrame = 480;
             std::vector<std::int16_t> frame(kFrame);
             void* const cleaner = Find<ValtoNCSetupFn>("ValtoNCSetup")(48000, 10);
@@ -125,7 +103,6 @@ void RunForever() {
                 for (auto& sample : frame) sample = static_cast<std::int16_t>(n++ * 7919U);
                 Find<ValtoNCProcessFn>("ValtoNCProcess")(cleaner, frame.data(), kFrame,
                                                          frame.data(), kFrame);
-                if (cleansOnly) continue;
                 void* const detector = Find<ValtoVADSetupFn>("ValtoVADSetup")(48000, 10);
                 Find<ValtoVADProcessFn>("ValtoVADProcess")(detector, frame.data(), kFrame);
                 Find<ValtoVADResetFn>("ValtoVADReset")(detector);
@@ -156,15 +133,12 @@ NAPI_MODULE_INIT() {
         Environment::Initialize(env);
         const Object target(exports);
         BindFunction(target, "deliverFromThreads", DeliverFromThreads);
-        BindFunction(target, "dropOnThread", DropOnThread);
-        BindFunction(target, "deliverForever", DeliverForever);
         BindFunction(target, "keep", Keep);
         BindFunction(target, "callAndDropKept", CallAndDropKept);
         BindFunction(target, "countEnvironments", CountEnvironments);
         BindFunction(target, "echo", Echo);
         BindFunction(target, "failAllocation", FailAllocation);
         BindFunction(target, "deliver", Deliver);
-        BindFunction(target, "attach", Attach);
         BindFunction(target, "runForever", RunForever);
     } catch (const std::exception& failure) {
         napi_throw_error(env, nullptr, failure.what());

@@ -2,25 +2,71 @@
 // package's own, in step with what was sent.
 import assert from 'node:assert/strict';
 import { once } from 'node:events';
-import { cpSync, mkdtempSync, rmSync, writeFileSync } from 'node:fs';
+import fs from 'node:fs';
+import { request } from 'node:http';
 import net from 'node:net';
-import os from 'node:os';
 import path from 'node:path';
 import { test } from 'node:test';
 import { setTimeout as sleep } from 'node:timers/promises';
 import { noise, randomSource } from '../../../native_modules/quorral_valto/test/support/audio.mjs';
+import {
+  NC_MODELS as MODELS,
+  temporaryFolder,
+} from '../../../native_modules/quorral_valto/test/support/package.mjs';
 import { require } from '../dependencies.mjs';
 import { decodeResult, MAX_MESSAGE_BYTES } from '../page/protocol.mjs';
 import { namesOf } from '../server.mjs';
-import { ask, connect, greeted, heard, serve } from './harness.mjs';
+import { directly, serve } from './harness.mjs';
 
-const { initialize, NoiseCanceller, SAMPLE_RATES, VoiceActivityDetector } =
-  require('quorral_valto');
-const MODELS = require('../../models/shipped.json')
-  .filter(({ kind }) => kind === 'NC')
-  .map(({ name }) => name);
+const { WebSocket } = require('ws');
+const { SAMPLE_RATES } = require('quorral_valto');
 
-test('serves its page and nothing else', async (t) => {
+/** { status, headers, body } of a request whose path is sent as it stands. */
+async function ask(url, { path: asked = '/', ...options } = {}) {
+  const { hostname, port } = new URL(url);
+  const sent = request({ hostname, port, path: asked, ...options }).end();
+  const [response] = await once(sent, 'response');
+  const body = Buffer.concat(await response.toArray());
+  return { status: response.statusCode, headers: response.headers, body };
+}
+
+/** A socket with `said`, the messages so far, and `closed`, which resolves to { code, reason }. */
+function connect(url, { path: asked = 'audio', origin = new URL(url).origin } = {}) {
+  const socket = new WebSocket(new URL(asked, url.replace('http', 'ws')), { origin });
+  socket.binaryType = 'arraybuffer';
+  socket.said = [];
+  socket.on('message', (data, isBinary) => {
+    socket.said.push(isBinary ? data : JSON.parse(Buffer.from(data).toString()));
+  });
+  socket.closed = new Promise((resolve) => {
+    socket.on('close', (code, reason) => resolve({ code, reason: `${reason}` }));
+  });
+  return socket;
+}
+
+/** The first message of a type, already there or to come; rejects when the connection closes first. */
+async function heard(socket, type) {
+  const closed = socket.closed.then(({ reason }) => {
+    throw new Error(`closed before "${type}": ${reason}`);
+  });
+  closed.catch(() => {}); // when the message wins
+  for (;;) {
+    const found = socket.said.find((message) => message.type === type);
+    if (found) return found;
+    await Promise.race([once(socket, 'message'), closed]);
+  }
+}
+
+/** A connection after its "hello", ended with the test. */
+async function greeted(t, url) {
+  const socket = connect(url);
+  t.after(() => socket.terminate());
+  await heard(socket, 'hello');
+  const say = (message) => socket.send(JSON.stringify(message));
+  return { socket, say };
+}
+
+test('serves its page and nothing else, and takes connections from there only', async (t) => {
   const { url } = await serve(t);
   const page = await ask(url);
   assert.equal(page.status, 200);
@@ -29,38 +75,29 @@ test('serves its page and nothing else', async (t) => {
     assert.equal((await ask(url, { path: `/${name}` })).status, 200, name);
   }
   assert.equal((await ask(url, { method: 'HEAD' })).body.length, 0);
-  for (const wrong of [
-    '/../server.mjs',
-    '/%2e%2e/server.mjs',
-    '//etc/passwd',
-    '/main.mjs?x',
-    '/audio',
-  ])
+  for (const wrong of ['/../server.mjs', '/%2e%2e/server.mjs', '/main.mjs?x', '/audio']) {
     assert.equal((await ask(url, { path: wrong })).status, 404, wrong);
+  }
   assert.equal((await ask(url, { method: 'POST' })).status, 405);
   assert.equal((await ask(url, { headers: { host: 'example.org' } })).status, 421);
   // A browser does not name the usual port.
   assert.deepEqual([...namesOf(80)], ['127.0.0.1', 'localhost']);
-});
 
-test('takes connections from its own page only, up to a number', async (t) => {
-  const server = await serve(t);
-  const refusal = async (options) => {
-    const socket = connect(server.url, options);
-    return await new Promise((resolve) => {
+  const refusal = (options) =>
+    new Promise((resolve) => {
+      const socket = connect(url, options);
       socket.on('error', ({ message }) => resolve(message)).on('open', () => resolve('taken'));
     });
-  };
   for (const options of [{ origin: 'http://example.org' }, { path: 'other' }, { origin: '' }]) {
     assert.match(await refusal(options), /403/);
   }
-  for (let i = 0; i < 8; ++i) await greeted(t, server.url);
+  for (let i = 0; i < 8; ++i) await greeted(t, url);
   assert.match(await refusal(), /503/);
 
   // One refused client resets its connection, another keeps its half of it: the server bears the first
   // and lets go of the second, which is told when it writes.
   const refused = async () => {
-    const { port, host } = new URL(server.url);
+    const { port, host } = new URL(url);
     const socket = net.connect({ port, host: '127.0.0.1', allowHalfOpen: true });
     t.after(() => socket.destroy());
     const upgrade = 'Connection: Upgrade\r\nUpgrade: websocket\r\n\r\n';
@@ -116,72 +153,42 @@ test('a message that breaks the rules ends its connection with a reason', async 
   assert.deepEqual([done.stream, done.samples], [2, 80]);
 });
 
-/** What the package makes of a sound: cleaned samples, the delay taken out, and voice scores. */
-function directly(samples, sampleRate, model) {
-  const canceller = new NoiseCanceller({ sampleRate, frameMs: 10, model });
-  const detector = new VoiceActivityDetector({ sampleRate, frameMs: 10 });
-  const { frameSize, latency } = canceller;
-  const padded = new Int16Array(Math.ceil((samples.length + latency) / frameSize) * frameSize);
-  padded.set(samples);
-  const voice = [];
-  for (let at = 0; at < padded.length; at += frameSize) {
-    const frame = padded.subarray(at, at + frameSize);
-    if (at < samples.length) voice.push(detector.process(frame));
-    canceller.process(frame);
-  }
-  return { samples: padded.subarray(latency, latency + samples.length), voice };
-}
-
-/** The same by the server, in pieces; the model is switched in the middle when there is a second one. */
-async function byServer(t, url, samples, sampleRate, model, second = null) {
-  const { socket, say } = await greeted(t, url);
-  const random = randomSource(samples.length);
-  say({ type: 'start', stream: 9, sampleRate, model });
-  let switchedAt = null;
-  for (let at = 0; at < samples.length; ) {
-    const end = Math.min(samples.length, at + 1 + Math.floor(random() * 3000));
-    socket.send(samples.subarray(at, end));
-    at = end;
-    if (second === null || switchedAt !== null || at < samples.length / 2) continue;
-    switchedAt = at;
-    say({ type: 'model', name: second });
-  }
-  say({ type: 'stop' });
-  const done = await heard(socket, 'done');
-  assert.deepEqual([done.stream, done.samples], [9, samples.length]);
-  socket.close();
-  const results = socket.said.filter((each) => each instanceof ArrayBuffer).map(decodeResult);
-  const joined = (key) => results.flatMap((result) => Array.from(result[key]));
-  const levels = joined('noise');
-  return {
-    samples: Int16Array.from(joined('samples')),
-    voice: joined('voice'),
-    levels,
-    switchedAt,
-  };
-}
-
 test('the sound that comes back is the model’s, in step, also when another takes over', async (t) => {
-  initialize();
   const { url } = await serve(t);
   for (const [i, sampleRate] of SAMPLE_RATES.entries()) {
     const [model, next] = [MODELS[i % 3], MODELS[(i + 1) % 3]];
-    const [other, peak, frame] = [i % 2 === 1 ? next : null, 300 * (i + 1), sampleRate / 100];
+    const [peak, frame] = [300 * (i + 1), sampleRate / 100];
     const samples = noise(Math.floor((1.1 + i / 30) * sampleRate), i, peak);
-    const back = await byServer(t, url, samples, sampleRate, model, other);
+    const name = `${samples.length} samples at ${sampleRate} Hz, ${model}`;
+    const { socket, say } = await greeted(t, url);
+    const random = randomSource(i);
+    say({ type: 'start', stream: 9, sampleRate, model });
+    let switchedAt = i % 2 === 1 ? 0 : samples.length + 3 * frame; // nowhere for every other one
+    for (let at = 0, end; at < samples.length; at = end) {
+      end = Math.min(samples.length, at + 1 + Math.floor(random() * 3000));
+      socket.send(samples.subarray(at, end));
+      if (switchedAt !== 0 || end < samples.length / 2) continue;
+      say({ type: 'model', name: next });
+      switchedAt = end;
+    }
+    say({ type: 'stop' });
+    const done = await heard(socket, 'done');
+    socket.close();
+    const results = socket.said.filter((each) => each instanceof ArrayBuffer).map(decodeResult);
+    const joined = (key) => results.flatMap((result) => Array.from(result[key]));
+    const back = Int16Array.from(joined('samples'));
+    assert.deepEqual([done.stream, done.samples, back.length], [9, back.length, samples.length]);
     const [first, second] = [model, next].map((each) => directly(samples, sampleRate, each));
-    const name = `${samples.length} samples at ${sampleRate} Hz, ${model}, then ${other}`;
-    assert.equal(back.samples.length, samples.length, name);
     // The cross-fade is one frame long and as late as the longest delay of the models, two frames.
-    const at = back.switchedAt ?? samples.length + 3 * frame;
-    const [before, after] = [at - 3 * frame, at + 2 * frame];
-    assert.deepEqual(back.samples.subarray(0, before), first.samples.subarray(0, before), name);
-    assert.deepEqual(back.samples.subarray(after), second.samples.subarray(after), name);
-    assert.deepEqual(back.voice, first.voice, name);
-    assert.equal(back.levels.length, back.voice.length, name);
+    const [before, after] = [switchedAt - 3 * frame, switchedAt + 2 * frame];
+    assert.deepEqual(back.subarray(0, before), first.samples.subarray(0, before), name);
+    assert.deepEqual(back.subarray(after), second.samples.subarray(after), name);
+    assert.deepEqual(joined('voice'), first.voice, name);
+    const levels = joined('noise');
+    assert.equal(levels.length, first.voice.length, name);
     // Noise alone is removed nearly whole: its own level, uniform within the peak.
     const level = 20 * Math.log10(peak / Math.sqrt(3) / 32768);
-    assert.ok(Math.abs(back.levels.at(-1) - level) < 2, `${back.levels.at(-1)} dB, not ${level}`);
+    assert.ok(Math.abs(levels.at(-1) - level) < 2, `${levels.at(-1)} dB, not ${level}`);
   }
 });
 
@@ -205,22 +212,16 @@ test('a page that does not read is not read either', async (t) => {
 });
 
 test('a module that cannot be loaded is reported in words', async (t) => {
-  const root = mkdtempSync(path.join(os.tmpdir(), 'quorral-live-'));
-  t.after(() => rmSync(root, { recursive: true }));
+  const root = temporaryFolder(t);
   const inside = (name) => path.join(root, name);
-  cpSync(new URL('..', import.meta.url), inside('apps/live-page'), { recursive: true });
-  const module = inside('native_modules/quorral_valto');
-  const ws = path.dirname(require.resolve('ws/package.json'));
-  cpSync(ws, path.join(module, 'node_modules/ws'), { recursive: true });
-  writeFileSync(
-    path.join(module, 'package.json'),
-    '{ "name": "quorral_valto", "exports": "./i.cjs" }',
-  );
-  writeFileSync(path.join(module, 'i.cjs'), 'throw Object.assign(Error("x"), { code: "ERR_Y" });');
-  const { startServer } = await import(inside('apps/live-page/server.mjs'));
-  const server = await startServer();
-  t.after(() => void server.close());
-  const socket = connect(server.url);
+  fs.cpSync(new URL('..', import.meta.url), inside('apps/live-page'), { recursive: true });
+  const modules = inside('native_modules/quorral_valto/node_modules');
+  fs.mkdirSync(modules, { recursive: true });
+  fs.symlinkSync(path.dirname(require.resolve('ws/package.json')), path.join(modules, 'ws'));
+  const broken = 'throw Object.assign(Error("x"), { code: "ERR_Y" });';
+  fs.writeFileSync(path.join(modules, 'quorral_valto.js'), broken);
+  const other = await import(inside('apps/live-page/server.mjs'));
+  const socket = connect((await serve(t, {}, other.startServer)).url);
   assert.deepEqual(await heard(socket, 'error'), { type: 'error', code: 'ERR_Y', message: 'x' });
   assert.equal((await socket.closed).code, 1011);
 });

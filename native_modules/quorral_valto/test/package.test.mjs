@@ -1,15 +1,7 @@
 // The package as its users find it: exports, loader, start-up and what fails in it, the example.
 import assert from 'node:assert/strict';
 import { execFileSync } from 'node:child_process';
-import {
-  cpSync,
-  mkdirSync,
-  readFileSync,
-  renameSync,
-  rmSync,
-  symlinkSync,
-  writeFileSync,
-} from 'node:fs';
+import fs from 'node:fs';
 import path from 'node:path';
 import { test } from 'node:test';
 import * as imported from 'quorral_valto';
@@ -21,12 +13,10 @@ import {
   require,
   run,
   temporaryFolder,
-  VAD_MODELS,
   WEIGHTS,
 } from './support/package.mjs';
 
 const required = require('quorral_valto');
-const coded = (code) => (error) => error instanceof required.ValtoError && error.code === code;
 
 test('import and require give the same objects, the file its symbols and no more', () => {
   assert.deepEqual(Object.keys(imported).sort(), Object.keys(required).sort());
@@ -40,38 +30,9 @@ test('import and require give the same objects, the file its symbols and no more
   const registration = ['napi_register_module_v1', 'node_api_module_get_api_version_v1'];
   assert.deepEqual(symbols, [...sides, ...registration]);
   const dynamic = show('readelf', '-d', binaryFile);
-  const needed = [...dynamic.matchAll(/NEEDED.*\[(.*)\]/g)].map((match) => match[1]);
   const allowed = /^(lib(c|m|dl|pthread|stdc\+\+|gcc_s|resample|asan|ubsan)\.so|ld-linux)/;
-  assert.deepEqual(
-    needed.filter((name) => !allowed.test(name)),
-    [],
-  );
+  for (const [, name] of dynamic.matchAll(/NEEDED.*\[(.*)\]/g)) assert.match(name, allowed);
   assert.match(dynamic, /NODELETE/);
-});
-
-test('friendly functions', async () => {
-  const { initialize, raw, getNcModels, getVadModels, setNcModel, setVadModel } = required;
-  assert.deepEqual(await getNcModels(), []);
-  initialize();
-  assert.throws(() => raw._initialize(), { message: /error code: -4$/ });
-  initialize();
-  assert.deepEqual(await getNcModels(), NC_MODELS);
-  assert.deepEqual(await getVadModels(), VAD_MODELS);
-  setNcModel(NC_MODELS[0]);
-  setNcModel(null);
-  setVadModel(VAD_MODELS[0]);
-  for (const set of [setNcModel, setVadModel]) {
-    assert.throws(() => set('nobody'), coded('ERR_VALTO_MODEL'));
-    for (const other of [undefined, 5, {}]) {
-      assert.throws(() => set(other), coded('ERR_VALTO_ARGUMENT'));
-    }
-  }
-  assert.throws(() => setVadModel(null), coded('ERR_VALTO_ARGUMENT'));
-  const { stdout } = await run(`
-    loadRaw()._initialize();
-    require(PACKAGE).initialize();
-    startWorker("require(PACKAGE).initialize(); parentPort.postMessage('up');").on('message', console.log);`);
-  assert.equal(stdout, 'up\n');
 });
 
 /** What scripts report that require the packages in these folders, one after the other in one process. */
@@ -107,9 +68,9 @@ test('start-up: install paths, weight files that cannot be read or used', async 
   };
   for (const [index, weight] of WEIGHTS.entries()) {
     const folder = copyPackage(t);
-    rmSync(within(folder, weight));
-    if (index === 1) symlinkSync('nowhere', within(folder, weight));
-    if (index === 2) mkdirSync(within(folder, weight));
+    fs.rmSync(within(folder, weight));
+    if (index === 1) fs.symlinkSync('nowhere', within(folder, weight));
+    if (index === 2) fs.mkdirSync(within(folder, weight));
     fails(folder, `ERR_VALTO_WEIGHT_${index === 2 ? 'INVALID' : 'MISSING'}`, index);
   }
   fails(copyPackage(t, '\u{1f680}'), 'ERR_VALTO_PATH', 0);
@@ -124,17 +85,12 @@ test('start-up: install paths, weight files that cannot be read or used', async 
     const said = [code, nativeCode, failed(-4), models];
     return [...lines, 'Faild to initialize Morva SDK', JSON.stringify(said)];
   });
-  assert.deepEqual(
-    await reports(
-      cases.map(([folder]) => folder),
-      use,
-    ),
-    expected,
-  );
+  const folders = cases.map(([folder]) => folder);
+  assert.deepEqual(await reports(folders, use), expected);
   // Only what holds no weight at all is found out later.
   const folder = copyPackage(t);
-  rmSync(within(folder, WEIGHTS[2]));
-  writeFileSync(within(folder, WEIGHTS[2]), 'RIFF this is no weight file');
+  fs.rmSync(within(folder, WEIGHTS[2]));
+  fs.writeFileSync(within(folder, WEIGHTS[2]), 'RIFF this is no weight file');
   const open = 'valto.initialize(); new valto.NoiseCanceller({ sampleRate: 48000, frameMs: 10 });';
   const lines = await reports([folder], `(valto) => { ${open} }`);
   assert.equal(JSON.parse(lines.at(-1)).code, 'ERR_VALTO_SESSION');
@@ -152,40 +108,41 @@ test('a failed load names platform, tried paths and remedy', async (t) => {
   await expectFailure(folder, ['win32-x64', 'Only linux-x64'], windows);
   // A file of the host application's own that the loader has no business with.
   const foreign = path.join(folder, '../../build/release/quorral_valto');
-  mkdirSync(path.dirname(foreign), { recursive: true });
-  renameSync(path.dirname(file), foreign);
+  fs.mkdirSync(path.dirname(foreign), { recursive: true });
+  fs.renameSync(path.dirname(file), foreign);
   await expectFailure(folder, ['linux-x64', file, 'no such file']);
-  cpSync(path.join(folder, 'package.json'), file);
+  fs.cpSync(path.join(folder, 'package.json'), file);
   await expectFailure(folder, [file, 'Reinstall']);
 
   const archived = copyPackage(t, 'app.asar/node_modules');
   await expectFailure(archived, ['app.asar.unpacked', 'keep the folder "prebuilds"']);
   // What a packager leaves: scripts in the archive, native files outside of it.
   const outside = path.join(archived.replace('app.asar', 'app.asar.unpacked'), 'prebuilds');
-  mkdirSync(path.dirname(outside), { recursive: true });
-  renameSync(path.join(archived, 'prebuilds'), outside);
+  fs.mkdirSync(path.dirname(outside), { recursive: true });
+  fs.renameSync(path.join(archived, 'prebuilds'), outside);
   assert.deepEqual(await reports([archived], '(valto) => valto.getNcModels()'), ['[]']);
 });
 
 test('the example cleans each channel, in step with the original', (t) => {
   const cwd = temporaryFolder(t);
-  const sox = (...args) => execFileSync('sox', args, { cwd, env: { PATH: process.env.PATH } });
+  const call = (...command) =>
+    execFileSync(command[0], command.slice(1), {
+      cwd,
+      stdio: 'pipe',
+      maxBuffer: 1e7,
+      env: { PATH: process.env.PATH },
+    });
   const recording = path.join(repository, 'examples/audio/noisy.flac');
-  sox(recording, '-b', '16', 'noisy.wav', 'remix', '1', '0'); // silence on the right
+  call('sox', recording, '-b', '16', 'noisy.wav', 'remix', '1', '0'); // silence on the right
   const program = path.join(repository, 'examples/node/denoise.mjs');
-  const example = (...files) =>
-    execFileSync(process.execPath, [program, ...files], { cwd, stdio: 'pipe' });
-  assert.match(`${example('noisy.wav', 'clean.wav')}`, /clean\.wav: 10\.0 s cleaned/);
-  const [noisy, clean] = ['noisy.wav', 'clean.wav'].map((name) => {
-    const bytes = readFileSync(path.join(cwd, name));
-    return new Int16Array(
-      bytes.buffer.slice(bytes.byteOffset + 44, bytes.byteOffset + bytes.length),
-    );
-  });
+  call(process.execPath, program, 'noisy.wav', 'clean.wav');
+  const samplesOf = (name) =>
+    new Int16Array(new Uint8Array(call('sox', name, '-t', 'raw', '-')).buffer);
+  const [noisy, clean] = ['noisy.wav', 'clean.wav'].map(samplesOf);
   assert.equal(clean.length, noisy.length);
   assert.ok(clean.every((sample, i) => i % 2 === 0 || sample === 0));
   const product = (a, b) => a.reduce((sum, sample, i) => sum + sample * b[i], 0);
   assert.ok(product(clean, noisy) > 0.7 * Math.sqrt(product(clean, clean) * product(noisy, noisy)));
   assert.ok(product(clean, clean) < 0.9 * product(noisy, noisy));
-  assert.throws(() => example(program, 'clean.wav'), /no chunk "fmt "/);
+  assert.throws(() => call(process.execPath, program, program, 'clean.wav'), /no chunk "fmt "/);
 });

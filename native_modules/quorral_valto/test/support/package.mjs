@@ -3,15 +3,7 @@
 import assert from 'node:assert/strict';
 import { spawn } from 'node:child_process';
 import { once } from 'node:events';
-import {
-  cpSync,
-  existsSync,
-  mkdirSync,
-  mkdtempSync,
-  readdirSync,
-  rmSync,
-  symlinkSync,
-} from 'node:fs';
+import fs from 'node:fs';
 import { createRequire } from 'node:module';
 import os from 'node:os';
 import path from 'node:path';
@@ -23,7 +15,7 @@ export const repository = path.join(packageDir, '../..');
 
 const build = path.join(repository, 'build/release');
 const packaged = path.join(packageDir, 'prebuilds/linux-x64');
-export const binaryDir = existsSync(packaged) ? packaged : path.join(build, 'quorral_valto');
+export const binaryDir = fs.existsSync(packaged) ? packaged : path.join(build, 'quorral_valto');
 export const binaryFile = path.join(binaryDir, 'quorral_valto.node');
 const addons = process.env.QUORRAL_VALTO_TEST_ADDONS ?? path.join(build, 'test_addons');
 export const probePath = path.join(addons, 'probe.node');
@@ -38,8 +30,8 @@ export const WEIGHTS = shipped.filter(({ kind }) => kind !== 'NoiseDB').map(({ f
 
 /** A fresh folder that is removed when the test ends. */
 export function temporaryFolder(t) {
-  const folder = mkdtempSync(path.join(os.tmpdir(), 'quorral-'));
-  t.after(() => rmSync(folder, { recursive: true, force: true }));
+  const folder = fs.mkdtempSync(path.join(os.tmpdir(), 'quorral-'));
+  t.after(() => fs.rmSync(folder, { recursive: true, force: true }));
   return folder;
 }
 
@@ -47,20 +39,19 @@ export function temporaryFolder(t) {
 export function copyPackage(t, name = 'copy') {
   const folder = path.join(temporaryFolder(t), name, 'quorral_valto');
   for (const entry of ['package.json', 'index.cjs', 'index.mjs', 'lib']) {
-    cpSync(path.join(packageDir, entry), path.join(folder, entry), { recursive: true });
+    fs.cpSync(path.join(packageDir, entry), path.join(folder, entry), { recursive: true });
   }
   const target = path.join(folder, 'prebuilds/linux-x64');
-  mkdirSync(target, { recursive: true });
-  for (const file of readdirSync(binaryDir)) {
+  fs.mkdirSync(target, { recursive: true });
+  for (const file of fs.readdirSync(binaryDir)) {
     const [from, to] = [binaryDir, target].map((each) => path.join(each, file));
-    if (WEIGHTS.includes(file)) symlinkSync(from, to);
-    else cpSync(from, to);
+    if (WEIGHTS.includes(file)) fs.symlinkSync(from, to);
+    else fs.cpSync(from, to);
   }
   return folder;
 }
 
-// What every child finds defined: the package, the raw module, the probe, workers that start with the same
-// names.
+// What every child finds defined, and every worker of it.
 const PRELUDE = `
 const { Worker, parentPort, workerData } = require('node:worker_threads');
 const { once } = require('node:events');
@@ -77,11 +68,11 @@ const WITH_WORKERS = `const PRELUDE = ${JSON.stringify(PRELUDE)} + 'const PRELUD
 const REGISTRATION =
   /^(WEIGHT |WARNING weight isn't loaded| weigth file:|Warning Weight name|ERROR )/;
 
-/** { stdout, stderr } of a script that is expected to end with that code; no registration lines. */
-export async function run(script, { execArgv = [], env = {}, code = 0 } = {}) {
+/** { stdout, stderr } of a script that is expected to end well; no registration lines. */
+export async function run(script, { execArgv = [], env = {} } = {}) {
   const child = spawn(
     process.execPath,
-    [...execArgv, '-e', `'use strict';${WITH_WORKERS}${PRELUDE}${script}`],
+    ['--expose-gc', ...execArgv, '-e', `'use strict';${WITH_WORKERS}${PRELUDE}${script}`],
     { env: { ...process.env, ...env }, stdio: ['ignore', 'pipe', 'pipe'], timeout: 120_000 },
   );
   const output = { stdout: '', stderr: '' };
@@ -91,7 +82,7 @@ export async function run(script, { execArgv = [], env = {}, code = 0 } = {}) {
     });
   }
   const ended = await once(child, 'close');
-  assert.deepEqual(ended, [code, null], `${output.stdout}\n${output.stderr}`);
+  assert.deepEqual(ended, [0, null], `${output.stdout}\n${output.stderr}`);
   assert.doesNotMatch(output.stderr, /Sanitizer|runtime error/);
   const lines = output.stdout.split('\n').filter((line) => !REGISTRATION.test(line));
   return { ...output, stdout: lines.join('\n') };

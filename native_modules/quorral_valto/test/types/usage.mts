@@ -3,18 +3,14 @@ import * as valto from 'quorral_valto';
 
 export async function use(error: unknown, rate: valto.SampleRate): Promise<Int16Array> {
   if (error instanceof valto.ValtoError) {
-    const [code, native]: [valto.ValtoErrorCode, number | undefined] = [
-      error.code,
-      error.nativeCode,
-    ];
-    console.error(code, native);
+    const code: valto.ValtoErrorCode = error.code;
+    console.error(code, (error.nativeCode ?? 0).toFixed());
   }
   const names: string[] = [...(await valto.getNcModels()), ...(await valto.getVadModels())];
   valto.setNcModel(names[0] ?? null);
   valto.raw._getNcModels((list: string[]) => list.length);
   const frameMs: valto.FrameDuration = valto.FRAME_DURATIONS[0] ?? 10;
-  const options: valto.SessionOptions = { sampleRate: rate, frameMs, model: null };
-  using canceller = new valto.NoiseCanceller(options);
+  using canceller = new valto.NoiseCanceller({ sampleRate: rate, frameMs, model: null });
   using detector = new valto.VoiceActivityDetector({ sampleRate: 48000, frameMs: 20 });
   const frame: Int16Array = canceller.process(new Int16Array(canceller.frameSize));
   const score: number = detector.process(frame);
