@@ -1,12 +1,11 @@
-#include "utils/cyclic_block_data.h"
-
 #include <gtest/gtest.h>
 
 #include <deque>
 
 #include "support/random.h"
+#include "utils/cyclic_block_data.h"
+#include "utils/noise.h"
 
-using MORVA::CONTAINERS::CyclicBlockData;
 using test_support::Random;
 
 // Any legal sequence of appends and reads leaves the same samples as a plain queue, in the memory
@@ -16,7 +15,7 @@ TEST(CyclicBlockData, HoldsTheSamplesOfAPlainQueue) {
         Random random(seed);
         TRACE_SEED(random);
         std::size_t const capacity = random.between(1, 300);
-        CyclicBlockData queue(capacity);
+        MORVA::CONTAINERS::CyclicBlockData queue(capacity);
         float const* const storage = queue.data.data();
         std::deque<float> model;
         for (int step = 0; step < 400; ++step) {
@@ -41,10 +40,27 @@ TEST(CyclicBlockData, HoldsTheSamplesOfAPlainQueue) {
                     queue.start += hop;
                     model.erase(model.begin(), model.begin() + static_cast<std::ptrdiff_t>(hop));
             }
-            ASSERT_EQ(
-                std::vector<float>(queue.readPosition(), queue.readPosition() + queue.unread()),
-                std::vector<float>(model.begin(), model.end()));
+            auto const* const read = queue.readPosition();
+            ASSERT_EQ(std::deque<float>(read, read + queue.unread()), model);
             ASSERT_EQ(queue.data.data(), storage);
         }
     }
+}
+
+// Taking the oldest frame out of the mean leaves it in the history, so a following exchange takes
+// it out once more.
+TEST(Noise, TheOldestFrameCanBeTakenOutTwice) {
+    MORVA::UTILS::Noise noise(2, 1);
+    noise.fillWithSilence();
+    for (float const value : {4.0f, 8.0f}) {
+        noise.addFrameNoiseRemoveBack(&value, 1);
+        noise.calculateNoise();
+    }
+    EXPECT_EQ(noise.mean.front(), 6.0f);
+    noise.removeBackFrameInfoFromMean();
+    EXPECT_EQ(noise.mean.front(), 4.0f);
+    noise.addNullFrameNoiseRemoveBack();
+    noise.calculateNoise();
+    EXPECT_EQ(noise.mean.front(), 2.0f);
+    EXPECT_EQ(noise.frames.size(), 2u);
 }
