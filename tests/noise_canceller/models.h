@@ -66,9 +66,9 @@ inline std::vector<std::vector<float>> randomFrames(test_support::Random& random
             left = random.between(1, 12);
             gain = random.chance(0.2) ? 0.0F : std::pow(10.0F, random.uniform(0.5F, 4.0F));
         }
-        auto& frame = frames.emplace_back(random.normal(size, gain));
+        auto& frame = frames.emplace_back(random.normal(size));
         for (std::size_t i = 1; i < size; ++i) frame[i] += 0.6F * frame[i - 1];
-        for (float& v : frame) v = std::clamp(v, -32768.0F, 32767.0F);
+        for (float& v : frame) v = std::clamp(gain * v, -32768.0F, 32767.0F);
     }
     return frames;
 }

@@ -93,7 +93,7 @@ TEST(VoiceActivity, CalibrationNeedsThreePoints) {
     for (auto const& [range, middle] :
          {Points{{1, 3}, {1}}, Points{{-4, 3}, {3}}, Points{{-4}, {1}}, Points{{-4, 3}, {}}}) {
         VadShape const shape{.layers = 1, .calibration = {}};
-        auto const inputs = static_cast<std::size_t>(shape.hidden + 5 * shape.features());
+        auto const inputs = static_cast<std::size_t>(shape.inputs());
         WeightWriter front;
         front.add("WeightLinear", WeightWriter::Matrices{{std::vector<float>(inputs), inputs, 1}})
             .add("BaesLinear", WeightWriter::Vectors{{7.0F}})

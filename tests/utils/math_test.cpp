@@ -1,5 +1,6 @@
 // Transforms and products: right, and the same bits wherever the operands lie, which the promise of
-// reproducible output rests on.
+// reproducible output rests on; the edges of the statistics. (Their values are compared with the
+// reference in whole cleaners, as are the windows and the queues.)
 #include <gtest/gtest.h>
 #include <immintrin.h>
 
@@ -105,27 +106,26 @@ TEST_P(Products, AgreeWithDoubleSumsWhereverTheOperandsLie) {
     Matrix const biasMatrix{bias, 1, bias.size()};
     ErrorBound bound("matMulPlusB, relative to sqrt(terms), seed " + std::to_string(GetParam()),
                      4e-6);
-    Vector wanted, out(5);
-    matMulPlusB(W, across, biasMatrix, wanted);
-    addProduct(bound, wanted, W, {across, cols, 1}, bias);
-    matMulPlusB(W, across, bias, out);
-    EXPECT_EQ(out, wanted);
-    for (std::size_t offset = 0; offset < 16; ++offset) {
-        Vector x(offset);
-        x.insert(x.end(), across.begin(), across.end());
-        matMulPlusB(Matrix(W), x.data() + offset, cols, bias, out);
-        ASSERT_EQ(out, wanted) << "offset " << offset;
-    }
-    matMulPlusB(down, W, biasMatrix, wanted);
-    addProduct(bound, wanted, {down, 1, rows}, W, bias);
-    matMulPlusB(down, W, bias, out);
-    EXPECT_EQ(out, wanted);
-    for (std::size_t offset = 0; offset < 16; ++offset) {
-        Vector x(offset);
-        x.insert(x.end(), down.begin(), down.end());
-        matMulPlusB(x.data() + offset, rows, Matrix(W), bias, out);
-        ASSERT_EQ(out, wanted) << "offset " << offset;
-    }
+    Vector out(5);
+    auto const check = [&](bool first, Vector const& x) {
+        auto const product = [&](auto const&... operands) {
+            matMulPlusB(operands..., out);
+            return out;
+        };
+        auto const wanted = first ? product(x, W, biasMatrix) : product(W, x, biasMatrix);
+        if (first) addProduct(bound, wanted, {x, 1, rows}, W, bias);
+        if (!first) addProduct(bound, wanted, W, {x, cols, 1}, bias);
+        EXPECT_EQ(first ? product(x, W, bias) : product(W, x, bias), wanted);
+        for (std::size_t offset = 0; offset < 16; ++offset) {
+            Vector moved(offset);
+            moved.insert(moved.end(), x.begin(), x.end());
+            float const* const at = moved.data() + offset;
+            ASSERT_EQ(first ? product(at, rows, W, bias) : product(W, at, cols, bias), wanted)
+                << "offset " << offset;
+        }
+    };
+    check(true, down);
+    check(false, across);
     Matrix product;
     matMulPlusB(left, W, C, product);
     addProduct(bound, product.data, left, W, C.data);
@@ -155,6 +155,22 @@ TEST(MatMul, EdgesOfTheShapes) {
     EXPECT_EQ(out, (Vector{1, 2}));
     matMulPlusB(Matrix{{}, 2, 0}, Vector{}, Vector{3, 4}, out);
     EXPECT_EQ(out, (Vector{3, 4}));
+}
+
+// Taking the oldest frame out of the mean leaves it in the history, so a following exchange takes
+// it out once more.
+TEST(Noise, TheOldestFrameCanBeTakenOutTwice) {
+    Noise noise(2, 1);
+    noise.fillWithSilence();
+    for (float const value : {4.0f, 8.0f}) {
+        noise.addFrameNoiseRemoveBack(&value, 1);
+        noise.calculateNoise();
+    }
+    noise.removeBackFrameInfoFromMean();
+    EXPECT_EQ(noise.mean.front(), 4.0f);
+    noise.addNullFrameNoiseRemoveBack();
+    noise.calculateNoise();
+    EXPECT_EQ(noise.mean.front(), 2.0f);
 }
 
 TEST(Statistics, RefuseWindowsThatDivideByZero) {

@@ -10,7 +10,6 @@
 #include "support/temp_dir.h"
 
 using MORVA::UTILS::Path;
-using Row = std::array<wchar_t const*, 3>;
 
 // Whatever the components, the result has none to remove and names the same place as the standard
 // library's lexical form. A relative path stays.
@@ -37,24 +36,16 @@ TEST(Path, NormalizesLikeTheStandardLibrary) {
     EXPECT_FALSE(Path(L"").normalize());
 }
 
-TEST(Path, PutsAFrontBeforeRelativePaths) {
-    for (auto const& [text, front, wanted] :
-         {Row{L"/abs/file", L"/base", L"/abs/file"}, Row{L"file", L"/base", L"/base/file"},
-          Row{L"file", L"/base/", L"/base/file"}, Row{L"file", L"", L"file"},
-          Row{L"", L"/base", L"/base/"}}) {
+TEST(Path, PutsAFrontBeforeRelativePathsAndFindsTheExtension) {
+    using Row = std::array<wchar_t const*, 4>;
+    for (auto const& [text, front, wanted, extension] :
+         {Row{L"/a.b/file", L"/base", L"/a.b/file", L""},
+          Row{L"f.v2.MVW", L"/b", L"/b/f.v2.MVW", L"MVW"}, Row{L".mvw", L"/b/", L"/b/.mvw", L"mvw"},
+          Row{L"m.\x00e4", L"", L"m.\x00e4", L"\x00e4"}, Row{L"", L"/b", L"/b/", L""}}) {
         Path path(text);
         EXPECT_TRUE(path.pushFront(front));
         EXPECT_EQ(path.str(), wanted);
-    }
-}
-
-TEST(Path, FindsTheExtensionOfTheLastComponent) {
-    for (auto const& [path, wanted] : {std::pair{L"/a/model.v2.MVW", L"MVW"},
-                                       {L"/dir.d/file", L""},
-                                       {L"name.", L""},
-                                       {L"/a/.mvw", L"mvw"},
-                                       {L"m.\x00e4", L"\x00e4"}}) {
-        EXPECT_EQ(Path(path).getFileExtension(), wanted);
+        EXPECT_EQ(path.getFileExtension(), extension);
     }
 }
 

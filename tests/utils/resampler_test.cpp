@@ -117,7 +117,7 @@ TEST_P(RatePair, BlocksAreTheLibrarysStreamAfterTheLeadingZeros) {
         Random random(inBlock * 5000 + outBlock);
         std::vector<Block> blocks(12);
         for (auto& block : blocks) block = random.normal(inBlock, 3000.0f);
-        Resampler resampler(inBlock, outBlock);
+        Resampler resampler(inRate, outRate);
         auto const convert = [&] {
             Block all;
             for (Block block : blocks) {

@@ -4,7 +4,7 @@
 
 #include <sstream>
 
-#include "support/record_writer.h"
+#include "support/weight_writer.h"
 #include "weights/model_registry.h"
 
 namespace {
