@@ -1,6 +1,8 @@
-// Cleaners from weight bytes, without the C interface around them.
+// Cleaners from weight bytes, without the C interface around them, and sounds for them.
 #pragma once
 
+#include <algorithm>
+#include <cmath>
 #include <memory>
 #include <string>
 
@@ -9,6 +11,7 @@
 #include "noise_canceller/noise_db_cleaner_v0_0_1.h"
 #include "noise_canceller/vad_cleaner_v0_0_1.h"
 #include "support/captured_output.h"
+#include "support/random.h"
 #include "support/weight_writer.h"
 
 namespace cleaner_test {
@@ -32,22 +35,42 @@ inline void setText(ModelEnvironment const& model, std::string const& key, char 
 inline std::unique_ptr<NoiseCleaner> makeCleaner(int generation, ModelEnvironment const& model,
                                                  std::size_t frameMs) {
     using namespace MORVA::NOISE_CANCELLER;
-    using Maker = std::unique_ptr<NoiseCleaner> (*)(ModelEnvironment const&, std::size_t);
-    auto const of = []<class Cleaner>() -> Maker {
-        return [](ModelEnvironment const& m, std::size_t ms) -> std::unique_ptr<NoiseCleaner> {
-            return std::make_unique<Cleaner>(m, ms);
-        };
-    };
-    static Maker const makers[] = {of.template operator()<NoiseDBCleaner_v0_0_1>(),
-                                   of.template operator()<NoiseCleaner_v0_0_1>(),
-                                   of.template operator()<NoiseCleaner_v0_0_2>(),
-                                   of.template operator()<NoiseCleaner_v0_0_3>(),
-                                   of.template operator()<NoiseCleaner_v0_0_4>(),
-                                   of.template operator()<NoiseCleaner_v0_0_5>(),
-                                   of.template operator()<NoiseCleaner_v0_0_6>(),
-                                   of.template operator()<VadCleaner_v0_0_1>()};
     test_support::CapturedOutput const quiet(1);
-    return makers[generation](model, frameMs);
+    switch (generation) {
+        case 0:
+            return std::make_unique<NoiseDBCleaner_v0_0_1>(model, frameMs);
+        case 1:
+            return std::make_unique<NoiseCleaner_v0_0_1>(model, frameMs);
+        case 2:
+            return std::make_unique<NoiseCleaner_v0_0_2>(model, frameMs);
+        case 3:
+            return std::make_unique<NoiseCleaner_v0_0_3>(model, frameMs);
+        case 4:
+            return std::make_unique<NoiseCleaner_v0_0_4>(model, frameMs);
+        case 5:
+            return std::make_unique<NoiseCleaner_v0_0_5>(model, frameMs);
+        case 6:
+            return std::make_unique<NoiseCleaner_v0_0_6>(model, frameMs);
+        default:
+            return std::make_unique<VadCleaner_v0_0_1>(model, frameMs);
+    }
+}
+
+// Coloured noise in steps of loudness over 70 dB, with digital silence between.
+inline std::vector<std::vector<float>> randomFrames(test_support::Random& random, std::size_t count,
+                                                    std::size_t size) {
+    std::vector<std::vector<float>> frames;
+    float gain = 0.0F;
+    for (std::size_t left = 0; frames.size() < count; --left) {
+        if (left == 0) {
+            left = random.between(1, 12);
+            gain = random.chance(0.2) ? 0.0F : std::pow(10.0F, random.uniform(0.5F, 4.0F));
+        }
+        auto& frame = frames.emplace_back(random.normal(size));
+        for (std::size_t i = 1; i < size; ++i) frame[i] += 0.6F * frame[i - 1];
+        for (float& v : frame) v = std::clamp(gain * v, -32768.0F, 32767.0F);
+    }
+    return frames;
 }
 
 }  // namespace cleaner_test

@@ -1,10 +1,10 @@
 // Tunable parameters: ranges with their warnings, and what counts as a value. (Names, defaults and
 // both sources are seen where cleaners with random parameters are compared with the reference.)
-#include <gtest/gtest.h>
+#include <gmock/gmock.h>
 
 #include <clocale>
-#include <cmath>
 #include <cstdlib>
+#include <sstream>
 
 #include "models.h"
 #include "support/temp_dir.h"
@@ -14,18 +14,10 @@ using namespace cleaner_test;
 using test_support::randomNcWeight;
 using test_support::WeightWriter;
 using Params = MORVA::NOISE_CANCELLER::NoiseCleaner_v0_0_6::Params;
+// A value and what was printed.
+using Reading = std::pair<double, std::string>;
 
 namespace {
-
-struct Reading {
-    double value;
-    std::string printed;
-    bool operator==(Reading const&) const = default;
-};
-
-void PrintTo(Reading const& reading, std::ostream* out) {
-    *out << reading.value << ", printed: " << reading.printed;
-}
 
 // A parameter of which the environment says `text` (null: nothing) and the weight `stored`.
 template <class Member, class... Stored>
@@ -40,124 +32,106 @@ Reading read(std::string const& name, Member member, char const* text, Stored...
     return {static_cast<double>(params.*member), out.text()};
 }
 
+struct Number {
+    char const* name;
+    float Params::*member;
+    float byDefault;
+    Reading good;
+    std::vector<char const*> bad;
+    char const* warning;
+};
+Number const kNumbers[] = {
+    {"SMOOT_COEF",
+     &Params::smootCoef,
+     1,
+     {0.25, "0.25x"},
+     {"0", "-1", "1.0001", "nan", "x"},
+     "WARNING OF SMOOTH COEF NUMBER VALUE. IT MUST BE iIN INTERVALK (0,1] \n DEFAULT VALUE 1.f\n"},
+    {"CLIP_FIX_POINT",
+     &Params::clipFixPoint,
+     25000,
+     {32768, "32768"},
+     {"0", "32769", "-5", "0.9", "99999999999"},
+     "WARNING OF CLIP_FIX_POINT NUMBER VALUE. IT MUST BE IN INTERVALK (1,32768) \n "
+     "DEFAULT VALUE 25000\n"},
+    {"THRESH_CUT_REF_EN",
+     &Params::threshCutRefEn,
+     100,
+     {1000, " 1000"},
+     {"0", "1001", "x"},
+     "WARNING OF THRESH_CUT_REF VALUE. IT MUST BE iIN INTERVALK [1,1000] \n DEFAULT VALUE 100\n"},
+    {"RM_THRESHOLD",
+     &Params::rmThreshold,
+     0.5,
+     {1, "1e0"},
+     {"0", "1.01", "-0.5", "inf"},
+     "WARNING OF RM_THRESHOLD VALUE. IT MUST BE iIN INTERVALK [0.0,1.0] \n DEFAULT VALUE 0.5\n"},
+};
+
 }  // namespace
 
 // Out of range the built-in default counts, not the weight's value.
 TEST(Parameters, RangesAndTheirWarnings) {
-    struct Number {
-        char const* name;
-        float Params::*member;
-        float byDefault;
-        std::pair<char const*, double> good;
-        std::vector<char const*> bad;
-        std::string warning;
-    };
-    std::vector<Number> const numbers = {
-        {"SMOOT_COEF",
-         &Params::smootCoef,
-         1,
-         {"0.25x", 0.25},
-         {"0", "-1", "1.0001", "nan", "x"},
-         "WARNING OF SMOOTH COEF NUMBER VALUE. IT MUST BE iIN INTERVALK (0,1] \n "
-         "DEFAULT VALUE 1.f\n"},
-        {"CLIP_FIX_POINT",
-         &Params::clipFixPoint,
-         25000,
-         {"32768", 32768},
-         {"0", "32769", "-5", "0.9", "99999999999"},
-         "WARNING OF CLIP_FIX_POINT NUMBER VALUE. IT MUST BE IN INTERVALK (1,32768) \n "
-         "DEFAULT VALUE 25000\n"},
-        {"THRESH_CUT_REF_EN",
-         &Params::threshCutRefEn,
-         100,
-         {" 1000", 1000},
-         {"0", "1001", "x"},
-         "WARNING OF THRESH_CUT_REF VALUE. IT MUST BE iIN INTERVALK [1,1000] \n "
-         "DEFAULT VALUE 100\n"},
-        {"RM_THRESHOLD",
-         &Params::rmThreshold,
-         0.5,
-         {"1e0", 1},
-         {"0", "1.01", "-0.5", "inf"},
-         "WARNING OF RM_THRESHOLD VALUE. IT MUST BE iIN INTERVALK [0.0,1.0] \n "
-         "DEFAULT VALUE 0.5\n"},
-    };
-    for (auto const& n : numbers) {
+    for (auto const& n : kNumbers) {
         SCOPED_TRACE(n.name);
         Reading const refused{n.byDefault, n.warning};
-        EXPECT_EQ(read(n.name, n.member, n.good.first, 0.75F), (Reading{n.good.second, ""}));
+        EXPECT_EQ(read(n.name, n.member, n.good.second.c_str(), 0.75F), Reading(n.good.first, ""));
         for (char const* bad : n.bad) EXPECT_EQ(read(n.name, n.member, bad, 0.75F), refused) << bad;
         EXPECT_EQ(read(n.name, n.member, nullptr, 1e6F), refused);
         // In the weight, text is no number; a whole number serves only those that are whole.
-        EXPECT_EQ(read(n.name, n.member, nullptr, "0.25"), (Reading{n.byDefault, ""}));
-        bool const isWhole = n.byDefault > 1.0F;
-        EXPECT_EQ(read(n.name, n.member, nullptr, 64), (Reading{isWhole ? 64 : n.byDefault, ""}));
+        EXPECT_EQ(read(n.name, n.member, nullptr, "0.25"), Reading(n.byDefault, ""));
+        float const whole = n.byDefault > 1.0F ? 64.0F : n.byDefault;
+        EXPECT_EQ(read(n.name, n.member, nullptr, 64), Reading(whole, ""));
     }
-}
-
-TEST(Parameters, WholeNumbersOfTheBackgroundSpeakerStage) {
-    using P = Params;
-    EXPECT_EQ(read("BACKGROUND_SPEAKER_FIX_RUN_FRAME_COUNT", &P::runFrameCount, "7.9").value, 7);
-    EXPECT_EQ(read("BACKGROUND_SPEAKER_FIX_RUN_FRAME_COUNT", &P::runFrameCount, nullptr, 64).value,
-              40);
-    EXPECT_EQ(read("BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN", &P::runMinLen, "7.9").value, 7);
-    EXPECT_EQ(read("BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN", &P::runMinLen, nullptr, 64.0F).value, 2);
+    auto const runFrames = "BACKGROUND_SPEAKER_FIX_RUN_FRAME_COUNT";
+    EXPECT_EQ(read(runFrames, &Params::runFrameCount, "7.9").first, 7);
+    EXPECT_EQ(read(runFrames, &Params::runFrameCount, nullptr, 64).first, 40);
+    auto const runMinimum = "BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN";
+    EXPECT_EQ(read(runMinimum, &Params::runMinLen, "7.9").first, 7);
+    EXPECT_EQ(read(runMinimum, &Params::runMinLen, nullptr, 64.0F).first, 2);
 }
 
 TEST(Parameters, OneWordSwitchesOnAndTheOthersOff) {
     auto const isOn = [](auto... source) {
-        return read("SKIP_FRAME", &Params::skipFrame, source...).value != 0.0;
+        return read("SKIP_FRAME", &Params::skipFrame, source...).first != 0.0;
     };
     EXPECT_TRUE(isOn("TRUE", "f"));
     for (char const* text : {"true", "t", "1", "TRUE ", "FALSE"}) EXPECT_FALSE(isOn(text, "t"));
     EXPECT_TRUE(isOn(nullptr, "t"));
     for (char const* word : {"TRUE", "T", "", "f"}) EXPECT_FALSE(isOn(nullptr, word));
-    EXPECT_EQ(read("ENABLE_RESCALE", &Params::enableRescale, nullptr, 0).value, 1.0);  // no word
+    EXPECT_EQ(read("ENABLE_RESCALE", &Params::enableRescale, nullptr, 0).first, 1.0);  // no word
     // Volume brings the limiter with it, and says so every time.
     EXPECT_EQ(read("VOLUME_UP", &Params::enableClipFix, "TRUE"),
-              (Reading{1.0, "WARNING: Enabled Clip fix, because VolumeUp is Enabled\n"}));
+              Reading(1.0, "WARNING: Enabled Clip fix, because VolumeUp is Enabled\n"));
 }
 
 // Each missing value is the first that its model names. A value of the wrong type counts as
 // missing.
 TEST(Parameters, MissingValuesAreNamedInTheOrderOfReading) {
-    using Names = std::vector<std::string>;
-    Names const structure = {"SampleRate",  "Step",          "FiltrBegin",       "FiltrEnd",
-                             "FrameLength", "PreviewFrames", "CoefficientNumber"};
-    Names const learned = {
-        "MU",        "SD",     "WeightLinear", "WeightNonLinear", "BaesLinear", "BaesNonLinear",
-        "WeightGRU", "BaesGRU"};
-    Names const normed = {"WeightGRU_reset", "BiasGRU_reset",     "GainLinearNorm",
-                          "BiasLinearNorm",  "GainNonLinearNorm", "BiasNonLinearNorm"};
-    auto const joined = [](std::initializer_list<Names> parts) {
-        Names all;
-        for (auto const& part : parts) all.insert(all.end(), part.begin(), part.end());
-        return all;
-    };
-    auto const named = [](int model, std::string const& weight, Names missing) {
-        Names order;
-        while (!missing.empty()) {
+    std::string const structure =
+        "SampleRate Step FiltrBegin FiltrEnd FrameLength PreviewFrames CoefficientNumber ";
+    std::string const learned =
+        "MU SD WeightLinear WeightNonLinear BaesLinear BaesNonLinear WeightGRU BaesGRU ";
+    std::string const normed =
+        "WeightGRU_reset BiasGRU_reset GainLinearNorm BiasLinearNorm GainNonLinearNorm "
+        "BiasNonLinearNorm ";
+    auto const expectOrder = [](int model, std::string const& weight, std::string order) {
+        while (!order.empty()) {
+            auto const next = order.substr(0, order.find(' '));
             WeightWriter front;
-            for (auto const& name : missing) front.add(name, "text");
-            try {
-                makeCleaner(model, modelFrom(front.bytes() + weight), 10);
-                return Names{"none"};
-            } catch (MORVA::UTILS::MORVA_Exception const& failure) {
-                std::string const text = failure.what();
-                auto const at = text.find("Key: ") + 5;
-                order.push_back(text.substr(at, text.rfind("doesn't") - at));
-            }
-            if (std::erase(missing, order.back()) == 0) return order;
+            std::istringstream names(order);
+            for (std::string name; names >> name;) front.add(name, "text");
+            EXPECT_THAT([&] { makeCleaner(model, modelFrom(front.bytes() + weight), 10); },
+                        testing::ThrowsMessage<MORVA::UTILS::MORVA_Exception>(
+                            testing::HasSubstr("Key: " + next + "doesn't")))
+                << "model " << model;
+            order.erase(0, next.size() + 1);
         }
-        return order;
     };
     auto const older = randomNcWeight({.version = "0.0.5"});
-    auto order = joined({structure, learned, normed});
-    EXPECT_EQ(named(6, randomNcWeight({}), {order.rbegin(), order.rend()}), order);
-    order = joined({learned, structure});
-    for (int model : {0, 5}) EXPECT_EQ(named(model, older, {order.rbegin(), order.rend()}), order);
-    order = joined({learned, {"SampleRate", "FrameLength"}});
-    EXPECT_EQ(named(7, test_support::randomVadWeight({}), {order.rbegin(), order.rend()}), order);
+    expectOrder(6, randomNcWeight({}), structure + learned + normed);
+    for (int const model : {0, 5}) expectOrder(model, older, learned + structure);
+    expectOrder(7, test_support::randomVadWeight({}), learned + "SampleRate FrameLength ");
 }
 
 // In a host whose numbers have a decimal comma.
@@ -169,8 +143,8 @@ TEST(Parameters, TheHostsLocaleDoesNotMatter) {
     setenv("LOCPATH", folder.path().c_str(), 1);
     if (std::setlocale(LC_ALL, "comma") == nullptr) GTEST_SKIP() << "no locale to be had";
     EXPECT_EQ(std::strtod("0,25", nullptr), 0.25);
-    EXPECT_EQ(read("SMOOT_COEF", &Params::smootCoef, "0.25").value, 0.25);
-    EXPECT_EQ(read("CLIP_FIX_POINT", &Params::clipFixPoint, "+1000.9").value, 1000);
+    EXPECT_EQ(read("SMOOT_COEF", &Params::smootCoef, "0.25").first, 0.25);
+    EXPECT_EQ(read("CLIP_FIX_POINT", &Params::clipFixPoint, "+1000.9").first, 1000);
     std::setlocale(LC_ALL, "C");
     unsetenv("LOCPATH");
 }

@@ -15,46 +15,35 @@ class CapturedOutput {
 public:
     // 1: standard output, 2: standard error.
     explicit CapturedOutput(int descriptor) : descriptor_(descriptor), saved_(dup(descriptor)) {
-        flush();
-        dup2(fileno(file_.get()), descriptor_);
+        direct(fileno(file_.get()));
     }
     CapturedOutput(CapturedOutput const&) = delete;
     CapturedOutput& operator=(CapturedOutput const&) = delete;
-    ~CapturedOutput() { stop(); }
+    ~CapturedOutput() {
+        direct(saved_);
+        close(saved_);
+    }
 
     // Ends the capture and returns the text.
     std::string text() {
-        stop();
-        std::string all;
+        direct(saved_);
+        std::string all(static_cast<std::size_t>(std::ftell(file_.get())), '\0');
         std::rewind(file_.get());
-        for (int c = std::fgetc(file_.get()); c != EOF; c = std::fgetc(file_.get())) {
-            all.push_back(static_cast<char>(c));
-        }
+        all.resize(std::fread(all.data(), 1, all.size(), file_.get()));
         return all;
     }
 
 private:
-    static void flush() {
+    void direct(int target) const {
         std::cout.flush();
         std::cerr.flush();
         std::fflush(nullptr);
+        dup2(target, descriptor_);
     }
-
-    void stop() {
-        if (saved_ < 0) return;
-        flush();
-        dup2(saved_, descriptor_);
-        close(saved_);
-        saved_ = -1;
-    }
-
-    struct Close {
-        void operator()(std::FILE* file) const { std::fclose(file); }
-    };
 
     int descriptor_;
     int saved_;
-    std::unique_ptr<std::FILE, Close> file_{std::tmpfile()};
+    std::unique_ptr<std::FILE, int (*)(std::FILE*)> file_{std::tmpfile(), &std::fclose};
 };
 
 }  // namespace test_support

@@ -3,9 +3,7 @@
 
 #include <gtest/gtest.h>
 
-#include <algorithm>
 #include <cmath>
-#include <cstddef>
 #include <cstdio>
 #include <span>
 #include <string>
@@ -19,9 +17,8 @@ inline double relativeError(std::span<float const> got, std::span<float const> w
     double error = 0.0;
     double signal = 0.0;
     for (std::size_t i = 0; i < std::min(got.size(), wanted.size()); ++i) {
-        double const difference = static_cast<double>(got[i]) - wanted[i];
-        error += difference * difference;
-        signal += static_cast<double>(wanted[i]) * wanted[i];
+        error += std::pow(static_cast<double>(got[i]) - wanted[i], 2);
+        signal += std::pow(static_cast<double>(wanted[i]), 2);
     }
     return std::sqrt(error / signal);
 }
@@ -31,7 +28,6 @@ public:
     ErrorBound(std::string what, double limit) : what_(std::move(what)), limit_(limit) {}
     ErrorBound(ErrorBound const&) = delete;
     ErrorBound& operator=(ErrorBound const&) = delete;
-
     ~ErrorBound() {
         std::printf("[    bound ] %s: %.3g (limit %.3g, %zu values)\n", what_.c_str(), worst_,
                     limit_, count_);
@@ -42,8 +38,8 @@ public:
     // `scale` is what an error of 1 would mean; a NaN on one side only is an endless error.
     void add(double got, double wanted, double scale = 1.0) {
         ++count_;
-        if (std::isnan(got) && std::isnan(wanted)) return;
-        double const error = got == wanted ? 0.0 : std::abs(got - wanted) / scale;
+        if (got == wanted || (std::isnan(got) && std::isnan(wanted))) return;
+        double const error = std::abs(got - wanted) / scale;
         worst_ = std::max(worst_, std::isnan(error) ? HUGE_VAL : error);
     }
 

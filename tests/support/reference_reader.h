@@ -5,11 +5,10 @@
 #include <cstdint>
 #include <cstring>
 #include <map>
-#include <optional>
 #include <string>
 #include <string_view>
 
-#include "support/record_writer.h"
+#include "support/weight_writer.h"
 #include "weights/any_map.h"
 
 namespace test_support {
@@ -23,93 +22,71 @@ public:
 
     Records read() {
         Records records;
-        while (true) {
-            auto const start = at_;
-            auto const length = u32();
-            if (!length || !skip(*length)) return records;
-            auto const name = data_.substr(start + 4, *length);
-            auto const code = u32();
-            if (!code) return records;
-            if (*code > 6) continue;
-            if (!skipValue(*code)) return records;
-            records.try_emplace(std::string(name), data_.substr(start, at_ - start));
+        try {
+            while (true) {
+                auto const start = at_;
+                auto const length = u32();
+                skip(length);
+                auto const name = data_.substr(start + 4, length);
+                auto const code = u32();
+                if (code > 6) continue;
+                skipValue(code);
+                records.try_emplace(std::string(name), data_.substr(start, at_ - start));
+            }
+        } catch (Cut const&) {
+            return records;
         }
     }
 
 private:
-    bool skip(std::uint64_t size) {
-        if (size > data_.size() - at_) return false;
+    struct Cut {};
+
+    void skip(std::uint64_t size) {
+        if (size > data_.size() - at_) throw Cut();
         at_ += size;
-        return true;
     }
-    std::optional<std::uint32_t> u32() {
+    std::uint64_t u32() {
         auto const start = at_;
-        if (!skip(4)) return std::nullopt;
+        skip(4);
         std::uint32_t value = 0;
         std::memcpy(&value, data_.data() + start, 4);
         return value;
     }
-    bool skipList(bool ofMatrices) {
-        auto const count = u32();
-        if (!count) return false;
-        for (std::uint32_t i = 0; i < *count; ++i) {
-            if (!(ofMatrices ? skipMatrix() : skipElements(4))) return false;
-        }
-        return true;
-    }
-    bool skipElements(std::uint64_t size) {
-        auto const count = u32();
-        return count && skip(*count * size);
-    }
-    bool skipMatrix() {
+    void skipMatrix() {
         auto const rows = u32();
         auto const cols = u32();
-        return rows && cols && *cols <= 0x7fffffffU && skipFloats(*rows, *cols);
+        if (cols > 0x7fffffffU || (rows > 0 && cols > data_.size() / rows)) throw Cut();
+        skip(rows * cols * 4);
     }
-    bool skipFloats(std::uint64_t rows, std::uint64_t cols) {
-        return rows == 0 || cols <= (data_.size() - at_) / 4 / rows ? skip(rows * cols * 4) : false;
-    }
-    bool skipValue(std::uint32_t code) {
-        switch (code) {
-            case 2:
-                return skipElements(1);
-            case 3:
-                return skipElements(4);
-            case 4:
-                return skipMatrix();
-            case 5:
-                return skipList(false);
-            case 6:
-                return skipList(true);
-            default:
-                return skip(4);
-        }
+    void skipValue(std::uint64_t code) {
+        if (code < 2) return skip(4);
+        if (code == 2) return skip(u32());
+        if (code == 3) return skip(4 * u32());
+        if (code == 4) return skipMatrix();
+        for (auto count = u32(); count > 0; --count) skipValue(code - 2);
     }
 
     std::string_view data_;
     std::size_t at_ = 0;
 };
 
-template <class T>
-bool writeBack(Records& records, MORVA::CONTAINERS::AnyMap const& values, std::string const& name) {
-    auto const value = values.find<T>(name);
-    if (value != nullptr) records[name] = WeightWriter().add(name, *value).bytes();
-    return value != nullptr;
-}
-
-inline Records writeBack(MORVA::CONTAINERS::AnyMap const& values) {
+template <class... Types>
+Records writeBackAs(MORVA::CONTAINERS::AnyMap const& values) {
     Records records;
+    auto const isWritten = [&]<class T>(std::string const& name, T const* value) {
+        if (value != nullptr) records[name] = WeightWriter().add(name, *value).bytes();
+        return value != nullptr;
+    };
     for (auto const& [name, object] : values) {
-        bool const known = writeBack<float>(records, values, name) ||
-                           writeBack<int>(records, values, name) ||
-                           writeBack<std::string>(records, values, name) ||
-                           writeBack<WeightWriter::Vector>(records, values, name) ||
-                           writeBack<WeightWriter::Matrix>(records, values, name) ||
-                           writeBack<WeightWriter::Vectors>(records, values, name) ||
-                           writeBack<WeightWriter::Matrices>(records, values, name);
+        bool const known = (isWritten(name, values.find<Types>(name).get()) || ...);
         if (!known) records[name] = "unknown type";
     }
     return records;
+}
+
+inline Records writeBack(MORVA::CONTAINERS::AnyMap const& values) {
+    return writeBackAs<float, int, std::string, WeightWriter::Vector, WeightWriter::Matrix,
+                       WeightWriter::Vectors, WeightWriter::Matrices>(values);
 }
 
 }  // namespace test_support

@@ -4,13 +4,16 @@
 #include <stdlib.h>
 
 #include <filesystem>
+#include <fstream>
 #include <stdexcept>
 #include <string>
 #include <string_view>
 
-#include "support/record_writer.h"
-
 namespace test_support {
+
+inline void writeFile(std::filesystem::path const& path, std::string_view bytes) {
+    std::ofstream(path, std::ios::binary).write(bytes.data(), static_cast<long>(bytes.size()));
+}
 
 class TempDir {
 public:

@@ -1,16 +1,83 @@
-// Writes whole models for tests, with consistent shapes. Everything is a function of its arguments
-// (seeds included), so a failing case can be made again.
+// Writes weight data for tests: single records of every type, and whole models with consistent
+// shapes. Everything is a function of its arguments (seeds included), so a failing case can be made
+// again.
 #pragma once
 
 #include <algorithm>
 #include <cmath>
+#include <cstdint>
 #include <random>
 #include <string>
+#include <string_view>
 #include <vector>
 
-#include "support/record_writer.h"
+#include "kernels/matrix.h"
 
 namespace test_support {
+
+// Appends records; every add returns the writer for chaining.
+class WeightWriter {
+public:
+    using Vector = std::vector<float>;
+    using Vectors = std::vector<Vector>;
+    using Matrix = MORVA::CONTAINERS::Matrix;
+    using Matrices = std::vector<Matrix>;
+
+    // Building blocks, for hostile data too.
+    template <class Number>
+    WeightWriter& number(Number value) {
+        static_assert(sizeof(value) == 4);
+        return raw({reinterpret_cast<char const*>(&value), sizeof(value)});
+    }
+    WeightWriter& raw(std::string_view bytes) {
+        bytes_.append(bytes);
+        return *this;
+    }
+    WeightWriter& header(std::string_view name, std::int32_t typeCode) {
+        return count(name.size()).raw(name).number(typeCode);
+    }
+
+    WeightWriter& add(std::string_view name, float value) { return header(name, 0).number(value); }
+    WeightWriter& add(std::string_view name, int value) { return header(name, 1).number(value); }
+    WeightWriter& add(std::string_view name, std::string_view value) {
+        return header(name, 2).count(value.size()).raw(value);
+    }
+    WeightWriter& add(std::string_view name, char const* value) {
+        return add(name, std::string_view(value));
+    }
+    WeightWriter& add(std::string_view name, Vector const& value) {
+        return header(name, 3).block(value);
+    }
+    WeightWriter& add(std::string_view name, Matrix const& value) {
+        return header(name, 4).block(value);
+    }
+    WeightWriter& add(std::string_view name, Vectors const& value) {
+        return header(name, 5).blocks(value);
+    }
+    WeightWriter& add(std::string_view name, Matrices const& value) {
+        return header(name, 6).blocks(value);
+    }
+
+    std::string const& bytes() const { return bytes_; }
+
+private:
+    WeightWriter& count(std::size_t value) { return number(static_cast<std::uint32_t>(value)); }
+    WeightWriter& floats(Vector const& values) {
+        return raw({reinterpret_cast<char const*>(values.data()), values.size() * sizeof(float)});
+    }
+    WeightWriter& block(Vector const& value) { return count(value.size()).floats(value); }
+    WeightWriter& block(Matrix const& value) {
+        return count(value.rows).count(value.cols).floats(value.data);
+    }
+    template <class Values>
+    WeightWriter& blocks(Values const& values) {
+        count(values.size());
+        for (auto const& value : values) block(value);
+        return *this;
+    }
+
+    std::string bytes_;
+};
 
 // A noise-cancellation weight of version "0.0.1" to "0.0.6". What a generation does not have is
 // left out: reset gate and normalisation before 0.0.6, band compression before 0.0.4, the gate
@@ -31,13 +98,13 @@ struct NcShape {
     std::string timeStamp = "210301";
 
     int generation() const { return version.back() - '0'; }
-    int bands() const { return filtrEnd - filtrBegin; }
     int compressedBands() const {
         int const depth = generation() >= 4 ? compressRate : 0;
-        return bands() * (depth + 2) >> (depth + 1);
+        return (filtrEnd - filtrBegin) * (depth + 2) >> (depth + 1);
     }
-    int stateWidth() const { return generation() >= 3 ? hidden : 0; }
-    int features() const { return previewFrames * compressedBands(); }
+    int inputs() const {
+        return (generation() >= 3 ? hidden : 0) + previewFrames * compressedBands();
+    }
     int coefficients() const { return frameLength / 2 + 1; }
 };
 
@@ -53,22 +120,10 @@ struct VadShape {
     std::string modelName = "test_vad";
     std::string timeStamp = "210301";
 
-    // Log-energy bands: the lower quarter of the bins, then pairs, then fours.
-    int features() const {
-        int const bins = frameLength / 2 + 1;
-        int const odd = bins % 8 == 1 ? 1 : 0;
-        int count = bins / 4 + odd;
-        int width = 2;
-        int boundary = bins / 4 * 2;
-        for (int i = count; i < bins; i += width, ++count) {
-            if (i - odd == boundary) {
-                width *= 2;
-                boundary *= 2;
-            }
-        }
-        return count;
-    }
-    static constexpr int contextFrames = 5;
+    // Log-energy bands: the lower quarter of the bins, then pairs up to the half, then fours; of a
+    // frame length that 16 divides.
+    int features() const { return 1 + frameLength / 4; }
+    int inputs() const { return hidden + 5 * features(); }
 };
 
 // Seeded source of parameters; matrices are scaled by their fan-in, so that outputs stay of order
@@ -85,10 +140,23 @@ public:
         for (auto& value : values) value = range(engine_);
         return values;
     }
-    MORVA::CONTAINERS::Matrix matrix(int rows, int cols) {
+    WeightWriter::Vectors vectors(int count, int size, float low, float high) {
+        WeightWriter::Vectors values;
+        while (count-- > 0) values.push_back(vector(size, low, high));
+        return values;
+    }
+    WeightWriter::Matrix matrix(int rows, int cols) {
         auto const scale = matrixGain_ * std::sqrt(3.0F / static_cast<float>(rows));
         return {vector(rows * cols, -scale, scale), static_cast<std::size_t>(rows),
                 static_cast<std::size_t>(cols)};
+    }
+    // Layer 0 takes `inputs` values, every later one `hidden`; the last is `outputs` wide.
+    WeightWriter::Matrices layers(int count, int inputs, int hidden, int outputs) {
+        WeightWriter::Matrices values;
+        for (int i = 0; i < count; ++i) {
+            values.push_back(matrix(i == 0 ? inputs : hidden, i == count - 1 ? outputs : hidden));
+        }
+        return values;
     }
 
 private:
@@ -98,54 +166,39 @@ private:
 
 namespace DETAIL {
 
-inline WeightWriter::Vectors vectors(RandomValues& random, int count, int size, float low,
-                                     float high) {
-    WeightWriter::Vectors values;
-    for (int i = 0; i < count; ++i) values.push_back(random.vector(size, low, high));
-    return values;
-}
-
-// Layer 0 takes `inputs` values, every later one `hidden`; the last is `outputs` wide.
-inline WeightWriter::Matrices layers(RandomValues& random, int count, int inputs, int hidden,
-                                     int outputs) {
-    WeightWriter::Matrices values;
-    for (int i = 0; i < count; ++i) {
-        values.push_back(
-            random.matrix(i == 0 ? inputs : hidden, i == count - 1 ? outputs : hidden));
-    }
-    return values;
-}
-
-inline void addNcStructure(WeightWriter& writer, NcShape const& shape) {
-    auto suffix = "_v" + shape.version;
-    std::ranges::replace(suffix, '.', '_');
-    writer.add("Version", shape.version)
+// What every weight begins with.
+template <class Shape>
+WeightWriter frontOf(Shape const& shape, std::string_view version) {
+    WeightWriter writer;
+    return writer.add("Version", version)
         .add("SampleRate", shape.sampleRate)
         .add("FrameLength", shape.frameLength)
         .add("ModelName", shape.modelName)
-        .add("TimeStamp", shape.timeStamp)
-        .add("Step", shape.frameLength / 2)
-        .add("FiltrBegin", shape.filtrBegin)
-        .add("FiltrEnd", shape.filtrEnd)
-        .add("PreviewFrames", shape.previewFrames)
-        .add("CoefficientNumber", shape.coefficients())
-        .add("CONTROL_MORVA_COMPRESS_RATE" + suffix, shape.compressRate);
+        .add("TimeStamp", shape.timeStamp);
 }
 
 // A `matrixGain` of 0 makes every product 0; `outputBias` is what the output layer adds.
 inline std::string ncWeight(NcShape const& shape, float matrixGain, float outputBias) {
-    RandomValues random(shape.seed, matrixGain);
-    WeightWriter writer;
-    addNcStructure(writer, shape);
+    auto suffix = "_v" + shape.version;
+    std::ranges::replace(suffix, '.', '_');
     int const h = shape.hidden;
-    int const inputs = shape.stateWidth() + shape.features();
+    int const inputs = shape.inputs();
     int const k = shape.compressedBands();
     int const hiddenLayers = shape.layers - 1;
-    writer.add("MU", random.vector(k, 6.0F, 12.0F)).add("SD", random.vector(k, 1.0F, 4.0F));
-    writer.add("WeightLinear", layers(random, hiddenLayers, inputs, h, h))
-        .add("BaesLinear", vectors(random, hiddenLayers, h, -0.5F, 0.5F))
-        .add("WeightNonLinear", layers(random, shape.layers, inputs, h, k));
-    auto biases = vectors(random, hiddenLayers, h, -0.5F, 0.5F);
+    RandomValues random(shape.seed, matrixGain);
+    auto writer = frontOf(shape, shape.version);
+    writer.add("Step", shape.frameLength / 2)
+        .add("FiltrBegin", shape.filtrBegin)
+        .add("FiltrEnd", shape.filtrEnd)
+        .add("PreviewFrames", shape.previewFrames)
+        .add("CoefficientNumber", shape.coefficients())
+        .add("CONTROL_MORVA_COMPRESS_RATE" + suffix, shape.compressRate)
+        .add("MU", random.vector(k, 6.0F, 12.0F))
+        .add("SD", random.vector(k, 1.0F, 4.0F))
+        .add("WeightLinear", random.layers(hiddenLayers, inputs, h, h))
+        .add("BaesLinear", random.vectors(hiddenLayers, h, -0.5F, 0.5F))
+        .add("WeightNonLinear", random.layers(shape.layers, inputs, h, k));
+    auto biases = random.vectors(hiddenLayers, h, -0.5F, 0.5F);
     biases.emplace_back(static_cast<std::size_t>(k), outputBias);
     writer.add("BaesNonLinear", biases);
     if (shape.generation() >= 3) {
@@ -156,8 +209,8 @@ inline std::string ncWeight(NcShape const& shape, float matrixGain, float output
         writer.add("WeightGRU_reset", random.matrix(inputs, h))
             .add("BiasGRU_reset", random.vector(h, -1.0F, 1.0F));
         for (std::string const branch : {"LinearNorm", "NonLinearNorm"}) {
-            writer.add("Gain" + branch, vectors(random, hiddenLayers, h, 0.5F, 1.5F))
-                .add("Bias" + branch, vectors(random, hiddenLayers, h, -0.5F, 0.5F));
+            writer.add("Gain" + branch, random.vectors(hiddenLayers, h, 0.5F, 1.5F))
+                .add("Bias" + branch, random.vectors(hiddenLayers, h, -0.5F, 0.5F));
         }
     }
     return writer.bytes();
@@ -180,23 +233,17 @@ inline std::string identityNcWeight(NcShape shape) {
 }
 
 inline std::string randomVadWeight(VadShape const& shape) {
-    RandomValues random(shape.seed);
-    WeightWriter writer;
     int const h = shape.hidden;
-    int const inputs = h + VadShape::contextFrames * shape.features();
-    writer.add("Version", "VAD_0.0.1")
-        .add("SampleRate", shape.sampleRate)
-        .add("FrameLength", shape.frameLength)
-        .add("ModelName", shape.modelName)
-        .add("TimeStamp", shape.timeStamp)
-        .add("MU", random.vector(shape.features(), 6.0F, 12.0F))
+    RandomValues random(shape.seed);
+    auto writer = DETAIL::frontOf(shape, "VAD_0.0.1");
+    writer.add("MU", random.vector(shape.features(), 6.0F, 12.0F))
         .add("SD", random.vector(shape.features(), 1.0F, 16.0F))
-        .add("WeightGRU", random.matrix(inputs, shape.gates))
+        .add("WeightGRU", random.matrix(shape.inputs(), shape.gates))
         .add("BaesGRU", random.vector(shape.gates, -1.0F, 1.0F));
     for (std::string const branch : {"Linear", "NonLinear"}) {
-        auto biases = DETAIL::vectors(random, shape.layers - 1, h, -0.5F, 0.5F);
+        auto biases = random.vectors(shape.layers - 1, h, -0.5F, 0.5F);
         biases.push_back(random.vector(1, -0.5F, 0.5F));
-        writer.add("Weight" + branch, DETAIL::layers(random, shape.layers, inputs, h, 1))
+        writer.add("Weight" + branch, random.layers(shape.layers, shape.inputs(), h, 1))
             .add("Baes" + branch, biases);
     }
     if (shape.calibration.size() == 3) {
