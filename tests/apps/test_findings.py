@@ -22,8 +22,7 @@ def find(morva, model, recording, tmp_path):
         if form == "csv":
             assert morva(*arguments, "-o", tmp_path / "found.csv").stdout == ""
             return list(csv.DictReader((tmp_path / "found.csv").open()))
-        said = morva(*arguments, *(["--format", form] if form == "json" else [])).stdout
-        return json.loads(said) if form == "json" else said.splitlines()
+        return json.loads(morva(*arguments, "--format", "json").stdout)
 
     return run
 
@@ -65,26 +64,19 @@ def test_scores_lie_where_the_sound_is_and_segments_follow_the_rules(find, seed)
     assert page["speech_s"] == pytest.approx(sum(found[1::2]) / 1000 - sum(found[::2]) / 1000)
 
 
-def test_csv_and_text_tell_the_same_as_json(find):
+def test_csv_tells_the_same_as_json(find):
     case = ("vad", loudness_voice(), speechlike(48000, 3.0, 1), 48000)
-    page, table, text = (find(*case, form=form) for form in ("json", "csv", "text"))
-    times = np.arange(len(page["scores"])) / 100
+    page, table = find(*case), find(*case, form="csv")
     assert [float(r["score"]) for r in table] == pytest.approx(page["scores"], abs=1e-6)
-    assert [float(r["time_s"]) for r in table] == pytest.approx(times)
-    spoken = [any(s["start_s"] <= t < s["end_s"] for s in page["segments"]) for t in times + 0.005]
+    times = [float(r["time_s"]) + 0.005 for r in table]
+    spoken = [any(s["start_s"] <= t < s["end_s"] for s in page["segments"]) for t in times]
     assert [r["speech"] == "1" for r in table] == spoken and any(spoken)
-    assert len(text) == len(page["segments"]) + 2
-    assert [float(x) for x in text[1].split()[:2]] == pytest.approx(list(page["segments"][0].values()), abs=1e-3)
 
 
 def test_channels_are_averaged_and_names_may_be_any_bytes(find):
     sound = speechlike(16000, 1.0, 1)
-    silent, both, alone = (
-        find("vad", loudness_voice(), np.hstack(channels), 16000, name=name)["scores"]
-        for name, channels in [("-.wav", [sound, -sound]), ("\udcff.wav", [sound, sound]), ("a.wav", [sound])]
-    )
-    assert max(silent) < 0.3
-    assert both == alone
+    scores = find("vad", loudness_voice(), np.hstack([sound, -sound]), 16000, name="\udcff.wav")["scores"]
+    assert max(scores) < 0.3
 
 
 @pytest.mark.parametrize("rate", RATES)
@@ -96,52 +88,24 @@ def test_what_is_removed_is_the_level(find, rate, level):
     assert levels[:, 1] - levels[:, 2] == pytest.approx(90.309, abs=1e-3)
     assert 10 * np.log10(np.mean(10 ** (levels[100:200, 2] / 10))) == pytest.approx(level, abs=0.5)
     assert levels[:, 0] == pytest.approx(np.arange(len(levels)) / 100)
-    assert find("level", noise_level(), noise[:0], rate, form="text") == ["no frames"]
-
-
-def facts(morva, path, *options, **more):
-    return json.loads(morva("inspect", path, "--json", *options, **more).stdout)
+    assert find("level", noise_level(), noise[:0], rate, form="csv") == []
 
 
 @pytest.mark.parametrize("path", sorted((SOURCE / "models").glob("*.mvw")), ids=lambda path: path.name)
 def test_shipped_models_run_and_are_described_as_written(morva, path):
-    page, written, numbers = facts(morva, path), mvw.read(path), 0
+    page, written = json.loads(morva("inspect", path, "--json").stdout), mvw.read(path)
     assert page["runs"] is True and page["reason"] == ""
-    assert [entry["name"] for entry in page["values"]] == sorted(written)
-    for entry in page["values"]:
-        value = written[entry["name"]]
-        assert entry["type"] == TYPES[mvw.type_code(value)]
-        if isinstance(value, bytes):
-            assert entry["value"] == value.decode()
-            continue
-        parts = [np.asarray(part, float) for part in (value if isinstance(value, list) else [value])]
-        assert entry.get("shape", "") == " ".join("x".join(map(str, part.shape)) for part in parts)
-        flat = np.concatenate([part.ravel() for part in parts])
-        assert [entry["min"], entry["max"], entry["mean"]] == pytest.approx(
-            [flat.min(), flat.max(), flat.mean()], abs=1e-6
-        )
-        numbers += flat.size if "shape" in entry else 0
-    assert page["parameters"] == numbers
-
-
-@pytest.mark.parametrize("ms", [10, 40])
-@pytest.mark.parametrize(
-    ("values", "kind"), [(constant_mask, "noise cancellation"), (loudness_voice, "voice activity")]
-)
-def test_cost_and_latency(morva, model, values, kind, ms):
-    page = facts(morva, model(values()), "--frame", ms)
-    cleans = values is constant_mask
-    lists = [value if isinstance(value, list) else [value] for value in values().values()]
-    products = sum(part.size for parts in lists for part in parts if getattr(part, "ndim", 0) == 2)
-    assert page["multiply_adds_per_second"] == pytest.approx(products * (100 if cleans else 1000 / ms))
-    assert (page["runs"], page["kind"], page["latency_ms"]) == (True, kind, 10 if cleans else None)
+    types = {name: TYPES[mvw.type_code(value)] for name, value in written.items()}
+    assert {entry["name"]: entry["type"] for entry in page["values"]} == types
+    parts = [part for value in written.values() for part in (value if isinstance(value, list) else [value])]
+    assert page["parameters"] == sum(part.size for part in parts if isinstance(part, np.ndarray))
 
 
 def test_what_is_odd_is_shown_and_steers_no_terminal(morva, model):
     values = constant_mask() | {"na\x07me": 0.5, "ModelName": "ä\x1b[31m".encode() + b"\xff"}
     values["MU"] = np.array([np.nan, 5, np.inf, -np.inf] * 20)
     path = model(values)
-    entries = {entry["name"]: entry for entry in facts(morva, path)["values"]}
+    entries = {entry["name"]: entry for entry in json.loads(morva("inspect", path, "--json").stdout)["values"]}
     assert [entries["MU"][name] for name in ("not_finite", "min", "max")] == [60, 5, 5]
     assert (entries["na\x07me"]["type"], float(entries["na\x07me"]["value"])) == ("float", 0.5)
     text = morva("inspect", path, encoding="latin1").stdout

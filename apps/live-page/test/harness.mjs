@@ -6,8 +6,8 @@ const { initialize, NoiseCanceller, VoiceActivityDetector } = require('quorral_v
 initialize();
 
 /** A server that ends with the test. */
-export async function serve(t, options = {}, start = startServer) {
-  const server = await start(options);
+export async function serve(t, options = {}) {
+  const server = await startServer(options);
   t.after(() => void server.close());
   return server;
 }

@@ -93,13 +93,6 @@ const TAP = `
 browsing('a recording survives its connection; the next one is heard when asked', async (t) => {
   const { page, server, complaints, problem } = await visit(t, { prelude: TAP });
   await page.click('#record');
-  for (const range of ['0.01 0.5', '0.5 1']) {
-    await page.waitForFunction((text) => {
-      const [low, high] = text.split(' ').map(Number);
-      const { value } = document.getElementById('voice');
-      return value > low && value <= high;
-    }, range);
-  }
   await recorded(page, 1.5);
   await server.close();
   await problem('the server ends');
@@ -120,8 +113,6 @@ browsing('a recording survives its connection; the next one is heard when asked'
   await page.uncheck('#monitor');
   await page.waitForFunction(() => globalThis.loudness() === 0);
   await recorded(page, seconds + 4);
-  const noiseLevel = await page.locator('#noise').evaluate((meter) => meter.value);
-  assert.ok(noiseLevel > -60 && noiseLevel < -15, `${noiseLevel} dB`);
   await page.selectOption('#model', 'small_NC_8k');
   await page.getByText('then small_NC_8k').waitFor();
   await page.click('#record');
@@ -147,17 +138,6 @@ browsing('a dropped file comes back cleaned, drawn, and again from another model
   const { samples, rate } = first.original;
   assert.deepEqual(first.cleaned.samples, directly(samples, rate, 'full_NC-ca03f4').samples);
   await pausesAreQuiet(page);
-  // Drawn with the next refresh of the screen.
-  await page.waitForFunction(() => {
-    const [noisy, cleaned] = ['before', 'after'].map((id) => {
-      const canvas = document.getElementById(id);
-      const { width, height } = canvas;
-      const pixels = canvas.getContext('2d').getImageData(0, 0, width, height).data;
-      return pixels.reduce((sum, value, i) => sum + (i % 4 === 3 ? 0 : value), 0) / width / height;
-    });
-    return cleaned > 60 && noisy > 1.5 * cleaned;
-  });
-
   await page.click('#play');
   await page.selectOption('#model', 'small_NC'); // and at once, in the middle of the sound, another
   await page.selectOption('#model', 'small_NC_8k');
@@ -208,18 +188,11 @@ browsing('a dropped file comes back cleaned, drawn, and again from another model
 browsing('what cannot be opened is put in words, and the page still works', async (t) => {
   const { page, complaints, problem } = await visit(t, {
     prelude: `MediaDevices.prototype.getUserMedia = async () => {
-      throw new DOMException('x', globalThis.reason);
+      throw new DOMException('x', 'NotAllowedError');
     };`,
   });
-  for (const [reason, pattern] of [
-    ['NotAllowedError', /may not use the microphone/],
-    ['NotFoundError', /No microphone was found/],
-    ['AbortError', /cannot be opened: x/],
-  ]) {
-    await page.evaluate(`globalThis.reason = '${reason}'`);
-    await page.click('#record');
-    await problem(pattern);
-  }
+  await page.click('#record');
+  await problem(/may not use the microphone/);
   await page.setInputFiles('#file', made('long.wav', 1, '-r 8000 -b 8', 'trim 0 601'));
   await problem(/"long\.wav" lasts about 11 minutes; this page takes up to 10 minutes/);
   const text = { name: 'x.mp3', mimeType: 'audio/mpeg', buffer: Buffer.from('hello') };

@@ -2,17 +2,12 @@
 // package's own, in step with what was sent.
 import assert from 'node:assert/strict';
 import { once } from 'node:events';
-import fs from 'node:fs';
 import { request } from 'node:http';
 import net from 'node:net';
-import path from 'node:path';
 import { test } from 'node:test';
 import { setTimeout as sleep } from 'node:timers/promises';
 import { noise, randomSource } from '../../../native_modules/quorral_valto/test/support/audio.mjs';
-import {
-  NC_MODELS as MODELS,
-  temporaryFolder,
-} from '../../../native_modules/quorral_valto/test/support/package.mjs';
+import { NC_MODELS as MODELS } from '../../../native_modules/quorral_valto/test/support/package.mjs';
 import { require } from '../dependencies.mjs';
 import { decodeResult, MAX_MESSAGE_BYTES } from '../page/protocol.mjs';
 import { namesOf } from '../server.mjs';
@@ -74,7 +69,6 @@ test('serves its page and nothing else, and takes connections from there only', 
   for (const [, name] of page.body.toString().matchAll(/(?:href|src)="([^"]+)"/g)) {
     assert.equal((await ask(url, { path: `/${name}` })).status, 200, name);
   }
-  assert.equal((await ask(url, { method: 'HEAD' })).body.length, 0);
   for (const wrong of ['/../server.mjs', '/%2e%2e/server.mjs', '/main.mjs?x', '/audio']) {
     assert.equal((await ask(url, { path: wrong })).status, 404, wrong);
   }
@@ -122,16 +116,12 @@ test('a message that breaks the rules ends its connection with a reason', async 
   const full = new Int16Array(MAX_MESSAGE_BYTES / 2);
   const tooLong = Array(Math.ceil((600 * 8000 + 1) / full.length)).fill(full);
   const cases = [
-    [['no JSON'], 1008, /JSON object/],
     [['null'], 1008, /JSON object/],
     [['{"type":"toString"}'], 1008, /message type/],
-    [[JSON.stringify({ ...start, stream: 0.5 })], 1008, /stream/],
     [[JSON.stringify({ ...start, sampleRate: 12345 })], 1008, /sampling rate/],
     [[JSON.stringify({ ...start, model: '../x' })], 1008, /model/],
-    [['{"type":"model","name":7}'], 1008, /model/],
     [[full], 1008, /before "start"/],
     [[started, new Uint8Array(3)], 1008, /16-bit/],
-    [[started, '{"type":"stop"}', full], 1008, /before "start"/],
     [[started, new Uint8Array(MAX_MESSAGE_BYTES + 2)], 1009, /^/],
     [[started, ...tooLong], 1009, /a recording may last 600 s/],
   ];
@@ -209,19 +199,4 @@ test('a page that does not read is not read either', async (t) => {
   socket.resume();
   say({ type: 'stop' });
   assert.equal((await heard(socket, 'done')).samples, messages * chunk.length);
-});
-
-test('a module that cannot be loaded is reported in words', async (t) => {
-  const root = temporaryFolder(t);
-  const inside = (name) => path.join(root, name);
-  fs.cpSync(new URL('..', import.meta.url), inside('apps/live-page'), { recursive: true });
-  const modules = inside('native_modules/quorral_valto/node_modules');
-  fs.mkdirSync(modules, { recursive: true });
-  fs.symlinkSync(path.dirname(require.resolve('ws/package.json')), path.join(modules, 'ws'));
-  const broken = 'throw Object.assign(Error("x"), { code: "ERR_Y" });';
-  fs.writeFileSync(path.join(modules, 'quorral_valto.js'), broken);
-  const other = await import(inside('apps/live-page/server.mjs'));
-  const socket = connect((await serve(t, {}, other.startServer)).url);
-  assert.deepEqual(await heard(socket, 'error'), { type: 'error', code: 'ERR_Y', message: 'x' });
-  assert.equal((await socket.closed).code, 1011);
 });

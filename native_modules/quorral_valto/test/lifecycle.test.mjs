@@ -32,18 +32,6 @@ const endings = {
      raw._getNcModels(() => console.log('last'));`,
     'caught one\ncaught undefined\nrejected late\nlast\n',
   ],
-  'a module that only ended workers had loaded can be loaded again': [
-    `const code = 'const raw = loadRaw(); raw._getNcModels((names) => parentPort.postMessage(names.length));';
-     (async () => {
-       for (let i = 0; i < 3; ++i) {
-         const worker = startWorker(i === 1 ? 'loadRaw()._initialize();' + code : code);
-         const [[count]] = await Promise.all([once(worker, 'message'), once(worker, 'exit')]);
-         console.log(count);
-       }
-       loadRaw()._getNcModels((names) => console.log(names.length));
-     })();`,
-    '0\n3\n3\n3\n',
-  ],
 };
 for (const [name, [script, stdout]] of Object.entries(endings)) {
   test(name, async () => assert.equal((await run(script)).stdout, stdout));
