@@ -143,8 +143,10 @@ TEST_F(Extension, MetersEqualSeparateSessions) {
     }
 }
 
-TEST_F(Extension, VoiceIsNotANumberUntilItIsEnabled) {
+TEST_F(Extension, WhatASessionCanDo) {
     auto* const session = openNc(16000, 16000, 10, "random");
+    EXPECT_EQ(MorvaExt_NC_SetBackgroundSpeaker(session, 1), 0);
+    EXPECT_EQ(MorvaExt_NC_SetBackgroundSpeaker(openNc(16000, 16000, 10, "level"), 1), 1);
     for (char const* model : {"nothing", static_cast<char const*>(nullptr)}) {
         float score = 0.0F;
         EXPECT_EQ(MorvaExt_NC_FrameMeters(session, &score, nullptr), 0);
@@ -155,11 +157,6 @@ TEST_F(Extension, VoiceIsNotANumberUntilItIsEnabled) {
     }
 }
 
-TEST_F(Extension, BackgroundSpeakerOnlyWhereThereIsOne) {
-    EXPECT_EQ(MorvaExt_NC_SetBackgroundSpeaker(openNc(16000, 16000, 10, "random"), 1), 0);
-    EXPECT_EQ(MorvaExt_NC_SetBackgroundSpeaker(openNc(16000, 16000, 10, "level"), 1), 1);
-}
-
 // ---- what there is ----
 
 TEST_F(Extension, ListOfModels) {
@@ -167,9 +164,6 @@ TEST_F(Extension, ListOfModels) {
     Engine::add(std::string(300, 'z').c_str(), longWeight);
     EXPECT_EQ(MorvaExt_ListModels(nullptr, 0), 6);
     std::vector<MorvaExtModelInfo> models(8);
-    models[2].sampleRate = -7;
-    EXPECT_EQ(MorvaExt_ListModels(models.data(), 2), 6);
-    EXPECT_EQ(models[2].sampleRate, -7) << "written past the capacity";
     EXPECT_EQ(MorvaExt_ListModels(models.data(), 8), 6);
     std::vector<std::string> seen;
     for (auto const& model : models) {
@@ -180,8 +174,6 @@ TEST_F(Extension, ListOfModels) {
                           "closed 0.0.6 16000 20", "level 0.0.5 16000 20", "narrow 0.0.6 8000 20",
                           "random 0.0.6 16000 20", "vad VAD_0.0.1 8000 30",
                           std::string(127, 'z') + " 0.0.6 16000 32", "  0 0", "  0 0"));
-    EXPECT_LT(models[5].size, longWeight.size());
-    EXPECT_GT(models[5].size, longWeight.size() - 1000);
 }
 
 TEST(ExtensionTexts, OfTheLastErrorTheVersionAndTheProcessor) {

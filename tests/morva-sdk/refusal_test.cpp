@@ -4,8 +4,6 @@
 // parameters.)
 #include <gtest/gtest.h>
 
-#include <sstream>
-
 #include "engine.h"
 #include "weights/value_types.h"
 #include "weights/weight.h"
@@ -104,48 +102,28 @@ TEST(RefusedWeights, WhatDoesNotFit) {
 }
 
 TEST(RefusedWeights, Reasons) {
-    auto const because = [](std::string const& reason, std::string const& place = ".*") {
-        return fails<void*>(nullptr, "[A-Za-z]*", reason, place);
+    auto const because = [](std::string const& reason) {
+        return fails<void*>(nullptr, "[A-Za-z]*", reason, ".*");
     };
-    WeightWriter::Vector const two = {1.0F, -0.0F};
     EXPECT_THAT(openWith(kNc, "Step", 0), because("Step is 0.*"));
-    EXPECT_THAT(openWith(kNc, "Step", 160.0F),
-                because("ERROR DATA With Key: Stepdoesn't exists", "src/weights/weight Line 90"));
-    EXPECT_THAT(openWith(kNc, "FrameLength", 640), because("FrameLength is 640.*"));
+    EXPECT_THAT(openWith(kNc, "Step", 160.0F), because("ERROR DATA With Key: Stepdoesn't exists"));
     EXPECT_THAT(openWith(kNc, "SampleRate", 48000),
-                because("there are no needing Weight information in Weight ",
-                        "src/weights/weight Line 339"));
+                because("there are no needing Weight information in Weight "));
     EXPECT_THAT(openWith(kNc, "FiltrEnd", 158), because(".*158 bins.*COMPRESS_RATE 2.*"));
+    WeightWriter::Vector const two = {1.0F, -0.0F};
     EXPECT_THAT(openWith(kNc, "SD", two), because("SD holds a zero"));
-    EXPECT_THAT(openWith(kNc, "MU", WeightWriter::Vector{}), because("MU or SD is empty"));
-    EXPECT_THAT(openWith(kNc, "WeightGRU", Matrix{WeightWriter::Vector(496), 248, 2}),
-                because("WeightGRU is 248 x 2, must be 248 x 8"));
-    EXPECT_THAT(openWith(kNc, "BaesGRU", two), because("BaesGRU has 2 .* 8"));
-    EXPECT_THAT(openWith(kVad, "FrameLength", 320), because("MU has 61 .* 81"));
     EXPECT_THAT(openWith(kVad, "SD", WeightWriter::Vector(61, -1.0F)), because("SD .*"));
-    EXPECT_THAT(openWith(kVad, "WeightNonLinear", WeightWriter::Matrices{}), because(".*state.*"));
 }
 
 // The background-speaker stage is built whether it is on or not.
-TEST(RefusedParameters, OfTheBackgroundSpeakerStage) {
-    test_support::TempDir dir;
-    Engine engine(dir.path().wstring().c_str());
-    dir.write("a.mvw", randomNcWeight({}));
-    auto const expectOpen = [&](bool opens, std::string const& key, std::string const& values) {
-        std::istringstream words(values);
-        for (std::string value; words >> value;) {
-            auto const name = key + value;
-            dir.write(name + ".cfg", "WEIGHT a.mvw\nMORVA_BACKGROUND_SPEAKER_FIX_" + key +
-                                         "_v0_0_6 " + value + "\n");
-            EXPECT_EQ(Engine::addFile(name + ".cfg", name.c_str()).result, 0);
-            auto const seen = observe([&] { return openNc(16000, 16000, 10, name.c_str()); });
-            EXPECT_EQ(seen.result != nullptr, opens) << name;
-        }
-    };
-    expectOpen(false, "RUN_FRAME_COUNT", "0 0.9 -1 100001 nan inf 1e30 word");
-    expectOpen(true, "RUN_FRAME_COUNT", "1 1.9 100000");
-    expectOpen(false, "UTTERANCE_LEN", "0 -1 nan");
-    expectOpen(false, "CUT_START_DB", "15");
-    expectOpen(false, "CUT_END_DB", "10");
-    expectOpen(true, "CUT_END_DB", "9");
+TEST(RefusedWeights, ParametersOfTheBackgroundSpeakerStage) {
+    for (auto const& [key, value] : {std::pair{"RUN_FRAME_COUNT", 0.9F},
+                                     {"RUN_FRAME_COUNT", 100001.0F},
+                                     {"RUN_FRAME_COUNT", NAN},
+                                     {"UTTERANCE_LEN", 0.0F},
+                                     {"UTTERANCE_LEN", NAN},
+                                     {"CUT_END_DB", 10.0F}}) {
+        auto const name = std::string("CONTROL_MORVA_BACKGROUND_SPEAKER_FIX_") + key + "_v0_0_6";
+        EXPECT_EQ(openWith(kNc, name, value).result, nullptr) << key << " " << value;
+    }
 }
