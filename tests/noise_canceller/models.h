@@ -31,21 +31,29 @@ inline void setText(ModelEnvironment const& model, std::string const& key, char 
     model->second.insert<std::string>(key, text, MORVA::CONTAINERS::InsertMode::keep);
 }
 
-template <class Cleaner>
-std::unique_ptr<NoiseCleaner> make(ModelEnvironment const& model, std::size_t frameMs) {
-    return std::make_unique<Cleaner>(model, frameMs);
-}
-
-// The noise-level model (0), the cleaner of a generation, 1 to 6, or voice activity (7).
-inline std::unique_ptr<NoiseCleaner> makeCleaner(std::size_t kind, ModelEnvironment const& model,
+// The cleaner of a generation, 1 to 6, the noise-level model (0) or voice activity (7).
+inline std::unique_ptr<NoiseCleaner> makeCleaner(int generation, ModelEnvironment const& model,
                                                  std::size_t frameMs) {
     using namespace MORVA::NOISE_CANCELLER;
-    constexpr decltype(&make<NoiseCleaner_v0_0_1>) makers[] = {
-        make<NoiseDBCleaner_v0_0_1>, make<NoiseCleaner_v0_0_1>, make<NoiseCleaner_v0_0_2>,
-        make<NoiseCleaner_v0_0_3>,   make<NoiseCleaner_v0_0_4>, make<NoiseCleaner_v0_0_5>,
-        make<NoiseCleaner_v0_0_6>,   make<VadCleaner_v0_0_1>};
     test_support::CapturedOutput const quiet(1);
-    return makers[kind](model, frameMs);
+    switch (generation) {
+        case 0:
+            return std::make_unique<NoiseDBCleaner_v0_0_1>(model, frameMs);
+        case 1:
+            return std::make_unique<NoiseCleaner_v0_0_1>(model, frameMs);
+        case 2:
+            return std::make_unique<NoiseCleaner_v0_0_2>(model, frameMs);
+        case 3:
+            return std::make_unique<NoiseCleaner_v0_0_3>(model, frameMs);
+        case 4:
+            return std::make_unique<NoiseCleaner_v0_0_4>(model, frameMs);
+        case 5:
+            return std::make_unique<NoiseCleaner_v0_0_5>(model, frameMs);
+        case 6:
+            return std::make_unique<NoiseCleaner_v0_0_6>(model, frameMs);
+        default:
+            return std::make_unique<VadCleaner_v0_0_1>(model, frameMs);
+    }
 }
 
 // Coloured noise in steps of loudness over 70 dB, with digital silence between.

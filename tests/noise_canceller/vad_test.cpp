@@ -4,6 +4,7 @@
 #include <array>
 
 #include "models.h"
+#include "noise_canceller/vad_cleaner_v0_0_1.h"
 #include "reference.h"
 #include "support/error_bound.h"
 
@@ -74,16 +75,53 @@ TEST(VoiceActivity, MatchesTheReference) {
 // A network that is steadily unsure is cleared when the reference is.
 TEST(VoiceActivity, WatchdogClearsTheState) {
     ErrorBound bound("voice score under the watchdog", 2e-5);
-    for (int const source : {0, 1, 2}) {
-        VadShape const shape{.calibration = {-8.0F, 0.0F, 8.0F}, .seed = 2};
-        Random random(2);
+    int resets = 0;
+    for (unsigned seed = 1; seed <= 6; ++seed) {
+        VadShape const shape{.calibration = {-8.0F, 0.0F, 8.0F}, .seed = seed};
+        Random random(seed);
         std::vector<std::vector<float>> frames(700);
         for (auto& frame : frames) frame = random.normal(80, 500.0F);
-        // Both keys of the environment, and the weight's own entry.
-        auto const on = source == 0 ? WeightWriter().add(kReset, "t").bytes() : std::string();
-        auto const model = modelFrom(randomVadWeight(shape) + on);
-        if (source == 1) setText(model, kReset + std::string("CONTROL_").size(), "TRUE");
-        if (source == 2) setText(model, kReset, "TRUE");
-        EXPECT_GT(compare(model, 10, true, frames, bound), 0);
+        auto const on = WeightWriter().add(kReset, "t").bytes();
+        resets += compare(modelFrom(randomVadWeight(shape) + on), 10, true, frames, bound);
+    }
+    EXPECT_GT(resets, 0);
+}
+
+// Points that coincide or are missing leave the network's answer, here always 7, as it is.
+TEST(VoiceActivity, CalibrationNeedsThreePoints) {
+    using Points = std::pair<std::vector<float>, std::vector<float>>;
+    for (auto const& [range, middle] :
+         {Points{{1, 3}, {1}}, Points{{-4, 3}, {3}}, Points{{-4}, {1}}, Points{{-4, 3}, {}}}) {
+        VadShape const shape{.layers = 1, .calibration = {}};
+        auto const inputs = static_cast<std::size_t>(shape.inputs());
+        WeightWriter front;
+        front.add("WeightLinear", WeightWriter::Matrices{{std::vector<float>(inputs), inputs, 1}})
+            .add("BaesLinear", WeightWriter::Vectors{{7.0F}})
+            .add("Test_MINMAX", range)
+            .add("Test_BestF1", middle);
+        auto const model =
+            modelFrom(front.bytes() + stateOf(shape.hidden) + randomVadWeight(shape));
+        std::vector<float> frame(80);
+        EXPECT_TRUE(makeCleaner(7, model, 10)->cleanNoise(frame));
+        EXPECT_EQ(frame[0], 7.0F);
+    }
+}
+
+// Both keys of the environment, then the weight's own entry.
+TEST(VoiceActivity, WatchdogSwitch) {
+    using Row = std::array<char const*, 3>;
+    std::pair<Row, bool> const rows[] = {
+        {{nullptr, nullptr, nullptr}, false}, {{"TRUE", nullptr, nullptr}, true},
+        {{"true", nullptr, "t"}, false},      {{nullptr, "TRUE", nullptr}, true},
+        {{"TRUE", "FALSE", "t"}, false},      {{"FALSE", "TRUE", nullptr}, true},
+        {{nullptr, nullptr, "t"}, true},      {{nullptr, nullptr, "TRUE"}, false}};
+    for (auto const& [row, on] : rows) {
+        auto const [first, second, stored] = row;
+        WeightWriter writer;
+        if (stored != nullptr) writer.add(kReset, stored);
+        auto const model = modelFrom(writer.bytes() + randomVadWeight({}));
+        if (first != nullptr) setText(model, kReset + std::string("CONTROL_").size(), first);
+        if (second != nullptr) setText(model, kReset, second);
+        EXPECT_EQ(MORVA::NOISE_CANCELLER::VadParams(*model).enableStateReset, on);
     }
 }

@@ -61,6 +61,7 @@ COUNT_LOCK(pthread_mutex_lock, pthread_mutex_t)
 COUNT_LOCK(pthread_mutex_trylock, pthread_mutex_t)
 COUNT_LOCK(pthread_rwlock_rdlock, pthread_rwlock_t)
 COUNT_LOCK(pthread_rwlock_wrlock, pthread_rwlock_t)
+COUNT_LOCK(pthread_spin_lock, pthread_spinlock_t)
 COUNT_ALLOCATION(void*, malloc, (std::size_t size), (size))
 COUNT_ALLOCATION(void*, calloc, (std::size_t count, std::size_t size), (count, size))
 COUNT_ALLOCATION(void*, realloc, (void* memory, std::size_t size), (memory, size))
@@ -188,9 +189,13 @@ TEST(FramePurity, NoAllocationNoLockNoSystemCall) {
 TEST(FramePurity, EveryImpurityIsSeen) {
     EXPECT_EQ(countedIn([] { std::vector<int>(100).swap(*std::make_unique<std::vector<int>>()); }),
               kAllocates);
+    void* (*volatile const allocate)(std::size_t) = std::malloc;  // no longer a known function
+    EXPECT_EQ(countedIn([&] { std::free(allocate(10)); }), kAllocates);
     if (kSanitized) GTEST_SKIP();
     EXPECT_EQ(countedIn([] { std::shared_mutex().lock_shared(); }), kLocks);
+    EXPECT_EQ(countedIn([] { std::mutex().lock(); }), kLocks);
     int const found = impurityOf([] { getppid(); });
     if (found == kCannotForbid) GTEST_SKIP() << "this kernel forbids no system calls";
     EXPECT_EQ(found, SYS_getppid);
+    EXPECT_EQ(impurityOf([] {}), kPure);
 }

@@ -17,6 +17,14 @@ inline thread_local std::size_t releases = 0;           // calls of the global o
 inline thread_local std::size_t heldBytes = 0;  // allocated and not released, as malloc rounds
 inline thread_local std::size_t failingAllocation = 0;  // which one from now on throws; 0: none
 
+// The number of allocations that `work` makes.
+template <class Work>
+std::size_t countAllocations(Work work) {
+    std::size_t const before = allocations;
+    work();
+    return allocations - before;
+}
+
 struct AllocationSizes {
     std::size_t total = 0;
     std::size_t largest = 0;

@@ -31,6 +31,12 @@ public:
         for (float& value : values) value = distribution(engine_);
         return values;
     }
+    std::vector<short> pcm16(std::size_t n) {
+        std::uniform_int_distribution<int> distribution(-32768, 32767);
+        std::vector<short> values(n);
+        for (short& value : values) value = static_cast<short>(distribution(engine_));
+        return values;
+    }
 
 private:
     std::uint64_t seed_;

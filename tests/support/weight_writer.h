@@ -94,6 +94,7 @@ struct NcShape {
     int layers = 3;  // L, matrices of "WeightNonLinear"; 1 has no hidden layer
     int gates = 8;   // G, equal to `hidden` or 1
     unsigned seed = 1;
+    std::string modelName = "test";
     std::string timeStamp = "210301";
 
     int generation() const { return version.back() - '0'; }
@@ -116,6 +117,7 @@ struct VadShape {
     int gates = 8;
     std::vector<float> calibration = {-6.0F, 0.5F, 6.0F};  // low, middle, high; empty: none
     unsigned seed = 1;
+    std::string modelName = "test_vad";
     std::string timeStamp = "210301";
 
     // Log-energy bands: the lower quarter of the bins, then pairs up to the half, then fours; of a
@@ -171,7 +173,7 @@ WeightWriter frontOf(Shape const& shape, std::string_view version) {
     return writer.add("Version", version)
         .add("SampleRate", shape.sampleRate)
         .add("FrameLength", shape.frameLength)
-        .add("ModelName", "test")
+        .add("ModelName", shape.modelName)
         .add("TimeStamp", shape.timeStamp);
 }
 

@@ -36,6 +36,17 @@ float clipped(float x, float low, float high) {
 
 }  // namespace
 
+TEST(Pcm, SixteenBitSamplesGoThereAndBack) {
+    std::vector<short> all;
+    for (int v = -32768; v <= 32767; ++v) all.push_back(static_cast<short>(v));
+    Samples floats(all.size());
+    pcm16ToFloat(all, floats);
+    EXPECT_EQ(floats, Samples(all.begin(), all.end()));
+    std::vector<short> back(all.size());
+    floatToPcm16(floats, back);
+    EXPECT_EQ(back, all);
+}
+
 // What is no sound is dropped, what is too loud limited; 16-bit samples are truncated.
 TEST(Pcm, TakesAnyFloat) {
     Samples const in = anyFloats();
@@ -61,6 +72,11 @@ TEST(FloatControl, HoldsForItsScopeOnly) {
     unsigned const before = _mm_getcsr();
     {
         ScopedFloatControl const outer(Denormals::asZero);
+        EXPECT_FALSE(denormalSurvives());
+        {
+            ScopedFloatControl const inner(Denormals::kept);
+            EXPECT_TRUE(denormalSurvives());
+        }
         EXPECT_FALSE(denormalSurvives());
     }
     EXPECT_EQ(_mm_getcsr(), before);
