@@ -8,8 +8,7 @@ namespace MORVA::MORVA_SDK {
 
 ModelStage::ModelStage(std::unique_ptr<NOISE_CANCELLER::NoiseCleaner> cleaner,
                        std::size_t inputFrame, MorvaFrameDuration duration)
-    : modelRate_(cleaner->environment()->first->getWeightInfo().first),
-      modelFrame_(getSampleCount(duration, modelRate_)),
+    : modelFrame_(getSampleCount(duration, cleaner->environment()->first->getWeightInfo().first)),
       toModel_(inputFrame, modelFrame_),
       cleaner_(std::move(cleaner)) {}
 

@@ -26,12 +26,10 @@ public:
     // Back to the start state, where the model supports it.
     void reset();
 
-    MorvaSamplingRate modelRate() const { return modelRate_; }
     std::size_t modelFrame() const { return modelFrame_; }
     FrameConverter const& converter() const { return toModel_; }
 
 private:
-    MorvaSamplingRate modelRate_;
     std::size_t modelFrame_;
     FrameConverter toModel_;
     std::unique_ptr<NOISE_CANCELLER::NoiseCleaner> cleaner_;
