@@ -10,17 +10,27 @@ equal. Without RANK everything here does nothing.
 from __future__ import annotations
 
 import os
-from typing import Iterable
+from collections.abc import Iterable, Iterator
+from contextlib import contextmanager
 
 import torch
 from torch import Tensor, distributed
 
 
-def join() -> int:
-    """Meets the other processes, if there are any; the number of this one."""
-    if "RANK" in os.environ and not distributed.is_initialized():
-        distributed.init_process_group("gloo")
-    return rank()
+@contextmanager
+def together() -> Iterator[int]:
+    """Meets the other processes, if there are any; the number of this one.
+
+    Who leaves says so: the threads of a group that is left to the end of the process can end it with an abort.
+    """
+    if "RANK" not in os.environ:
+        yield rank()
+        return
+    distributed.init_process_group("gloo")
+    try:
+        yield rank()
+    finally:
+        distributed.destroy_process_group()
 
 
 def rank() -> int:

@@ -80,12 +80,21 @@ def add_options(parser: argparse.ArgumentParser, *, steps: int, batch: int, rate
 
 
 def train(task: Task) -> None:
-    args = task.args
-    torch.manual_seed(args.seed)
+    torch.manual_seed(task.args.seed)
     if task.device.type == "cpu":
         torch.set_num_threads(1)
+    with together.together() as rank:
+        run = train_as(task, rank)
+    if task.args.out and rank == 0:
+        weight = task.weight(run.averaged, np.array(run.extra["mean"]), np.array(run.extra["spread"]))
+        mvw.write(task.args.out, half_precision(weight))
+
+
+def train_as(task: Task, rank: int) -> Run:
+    """The run of one process of those that train this network."""
+    args = task.args
     # A resumed run must not hear the same mixtures again, nor two processes the same.
-    seed = args.seed + 7919 * steps_done(args.run) + 104729 * together.join()
+    seed = args.seed + 7919 * steps_done(args.run) + 104729 * rank
     loader = iter(DataLoader(task.batches(seed), batch_size=None, num_workers=args.workers))
     start = mvw.read(args.start) if args.start else None
     if start:
@@ -97,6 +106,4 @@ def train(task: Task) -> None:
     run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate), extra)
     task.standardise(run.extra["mean"], run.extra["spread"])
     run.train(loader, task.loss, task.validate)
-    if args.out and together.rank() == 0:
-        weight = task.weight(run.averaged, np.array(run.extra["mean"]), np.array(run.extra["spread"]))
-        mvw.write(args.out, half_precision(weight))
+    return run

@@ -88,8 +88,9 @@ def train_with_others(number: int, port: int, folder: Path) -> None:
     patch = pytest.MonkeyPatch()
     for name, value in {"RANK": number, "WORLD_SIZE": 2, "MASTER_ADDR": "127.0.0.1", "MASTER_PORT": port}.items():
         patch.setenv(name, str(value))
-    assert together.join() == number
-    one = trained(folder, [2.0 if number else float("nan"), *([2.0 if number else 4.0] * 299)])
+    with together.together() as rank:
+        assert rank == number
+        one = trained(folder, [2.0 if number else float("nan"), *([2.0 if number else 4.0] * 299)])
     torch.save([*one.network.parameters()], folder / f"{number}.pt")
 
 
