@@ -1,8 +1,6 @@
-"""Training batches: what the network hears and everything the losses need, per band.
+"""Training batches: mixtures from the data process, and what network and losses need of them.
 
-The mask is one number per band, so every loss that is quadratic in the masked spectrum depends on
-the bins of a band only through a few sums. They are taken here, once and without gradients; the
-losses then work on a hundred bands instead of 320 bins.
+The data process only draws and mixes; spectra, features and sums are taken on the device that trains.
 """
 
 from __future__ import annotations
@@ -17,81 +15,71 @@ from torch import Tensor
 from torch.utils.data import IterableDataset
 
 from .mixing import MixtureMaker, Recipe, Waves
-from .spectra import FULL_32K, Layout, analyse, frame_energies, level_gains, log_features
+from .spectra import FULL_32K, Layout, analyse, frame_energies, level_gains, log_features, power_of
 
-EXPONENT = 0.3  # of magnitudes in the compressed losses
+SILENCE = 1e-10  # power that every bin has at least
 
 
 @dataclass
 class Batch:
-    """Tensors [B, T, K] unless said otherwise. Spectra are scaled so that speech has unit level."""
+    """Tensors [B, T, bins] unless said otherwise. Spectra are scaled so that speech has unit level."""
 
-    features: Tensor  # log band powers, not standardised
-    noisy_power: Tensor  # sum |X|^2
-    speech_power: Tensor  # sum |S|^2
-    product: Tensor  # sum Re(X S*)
-    noisy_compressed: Tensor  # sum |X|^2c
-    speech_compressed: Tensor  # sum |S|^2c
-    product_compressed: Tensor  # sum |X|^c |S|^c
-    phase_product: Tensor  # sum |X|^c |S|^c cos(phase difference)
+    features: Tensor  # [B, T, K] log band powers, not standardised
+    noisy_power: Tensor  # |X|^2
+    speech_power: Tensor  # |S|^2
+    product: Tensor  # Re(X S*)
     wideband: Tensor  # [B] bool
     has_speech: Tensor  # [B] bool
 
-    def to(self, device: torch.device) -> "Batch":
-        return Batch(**{name: value.to(device) for name, value in vars(self).items()})
+    @staticmethod
+    @torch.no_grad()
+    def of(waves: dict[str, Tensor], layout: Layout, device: torch.device) -> Batch:
+        """From samples at 32 kHz (see `MixtureBatches`)."""
+        waves = {name: value.to(device) for name, value in waves.items()}
+        speech, noisy = (lower_part(analyse(waves[name], FULL_32K), layout) for name in ("speech", "heard"))
+        noisy_power, speech_power = power_of(noisy), power_of(speech)
+        energies = frame_energies(noisy_power, layout.frame)
+        gains = level_gains(energies, layout.active_frames, waves["history"] * energies.mean(1))
+        reference = torch.where(waves["has_speech"][:, None, None], speech_power, noisy_power)
+        scale = (reference.mean((1, 2)).sqrt() + 1e-3)[:, None, None] ** -2
+        return Batch(
+            features=log_features(noisy_power, gains, layout),
+            noisy_power=noisy_power * scale + SILENCE,
+            speech_power=speech_power * scale + SILENCE,
+            product=(noisy.real * speech.real + noisy.imag * speech.imag) * scale,
+            wideband=waves["wideband"],
+            has_speech=waves["has_speech"],
+        )
 
 
-def lower_part(spectra: np.ndarray, layout: Layout) -> np.ndarray:
+def lower_part(spectra: Tensor, layout: Layout) -> Tensor:
     """Spectra of the band-limited signal at the layout's rate, from spectra at 32 kHz."""
-    ratio = FULL_32K.rate // layout.rate
-    return spectra[..., : layout.bins] * np.float32(1.0 / ratio)
+    return spectra[..., : layout.bins] * (layout.rate / FULL_32K.rate)
 
 
-def band_sums(noisy: np.ndarray, speech: np.ndarray, layout: Layout) -> dict[str, Tensor]:
-    """The losses' sums over bins of spectra [..., T, B]."""
-    x, s = torch.from_numpy(noisy), torch.from_numpy(speech)
-    x_power = x.real.square() + x.imag.square() + 1e-10
-    s_power = s.real.square() + s.imag.square() + 1e-10
-    product = x.real * s.real + x.imag * s.imag
-    x_compressed, s_compressed = x_power ** (EXPONENT / 2), s_power ** (EXPONENT / 2)
-    both = x_compressed * s_compressed
-    sums = {
-        "noisy_power": x_power,
-        "speech_power": s_power,
-        "product": product,
-        "noisy_compressed": x_compressed.square(),
-        "speech_compressed": s_compressed.square(),
-        "product_compressed": both,
-        "phase_product": both * product * torch.rsqrt(x_power * s_power),
-    }
-    starts = layout.band_starts()
-    return {name: torch.from_numpy(np.add.reduceat(v.numpy(), starts, axis=-1)) for name, v in sums.items()}
-
-
-def make_item(waves: Waves, layout: Layout, rng: np.random.Generator) -> dict[str, Tensor]:
+def make_item(waves: Waves, rng: np.random.Generator) -> dict[str, Tensor]:
     """One row of a batch."""
-    speech, noisy = lower_part(analyse(np.stack([waves.speech, waves.heard()]), FULL_32K), layout)
-    energies = frame_energies(noisy, layout.frame)
-    history = float(energies.mean()) * 10 ** rng.uniform(-0.6, 0.6) if rng.random() < 0.5 else None
-    gains = level_gains(energies, layout.active_frames, history=history).astype(np.float32)
-    reference = speech if waves.has_speech else noisy
-    level = np.sqrt(np.mean(np.square(np.abs(reference)))) + 1e-3
-    scale = np.float32(1.0 / level)
-    item = band_sums(noisy * scale, speech * scale, layout)
-    item["features"] = torch.from_numpy(log_features(noisy, gains, layout))
-    item["wideband"] = torch.tensor(waves.wideband)
-    item["has_speech"] = torch.tensor(waves.has_speech)
-    return item
+    return {
+        "speech": torch.from_numpy(waves.speech.astype(np.float32)),
+        "heard": torch.from_numpy(waves.heard().astype(np.float32)),
+        "history": torch.tensor(10 ** rng.uniform(-0.6, 0.6) if rng.random() < 0.5 else np.nan, dtype=torch.float32),
+        "wideband": torch.tensor(waves.wideband),
+        "has_speech": torch.tensor(waves.has_speech),
+    }
 
 
 class MixtureBatches(IterableDataset):
-    """Endless batches. Every draw is used `reuse` times, each time in another noise."""
+    """Endless batches: `speech` and `heard` [B, n] at 32 kHz on the 16-bit scale, `wideband` and `has_speech` [B], and
+    `history` [B], the energy of the call before the piece relative to the piece's (NaN: the call has just started).
+
+    Every draw is used `reuse` times, each time in another noise.
+    """
 
     def __init__(
-        self, store: Path, layout: Layout, recipe: Recipe, size: int, seed: int, reuse: int = 2, split: str = "train"
+        self, store: Path, recipe: Recipe, size: int, seed: int, reuse: int = 2, split: str = "train"
     ) -> None:
-        self.store, self.layout, self.recipe = store, layout, recipe
-        self.size, self.seed, self.reuse, self.split = size, seed, reuse, split
+        self.store, self.recipe, self.size = store, recipe, size
+        self.seed, self.reuse, self.split = seed, reuse, split
 
     def __iter__(self) -> Iterator[dict[str, Tensor]]:
         worker = torch.utils.data.get_worker_info()
@@ -101,12 +89,12 @@ class MixtureBatches(IterableDataset):
         rng = np.random.default_rng(seed + 1)
         while True:
             drawn = [maker.draw() for _ in range(self.size // self.reuse)]
-            items = [make_item(m, self.layout, rng) for m in drawn]
+            items = [make_item(m, rng) for m in drawn]
             sources = [m for m in drawn if m.noisy]
             while len(items) < self.size:
                 base = drawn[len(items) % len(drawn)]
                 if base.noisy and base.has_speech:
                     other = sources[rng.integers(len(sources))]
                     base = base.remixed(other, rng.uniform(*self.recipe.snr_db))
-                items.append(make_item(base, self.layout, rng))
+                items.append(make_item(base, rng))
             yield {name: torch.stack([item[name] for item in items]) for name in items[0]}

@@ -2,7 +2,7 @@
 
 The learning rate warms up, stays, and falls to nothing over the last part of the run; a run that
 is resumed with another number of steps simply continues on the new schedule. The weights that are
-exported are an exponential moving average of the trained ones.
+exported are an exponential moving average of the trained ones, as it was when it did best on validation.
 """
 
 from __future__ import annotations
@@ -29,16 +29,23 @@ RUNAWAY = 3.0
 class Schedule:
     steps: int
     peak: float = 1e-3
+    core_minutes: float | None = None  # of processor time, instead of the steps
     warm_up: int = 50
     decay_share: float = 0.35
     average: float = 0.99  # of the moving average of the weights
     checkpoint_every: int = 50
     validate_every: int = 100
 
-    def rate(self, step: int) -> float:
+    def done(self, step: int, core_seconds: float) -> float:
+        """The share of the run that is over."""
+        if self.core_minutes:
+            return core_seconds / (60.0 * self.core_minutes)
+        return step / self.steps if step < self.steps else 1.0
+
+    def rate(self, step: int, done: float) -> float:
         if step < self.warm_up:
             return self.peak * (step + 1) / self.warm_up
-        left = (self.steps - step) / max(1.0, self.decay_share * self.steps)
+        left = (1.0 - done) / self.decay_share
         return self.peak * (0.5 - 0.5 * math.cos(math.pi * min(1.0, max(0.0, left))))
 
 
@@ -58,9 +65,12 @@ class Run:
         self.extra = extra or {}
         self.step = 0
         self.seconds = 0.0
+        self.core_seconds = 0.0
         folder.mkdir(parents=True, exist_ok=True)
         self.optimiser = make_optimiser(network, schedule.peak)
         self.averaged = copy.deepcopy(network)
+        self.best = copy.deepcopy(network)
+        self.best_loss = math.inf
         if self.checkpoint.exists():
             self._resume()
 
@@ -73,7 +83,9 @@ class Run:
         self.network.load_state_dict(state["network"])
         self.averaged.load_state_dict(state["averaged"])
         self.optimiser.load_state_dict(state["optimiser"])
-        self.step, self.seconds = state["step"], state["seconds"]
+        self.best.load_state_dict(state["best"])
+        self.best_loss = state["best_loss"]
+        self.step, self.seconds, self.core_seconds = state["step"], state["seconds"], state["core_seconds"]
         self.extra.update(state["extra"])
 
     def save(self) -> None:
@@ -83,8 +95,11 @@ class Run:
             "network": self.network.state_dict(),
             "averaged": self.averaged.state_dict(),
             "optimiser": self.optimiser.state_dict(),
+            "best": self.best.state_dict(),
+            "best_loss": self.best_loss,
             "step": self.step,
             "seconds": self.seconds,
+            "core_seconds": self.core_seconds,
             "extra": self.extra,
             "schedule": asdict(self.schedule),
         }
@@ -121,21 +136,21 @@ class Run:
         away, and no step taken from there leads back.
         """
         parts_seen: dict[str, list[float]] = {}
+        schedule = self.schedule
         ran_away = 0
         usual: float | None = None
-        started, before = time.monotonic(), self.seconds
+        started, core_started = time.monotonic() - self.seconds, time.process_time() - self.core_seconds
         bar = tqdm(
-            total=self.schedule.steps,
+            total=schedule.steps,
             initial=self.step,
             mininterval=10.0,
             desc=self.folder.name,
             disable=together.rank() != 0,
         )
-        if self.step == 0:
-            self._validate(validate)
-        while self.step < self.schedule.steps:
+        self._judge_again(validate)
+        while (done := schedule.done(self.step, self.core_seconds)) < 1.0:
             for group in self.optimiser.param_groups:
-                group["lr"] = self.schedule.rate(self.step)
+                group["lr"] = schedule.rate(self.step, done)
             loss, parts = loss_of(self.network, next(batches))
             self.optimiser.zero_grad(set_to_none=True)
             value = loss.item()
@@ -153,19 +168,32 @@ class Run:
                 ran_away += 1
                 self._back_to_average()
             self.step += 1
-            self.seconds = before + time.monotonic() - started
+            self.seconds, self.core_seconds = time.monotonic() - started, time.process_time() - core_started
+            last = schedule.done(self.step, self.core_seconds) >= 1.0
             for name, value in parts.items():
                 parts_seen.setdefault(name, []).append(value)
             bar.update()
-            if self.step % self.schedule.checkpoint_every == 0 or self.step == self.schedule.steps:
+            if self.step % schedule.validate_every == 0 or last:
+                self._validate(validate)
+            if self.step % schedule.checkpoint_every == 0 or last:
                 means = {name: round(sum(values) / len(values), 4) for name, values in parts_seen.items()}
                 self.log({**means, **({"ran_away": ran_away} if ran_away else {})})
                 parts_seen, ran_away = {}, 0
                 self.save()
-            if self.step % self.schedule.validate_every == 0 or self.step == self.schedule.steps:
-                self._validate(validate)
         bar.close()
 
-    def _validate(self, validate: Callable[[nn.Module], dict[str, float]] | None) -> None:
+    def _judge_again(self, validate: Callable[[nn.Module], dict[str, float]] | None) -> None:
+        """What was kept may have been best by another loss."""
         if validate and together.rank() == 0:
-            self.log({f"dev_{name}": round(value, 4) for name, value in validate(self.averaged).items()})
+            self.best_loss = validate(self.best)["loss"] if self.step else math.inf
+            self._validate(validate)
+
+    def _validate(self, validate: Callable[[nn.Module], dict[str, float]] | None) -> None:
+        if together.rank() != 0:
+            return
+        figures = validate(self.averaged) if validate else {"loss": -math.inf}
+        if validate:
+            self.log({f"dev_{name}": round(value, 4) for name, value in figures.items()})
+        if figures["loss"] <= self.best_loss:
+            self.best_loss = figures["loss"]
+            self.best.load_state_dict(self.averaged.state_dict())

@@ -1,13 +1,16 @@
-"""Losses of the noise models, on band sums (see batches).
+"""Losses of the noise models, on the spectra of a batch.
 
-Five terms, each on the spectrum after the engine's squaring of the mask:
-- compressed spectra: magnitudes to the power 0.3, with and without the phase error;
-- lost speech: the same distance where the masked band is weaker than the speech;
-- signal-to-noise ratio of the result in decibels, levelled off at 30 dB;
+A network answers with one gain per bin; the terms look at the spectrum with these gains:
+- compressed spectra: magnitudes to the power 0.3, with and without the phase error, and once more where the
+  result is weaker than the speech;
+- the waveform: signal-to-noise ratio of the result in decibels, levelled off at 30 dB;
+- lost speech in decibels, in bands half a Bark wide, wherever the band is not far below its own loud moments:
+  a soft consonant counts as much as a vowel;
+- the envelope: log-likelihood ratio (Itakura 1975) of the linear predictions of speech and result;
 - a loudness distance after the psychoacoustic model of ITU-T P.862: Bark bands, Zwicker's law,
   masking dead zone, heavier weight on added than on missing loudness, L6 over syllables and L2
   over the piece, mapped to the listening-quality scale of P.862.2;
-- noise left in pauses, in decibels, levelled off at -40 dB.
+- noise left in pauses, in decibels, levelled off where nobody hears more.
 """
 
 from __future__ import annotations
@@ -18,17 +21,20 @@ import numpy as np
 import torch
 from torch import Tensor, nn
 
-from .batches import EXPONENT, Batch
+from .batches import Batch
 from .measures import PAUSE_DB
 from .spectra import Layout
 
+EXPONENT = 0.3  # of magnitudes in the compressed spectra
 SPEECH_SPL = 79.0  # dB, level at which P.862 listens
 TRUSTED_EDGE_HZ = 7000.0  # of recordings without content above 8 kHz
 HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.3  # what such recordings may say about the noise above
 SYLLABLE_HOPS = 32
 # Fitted to P.862.2 scores of noisy and cleaned recordings: frames and bands are not quite the standard's.
 OFFSET, SYMMETRIC, ASYMMETRIC = 4.41, 0.107, 0.0547
-DEEPEST_DB = -40.0
+SPOKEN_DB, SPOKEN_RANGE_DB = -40.0, 10.0  # below a band's loud moments nothing is missed; how that comes up
+MOST_LOST_DB = 30.0
+PREDICTION_ORDER, PREDICTION_FLOOR_DB, UNLIKELIEST = 16, -45.0, 2.0
 
 
 @dataclass(frozen=True)
@@ -36,12 +42,15 @@ class LossWeights:
     compressed: float = 8.0
     phase: float = 2.0
     lost_speech: float = 5.0
-    ratio: float = 0.17  # per dB
-    loudness: float = 1.4  # per point of listening quality
+    ratio: float = 0.1  # per dB
+    lost_db: float = 0.25  # per dB
+    envelope: float = 1.0
+    loudness: float = 0.3  # per point of listening quality
     pause: float = 0.012  # per dB of noise left in pauses
+    deepest_db: float = -30.0  # more than this in pauses earns nothing
 
 
-LEVEL_WEIGHTS = LossWeights(loudness=0.0, ratio=0.01)  # of the level model's share of the mask loss
+LEVEL_WEIGHTS = LossWeights(loudness=0.0, ratio=0.01, lost_db=0.0, envelope=0.0, deepest_db=-40.0)  # of the level model's share of the mask loss
 
 
 def bark(frequency: np.ndarray) -> np.ndarray:
@@ -54,23 +63,37 @@ def hearing_threshold_db(frequency: np.ndarray) -> np.ndarray:
     return 3.64 * k**-0.8 - 6.5 * np.exp(-0.6 * (k - 3.3) ** 2) + 1e-3 * k**4
 
 
+def half_barks(layout: Layout, highest: float) -> list[np.ndarray]:
+    """Neighbouring bins from 100 Hz up, in groups about half a Bark wide."""
+    width_hz = layout.rate / layout.frame
+    edge = np.arange(layout.bins + 1) * width_hz
+    used = np.flatnonzero((edge[:-1] >= 100.0) & (edge[1:] <= highest))
+    groups: list[list[int]] = []
+    for k in used:
+        if groups and bark(edge[k + 1]) - bark(edge[groups[-1][0]]) < 0.42:
+            groups[-1].append(k)
+        else:
+            groups.append([k])
+    return [np.array(g) for g in groups]
+
+
+def sums_over(groups: list[np.ndarray], bins: int) -> np.ndarray:
+    """The matrix [bins, groups] that adds up each group's bins."""
+    matrix = np.zeros((bins, len(groups)), np.float32)
+    for column, members in enumerate(groups):
+        matrix[members, column] = 1.0
+    return matrix
+
+
 class LoudnessModel:
-    """Groups of bands about half a Bark wide up to 8 kHz and their loudness."""
+    """Groups of bins about half a Bark wide up to 8 kHz and their loudness."""
 
     def __init__(self, layout: Layout, device: torch.device) -> None:
         width_hz = layout.rate / layout.frame
-        edges = np.concatenate([layout.band_starts(), [layout.bins]]) * width_hz
-        low, high = edges[:-1], edges[1:]
-        used = [k for k in range(layout.bands) if low[k] >= 100.0 and high[k] <= 8000.0]
-        groups: list[list[int]] = []
-        for k in used:
-            if groups and bark(high[groups[-1][-1]]) - bark(low[groups[-1][0]]) < 0.42:
-                groups[-1].append(k)
-            else:
-                groups.append([k])
-        matrix = np.zeros((layout.bands, len(groups)), np.float32)
-        for column, members in enumerate(groups):
-            matrix[members, column] = 1.0
+        low = np.arange(layout.bins) * width_hz
+        high = low + width_hz
+        groups = half_barks(layout, 8000.0)
+        matrix = sums_over(groups, layout.bins)
         centre = np.array([(low[g[0]] + high[g[-1]]) / 2 for g in groups])
         widths = np.array([bark(high[g[-1]]) - bark(low[g[0]]) for g in groups])
         threshold = 10 ** (hearing_threshold_db(centre) / 10)
@@ -86,10 +109,10 @@ class LoudnessModel:
         relative = power / self.threshold
         return 0.1866 * (self.threshold / 0.5) ** 0.23 * ((0.5 + 0.5 * relative) ** 0.23 - 1.0).clamp_min(0.0)
 
-    def levelled(self, band_power: Tensor) -> Tensor:
+    def levelled(self, power: Tensor) -> Tensor:
         """Sound pressure (power) per group with the piece at the listening level."""
-        level = (band_power * self.speech_band).sum(-1).mean(-1) + 1e-6
-        return (band_power @ self.matrix) * (10 ** (SPEECH_SPL / 10) / level)[:, None, None]
+        level = (power * self.speech_band).sum(-1).mean(-1) + 1e-6
+        return (power @ self.matrix) * (10 ** (SPEECH_SPL / 10) / level)[:, None, None]
 
     def compensated(self, x: Tensor, y: Tensor) -> tuple[Tensor, Tensor]:
         """Steady differences of spectrum are put on the speech, quick ones of level on the result."""
@@ -101,7 +124,7 @@ class LoudnessModel:
         return x, y * smooth.transpose(1, 2).clamp(3e-4, 5.0)
 
     def quality(self, speech: Tensor, result: Tensor) -> Tensor:
-        """Listening quality (1 to 4.6) per piece, from band powers [B, T, K]."""
+        """Listening quality (1 to 4.6) per piece, from powers [B, T, bins]."""
         x, y = self.compensated(self.levelled(speech), self.levelled(result))
         lx, ly = self.loudness(x), self.loudness(y)
         distance = ((lx - ly).abs() - 0.25 * torch.minimum(lx, ly)).clamp_min(0.0) + 1e-6
@@ -134,60 +157,131 @@ def pause_frames(speech_power: Tensor, has_speech: Tensor) -> Tensor:
     return 1.0 - near
 
 
+class LostSpeech:
+    """How much weaker than the speech a result is, in decibels, where somebody speaks."""
+
+    def __init__(self, layout: Layout, device: torch.device) -> None:
+        groups = half_barks(layout, layout.rate / 2)
+        self.matrix = torch.from_numpy(sums_over(groups, layout.bins)).to(device)
+        self.last_bins = torch.tensor([g[-1] for g in groups], device=device)
+
+    def __call__(self, speech: Tensor, result: Tensor, heard: Tensor) -> Tensor:
+        """Mean loss per piece from powers [B, T, bins]; `heard` [B, 1, bins] says which bins are known."""
+        wanted, got = speech @ self.matrix + 1e-9, result @ self.matrix + 1e-9
+        level = 10.0 * torch.log10(wanted)
+        loud = torch.quantile(level, 0.95, dim=1, keepdim=True)
+        faintest = loud.amax(-1, keepdim=True) - 60.0  # a band without speech has no loud moments
+        spoken = ((level - torch.maximum(loud + SPOKEN_DB, faintest)) / SPOKEN_RANGE_DB).clamp(0.0, 1.0)
+        spoken = spoken * (heard[..., self.last_bins] >= 1.0)
+        lost = (level - 10.0 * torch.log10(got)).clamp(0.0, MOST_LOST_DB)
+        return (spoken * lost).sum((1, 2)) / (spoken.sum((1, 2)) + 1.0)
+
+
+class Envelope:
+    """Log-likelihood ratio of the all-pole envelopes of speech and result, from their power spectra up to 7 kHz."""
+
+    def __init__(self, layout: Layout, device: torch.device) -> None:
+        width_hz = layout.rate / layout.frame
+        self.bins = min(layout.bins, int(TRUSTED_EDGE_HZ / width_hz))
+        turns = np.outer(np.arange(self.bins) + 0.5, np.arange(PREDICTION_ORDER + 1)) * (np.pi / self.bins)
+        self.cosines = torch.tensor(np.cos(turns), dtype=torch.float32, device=device)
+        lag = torch.arange(PREDICTION_ORDER, device=device)
+        self.toeplitz = (lag[:, None] - lag[None]).abs()
+
+    def correlations(self, power: Tensor, floor: Tensor) -> Tensor:
+        """Normalised autocorrelations [n, order + 1] over a white floor."""
+        sums = power[:, : self.bins] @ self.cosines
+        whitened = torch.cat([sums[:, :1] * 1.0001 + floor, sums[:, 1:]], 1)
+        return whitened / whitened[:, :1]
+
+    def predictor(self, correlation: Tensor) -> Tensor:
+        """Coefficients [n, order + 1] of the prediction error's filter."""
+        matrix, right = correlation[:, self.toeplitz], correlation[:, 1:]
+        taps = torch.cholesky_solve(right[..., None], torch.linalg.cholesky(matrix))[..., 0]
+        return torch.cat([torch.ones_like(taps[:, :1]), -taps], 1)
+
+    def __call__(self, speech: Tensor, result: Tensor, spoken: Tensor) -> Tensor:
+        """Mean over the frames [B, T] that are `spoken`, of powers [B, T, bins]."""
+        loud = torch.quantile(speech.sum(-1), 0.95, dim=1, keepdim=True).expand_as(spoken)
+        floor = (loud * 10 ** (PREDICTION_FLOOR_DB / 10))[spoken][:, None]
+        wanted, got = (self.correlations(power[spoken], floor) for power in (speech, result))
+        if not len(wanted):
+            return speech.new_zeros(())
+        lags = torch.arange(PREDICTION_ORDER + 1, device=wanted.device)
+        matrix = wanted[:, (lags[:, None] - lags[None]).abs()]
+        best, other = self.predictor(wanted), self.predictor(got)
+        errors = [torch.einsum("ni,nij,nj->n", a, matrix, a) for a in (best, other)]
+        return torch.log(errors[1] / errors[0]).clamp(0.0, UNLIKELIEST).mean()
+
+
 class MaskLoss:
-    """Loss of the mask's logits [B, T, K] against a batch."""
+    """Loss of gains [B, T, bins], given as natural logarithms, against a batch."""
 
     def __init__(self, layout: Layout, weights: LossWeights, device: torch.device) -> None:
         self.weights = weights
         self.loudness = LoudnessModel(layout, device)
-        widths = layout.band_widths()
-        edges = (layout.band_starts() + widths) * (layout.rate / layout.frame)
-        share = widths**-0.5
-        self.band_weight = torch.tensor(share / (share * widths).sum(), dtype=torch.float32, device=device)
-        lower = layout.band_starts() * (layout.rate / layout.frame)
+        self.lost_speech = LostSpeech(layout, device)
+        self.envelope = Envelope(layout, device)
+        share = layout.band_widths()[layout.band_of_bin()] ** -0.5
+        self.bin_weight = torch.tensor(share / share.sum(), dtype=torch.float32, device=device)
         # Without any say above 8 kHz the mask opens there whenever a narrow-band talker speaks, and
         # the noise comes and goes with the words; with a full say it would mute everybody's treble.
-        trusted = np.where(edges <= TRUSTED_EDGE_HZ, 1.0, np.where(lower >= HIGH_EDGE_HZ, HIGH_SHARE, 0.0))
-        self.trusted = torch.tensor(trusted.astype(np.float32), device=device)
+        lower = np.arange(layout.bins) * (layout.rate / layout.frame)
+        trusted = np.where(lower < TRUSTED_EDGE_HZ, 1.0, np.where(lower >= HIGH_EDGE_HZ, HIGH_SHARE, 0.0))
+        self.trusted = torch.tensor(trusted, dtype=torch.float32, device=device)
 
-    def __call__(self, logits: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
+    def __call__(self, log_gain: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
         """The loss and its terms; the first `skip` frames, where the memory is empty, do not count."""
+        parts = self.terms(log_gain, batch, skip)
         w = self.weights
+        loss = (
+            w.compressed * parts["magnitude"]
+            + w.phase * parts["phase"]
+            + w.lost_speech * parts["lost"]
+            - w.ratio * parts["ratio_db"]
+            + w.lost_db * parts["lost_db"]
+            + w.envelope * parts["envelope"]
+            - w.loudness * parts["quality"]
+            + w.pause * parts["pause_db"]
+        )
+        return loss, {name: part.item() for name, part in parts.items()}
+
+    def terms(self, log_gain: Tensor, batch: Batch, skip: int = 0) -> dict[str, Tensor]:
         cut = slice(skip, None)
-        log_gain = 2.0 * torch.nn.functional.logsigmoid(logits[:, cut])
-        gain = log_gain.exp()
-        compressed = (EXPONENT * log_gain).exp()
-        bands = torch.where(batch.wideband[:, None], torch.ones_like(self.trusted), self.trusted)[:, None]
-        bands = bands * self.band_weight
-
-        a2, s2 = batch.noisy_compressed[:, cut], batch.speech_compressed[:, cut]
-        both, phased = batch.product_compressed[:, cut], batch.phase_product[:, cut]
-        magnitude = compressed.square() * a2 - 2.0 * compressed * both + s2
-        phase = 2.0 * compressed * (both - phased)
-        lost = (s2.sqrt() - compressed * a2.sqrt()).clamp_min(0.0).square()
-        spectral = (bands * (w.compressed * magnitude + w.phase * phase + w.lost_speech * lost)).sum(-1).mean()
-
+        log_gain = log_gain[:, cut]
+        px, ps, product = batch.noisy_power[:, cut], batch.speech_power[:, cut], batch.product[:, cut]
+        heard = torch.where(batch.wideband[:, None], torch.ones_like(self.trusted), self.trusted)[:, None]
         speech = batch.has_speech.float()
         count = speech.sum().clamp_min(1.0)
-        heard = bands / self.band_weight
-        px, ps, pxs = batch.noisy_power[:, cut], batch.speech_power[:, cut], batch.product[:, cut]
-        error = (heard * (gain.square() * px - 2.0 * gain * pxs + ps)).sum((1, 2))
+        after = (2.0 * log_gain).exp() * px
+
+        s, x = ps ** (EXPONENT / 2), px ** (EXPONENT / 2)
+        y = (EXPONENT * log_gain).exp() * x
+        cosine = product * torch.rsqrt(px * ps)
+        bins = heard * self.bin_weight
+
+        def mean(values: Tensor) -> Tensor:
+            return (bins * values).sum(-1).mean()
+
+        error = (heard * (after - 2.0 * log_gain.exp() * product + ps)).sum((1, 2))
         signal = (heard * ps).sum((1, 2))
         ratio = -10.0 * torch.log10((error + 1e-3 * signal + 1e-9) / (signal + 1e-9))
-        ratio = (speech * ratio).sum() / count
 
-        quality = self.loudness.quality(ps, gain.square() * px)
-        quality = (speech * quality).sum() / count
-
-        silent = (pause_frames(ps, batch.has_speech))[:, :, None]
-        before, after = (silent * px).sum((1, 2)), (silent * gain.square() * px).sum((1, 2))
-        counted = (before > 1e-4 * px.sum((1, 2))).float()
-        left = (10.0 * torch.log10((after + 1e-9) / (before + 1e-9))).clamp_min(DEEPEST_DB)
-        left = (counted * left).sum() / counted.sum().clamp_min(1.0)
-
-        loss = spectral - w.ratio * ratio - w.loudness * quality + w.pause * left
-        parts = {"spectral": spectral, "ratio_db": ratio, "quality": quality, "pause_db": left}
-        return loss, {name: part.item() for name, part in parts.items()}
+        silent = pause_frames(ps, batch.has_speech)
+        noise, left = (silent * px.sum(-1)).sum(1), (silent * after.sum(-1)).sum(1)
+        counted = (noise > 1e-4 * px.sum((1, 2))).float()
+        left = (10.0 * torch.log10((left + 1e-9) / (noise + 1e-9))).clamp_min(self.weights.deepest_db)
+        zero = after.new_zeros(())
+        return {
+            "magnitude": mean((y - s).square()),
+            "phase": mean(2.0 * y * s * (1.0 - cosine)),
+            "lost": mean((s - y).clamp_min(0.0).square()),
+            "ratio_db": (speech * ratio).sum() / count,
+            "lost_db": (speech * self.lost_speech(ps, after, heard)).sum() / count if self.weights.lost_db else zero,
+            "envelope": self.envelope(ps, after, silent < 0.5) if self.weights.envelope else zero,
+            "quality": (speech * self.loudness.quality(ps, after)).sum() / count,
+            "pause_db": (counted * left).sum() / counted.sum().clamp_min(1.0),
+        }
 
 
 class LevelLoss:
@@ -205,16 +299,16 @@ class LevelLoss:
         self.mask_loss = MaskLoss(layout, weights, device)
         self.mask_share = mask_share
 
-    def __call__(self, logits: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
+    def __call__(self, log_gain: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
         cut = slice(skip, None)
-        kept = torch.sigmoid(logits[:, cut]).square()
+        kept = log_gain[:, cut].exp()
         px, ps, pxs = batch.noisy_power[:, cut], batch.speech_power[:, cut], batch.product[:, cut]
         removed = ((1.0 - kept).square() * px).sum(-1)
         noise = (px - 2.0 * pxs + ps).clamp_min(0.0).sum(-1)
         floor = self.FAINTEST * px.sum(-1).mean(1, keepdim=True) + 1e-9
         error_db = 10.0 * (torch.log10(self._pooled(removed) + floor) - torch.log10(self._pooled(noise) + floor))
         level = error_db.abs().mean()
-        mask, parts = self.mask_loss(logits, batch, skip)
+        mask, parts = self.mask_loss(log_gain, batch, skip)
         return 0.1 * level + self.mask_share * mask, {"level_error_db": level.item(), **parts}
 
     def _pooled(self, power: Tensor) -> Tensor:

@@ -1,4 +1,4 @@
-"""Frames, windows and bands of the noise models, in NumPy, for whole recordings at once.
+"""Frames, windows and bands of the noise models for whole recordings at once, on the device of their samples.
 
 Everything here mirrors the engine's arithmetic, so that the network hears in training what it
 hears in a call. Samples are floats on the 16-bit scale. A model frame is two hops long; frame t
@@ -10,7 +10,8 @@ from __future__ import annotations
 from dataclasses import dataclass
 
 import numpy as np
-from scipy import fft as sfft
+import torch
+from torch import Tensor, nn
 
 FEATURE_OFFSET = 1000.0  # keeps the logarithm of a silent band finite
 REFERENCE_AMPLITUDE = 2000.0
@@ -68,72 +69,76 @@ SMALL_16K = Layout(rate=16000, frame=320, compress=2)
 SMALL_8K = Layout(rate=8000, frame=160, compress=1)
 
 
-def vorbis_window(size: int) -> np.ndarray:
+def vorbis_window(size: int) -> Tensor:
     """Power-complementary window sampled at whole points: zero first, peak at size / 2."""
-    index = np.arange(size)
-    return np.sin(np.pi / 2 * np.sin(index * (np.pi / size)) ** 2).astype(np.float32)
+    index = torch.arange(size, dtype=torch.float64)
+    return torch.sin(torch.pi / 2 * torch.sin(index * (torch.pi / size)) ** 2).float()
 
 
 def hamming_window(size: int) -> np.ndarray:
     return (0.54 - 0.46 * np.cos(np.arange(size) * (2 * np.pi / (size - 1)))).astype(np.float32)
 
 
-def frames_of(samples: np.ndarray, hop: int) -> np.ndarray:
-    """All model frames [..., T, 2 * hop] of samples [..., T * hop] (a view of a padded copy)."""
-    count = samples.shape[-1] // hop
-    pad = [(0, 0)] * (samples.ndim - 1) + [(hop, 0)]
-    padded = np.pad(samples[..., : count * hop], pad)
-    view = np.lib.stride_tricks.sliding_window_view(padded, 2 * hop, axis=-1)
-    return view[..., ::hop, :][..., :count, :]
+def frames_of(samples: Tensor, hop: int) -> Tensor:
+    """All model frames [..., T, 2 * hop] of samples [..., T * hop]."""
+    whole = samples.shape[-1] // hop * hop
+    return nn.functional.pad(samples[..., :whole], (hop, 0)).unfold(-1, 2 * hop, hop)
 
 
-def analyse(samples: np.ndarray, layout: Layout) -> np.ndarray:
-    """Spectra [..., T, frame / 2 + 1], complex64, of samples [..., T * hop]."""
-    frames = frames_of(samples, layout.hop) * vorbis_window(layout.frame)
-    return sfft.rfft(frames.astype(np.float32, copy=False), axis=-1)
+def analyse(samples: Tensor, layout: Layout) -> Tensor:
+    """Spectra [..., T, frame / 2 + 1], complex, of samples [..., T * hop]."""
+    return torch.fft.rfft(frames_of(samples, layout.hop) * vorbis_window(layout.frame).to(samples.device))
 
 
-def frame_energies(spectra: np.ndarray, frame: int) -> np.ndarray:
-    """Mean square per sample of each frame, estimated from windowed half spectra.
+def power_of(spectra: Tensor) -> Tensor:
+    return spectra.real.square() + spectra.imag.square()
+
+
+def frame_energies(power: Tensor, frame: int) -> Tensor:
+    """Mean square per sample of each frame, estimated from the power of windowed half spectra.
 
     The window halves the energy of a steady frame; Parseval with the mirrored half gives the rest.
     """
-    power = np.square(spectra.real) + np.square(spectra.imag)
-    return 2.0 * power.sum(axis=-1) / (frame * frame * 0.5)
+    return 2.0 * power.sum(-1) / (frame * frame * 0.5)
 
 
-def level_gains(
-    energies: np.ndarray,
-    active_frames: int,
-    reference: float = REFERENCE_AMPLITUDE,
-    threshold: float = ACTIVITY_ENERGY,
-    history: float | None = None,
-) -> np.ndarray:
-    """The gain before the features for every frame of a stream, [T].
+def level_gains(energies: Tensor, active_frames: int, history: Tensor | None = None) -> Tensor:
+    """The gain before the features for every frame of streams, [B, T].
 
     A frame is active when the mean energy of the last ten frames reaches the threshold; the gain
-    brings the mean energy of the last active frames to the reference. `history` is the mean
-    energy of a long stream that went before; without it the stream has just started.
+    brings the mean energy of the last active frames to the reference. `history` [B] is the mean
+    energy of a long stream that went before; where it is NaN the stream has just started.
     """
-    padded = np.concatenate([np.zeros(ENERGY_FRAMES - 1), energies])
-    windowed = np.convolve(padded, np.full(ENERGY_FRAMES, 1.0 / ENERGY_FRAMES), mode="valid")
-    active = windowed >= threshold
-    past = np.full(active_frames, history) if history is not None else np.array([reference**2])
-    sums = np.concatenate([[0.0], np.cumsum(np.concatenate([past, energies[active]]))])
-    last = len(past) + np.cumsum(active)
-    first = np.maximum(last - active_frames, 0)
-    mean = (sums[last] - sums[first]) / (last - first)
-    return np.where(mean > 1e-6, reference / np.sqrt(np.maximum(mean, 1e-6)), 1.0)
+    energies = energies.double()
+    window = energies.new_full((1, 1, ENERGY_FRAMES), 1.0 / ENERGY_FRAMES)
+    recent = nn.functional.conv1d(nn.functional.pad(energies[:, None], (ENERGY_FRAMES - 1, 0)), window)[:, 0]
+    active = (recent >= ACTIVITY_ENERGY).double()
+    started = torch.full_like(energies[:, :1], torch.nan) if history is None else history[:, None].double()
+    fresh = started.isnan()
+    before = torch.where(fresh, 1.0, float(active_frames))  # frames that count as heard before the first
+    each = torch.where(fresh, REFERENCE_AMPLITUDE**2, started)
+    sums = torch.cumsum(nn.functional.pad(energies * active, (1, 0)), -1)
+    counts = torch.cumsum(nn.functional.pad(active, (1, 0)), -1)
+    forgotten = (before + counts - active_frames).clamp_min(0.0)
+    past = torch.minimum(forgotten, before)
+    gone = torch.searchsorted(counts, (forgotten - past).contiguous())
+    total = (before - past) * each + sums - torch.gather(sums, 1, gone)
+    mean = (total / (before + counts - forgotten))[:, 1:]
+    return torch.where(mean > 1e-6, REFERENCE_AMPLITUDE / mean.clamp_min(1e-6).sqrt(), 1.0).float()
 
 
-def compress_bands(power: np.ndarray, layout: Layout) -> np.ndarray:
-    """Band powers [..., K] of bin powers [..., B]."""
-    return np.add.reduceat(power, layout.band_starts(), axis=-1)
+def compress_bands(power: Tensor, layout: Layout) -> Tensor:
+    """Band powers [..., K] of bin powers [..., B]: sums over neighbouring bins of one width after the other."""
+    widths = layout.band_widths()
+    parts, first = [], 0
+    for width in sorted(set(widths)):
+        last = first + int(width * (widths == width).sum())
+        parts.append(power[..., first:last].unflatten(-1, (-1, int(width))).sum(-1))
+        first = last
+    return torch.cat(parts, -1)
 
 
-def log_features(spectra: np.ndarray, gains: np.ndarray, layout: Layout) -> np.ndarray:
+def log_features(power: Tensor, gains: Tensor, layout: Layout) -> Tensor:
     """Log band powers [..., T, K] before standardisation."""
-    seen = spectra[..., layout.first_bin : layout.first_bin + layout.bins]
-    power = np.square(seen.real) + np.square(seen.imag)
-    bands = compress_bands(power * np.square(gains)[..., None], layout)
-    return np.log(bands + FEATURE_OFFSET).astype(np.float32)
+    seen = power[..., layout.first_bin : layout.first_bin + layout.bins]
+    return torch.log(compress_bands(seen, layout) * gains.square()[..., None] + FEATURE_OFFSET)

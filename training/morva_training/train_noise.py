@@ -23,7 +23,7 @@ from .spectra import FULL_32K, SMALL_8K, SMALL_16K
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
 HIDDEN = {"32k": 304, "16k": 208, "8k": 160}
 LEVEL_RECIPE = Recipe(snr_db=(-8.0, 40.0), noise_only_share=0.15, synthetic_share=0.25)
-TERMS = ("ratio", "loudness", "pause", "lost_speech")
+TERMS = tuple(vars(LossWeights()))
 
 
 class NoiseTask(trainer.Task):
@@ -36,10 +36,14 @@ class NoiseTask(trainer.Task):
         self.recipe = replace(LEVEL_RECIPE if args.level else Recipe(), seconds=args.seconds)
         asked = {term: getattr(args, term) for term in TERMS if getattr(args, term) is not None}
         weights = replace(LEVEL_WEIGHTS if args.level else LossWeights(), **asked)
+        self.band_of_bin = torch.from_numpy(self.layout.band_of_bin()).to(self.device)
         self.criterion = (LevelLoss if args.level else MaskLoss)(self.layout, weights, self.device)
 
     def batches(self, seed: int) -> MixtureBatches:
-        return MixtureBatches(self.args.store, self.layout, self.recipe, self.args.batch, seed, self.args.reuse)
+        return MixtureBatches(self.args.store, self.recipe, self.args.batch, seed, self.args.reuse)
+
+    def prepared(self, batch: dict[str, Tensor]) -> dict[str, Tensor]:
+        return vars(Batch.of(batch, self.layout, self.device))
 
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         return features.mean(0), features.std(0).clamp_min(0.1)
@@ -53,16 +57,18 @@ class NoiseTask(trainer.Task):
         return kind(features, self.args.hidden or HIDDEN[self.args.model], self.layout.bands)
 
     def loss(self, model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
-        return self.criterion(self.outputs(model, batch), Batch(**batch).to(self.device), self.skipped)
+        gains = 2.0 * nn.functional.logsigmoid(self.outputs(model, batch))  # the engine squares the mask
+        return self.criterion(gains[..., self.band_of_bin], Batch(**batch), self.skipped)
 
     @functools.cached_property
     def dev(self) -> list[dict[str, Tensor]]:
-        source = iter(MixtureBatches(self.args.store, self.layout, self.recipe, 16, seed=77, split="dev"))
-        return [next(source) for _ in range(4)]
+        source = iter(MixtureBatches(self.args.store, self.recipe, 16, seed=77, split="dev"))
+        return [self.prepared(next(source)) for _ in range(4)]
 
     def validate(self, model: nn.Module) -> dict[str, float]:
         with torch.no_grad():
-            parts = [self.loss(model, batch)[1] for batch in self.dev]
+            results = [self.loss(model, batch) for batch in self.dev]
+        parts = [{"loss": loss.item(), **terms} for loss, terms in results]
         return {name: float(np.mean([p[name] for p in parts])) for name in parts[0]}
 
     def weight(self, model: nn.Module, mean: np.ndarray, spread: np.ndarray) -> Weight:

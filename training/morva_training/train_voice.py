@@ -83,7 +83,8 @@ class VoiceTask(trainer.Task):
 
     def validate(self, model: nn.Module) -> dict[str, float]:
         scores, voice = self.scored(model, self.dev)
-        return {"auc": roc_auc(scores, voice), "f1": best_f1(scores, voice)[0]}
+        area = roc_auc(scores, voice)
+        return {"loss": 1.0 - area, "auc": area, "f1": best_f1(scores, voice)[0]}
 
     def weight(self, model: nn.Module, mean: np.ndarray, spread: np.ndarray) -> Weight:
         model.products = torch.float32

@@ -37,6 +37,10 @@ class Task(ABC):
     @abstractmethod
     def batches(self, seed: int) -> IterableDataset: ...
 
+    def prepared(self, batch: dict[str, Tensor]) -> dict[str, Tensor]:
+        """What the data process brings as network and loss take it, on the device."""
+        return batch
+
     @abstractmethod
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         """Mean and spread of features [n, F]."""
@@ -49,7 +53,8 @@ class Task(ABC):
     def loss(self, model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]: ...
 
     @abstractmethod
-    def validate(self, model: nn.Module) -> dict[str, float]: ...
+    def validate(self, model: nn.Module) -> dict[str, float]:
+        """Figures of the validation part, `loss` among them: where it is lowest are the weights that are kept."""
 
     @abstractmethod
     def weight(self, model: nn.Module, mean: np.ndarray, spread: np.ndarray) -> Weight: ...
@@ -73,6 +78,7 @@ def add_options(parser: argparse.ArgumentParser, *, steps: int, batch: int, rate
     parser.add_argument("--out", type=Path, help="weight file to write at the end")
     parser.add_argument("--start", type=Path, help="weight file to start from, grown to the shape asked for")
     parser.add_argument("--steps", type=int, default=steps)
+    parser.add_argument("--core-minutes", type=float, help="end by processor time instead; with --workers 0 all of it")
     parser.add_argument("--batch", type=int, default=batch)
     parser.add_argument("--rate", type=float, default=rate)
     parser.add_argument("--seed", type=int, default=seed)
@@ -86,7 +92,7 @@ def train(task: Task) -> None:
     with together.together() as rank:
         run = train_as(task, rank)
     if task.args.out and rank == 0:
-        weight = task.weight(run.averaged, np.array(run.extra["mean"]), np.array(run.extra["spread"]))
+        weight = task.weight(run.best, np.array(run.extra["mean"]), np.array(run.extra["spread"]))
         mvw.write(task.args.out, half_precision(weight))
 
 
@@ -95,15 +101,15 @@ def train_as(task: Task, rank: int) -> Run:
     args = task.args
     # A resumed run must not hear the same mixtures again, nor two processes the same.
     seed = args.seed + 7919 * steps_done(args.run) + 104729 * rank
-    loader = iter(DataLoader(task.batches(seed), batch_size=None, num_workers=args.workers))
+    batches = map(task.prepared, DataLoader(task.batches(seed), batch_size=None, num_workers=args.workers))
     start = mvw.read(args.start) if args.start else None
     if start:
         mean, spread = (torch.from_numpy(start[key]) for key in ("MU", "SD"))
     else:
-        some = torch.cat([next(loader)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
+        some = torch.cat([next(batches)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
         mean, spread = (together.from_the_first(v) for v in task.statistics(some))
     extra = {"mean": mean.tolist(), "spread": spread.tolist()}
-    run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate), extra)
+    run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate, args.core_minutes), extra)
     task.standardise(run.extra["mean"], run.extra["spread"])
-    run.train(loader, task.loss, task.validate)
+    run.train(batches, task.loss, task.validate)
     return run

@@ -18,7 +18,7 @@ from morva_training.corpus import read_audio
 from morva_training.describe import described
 from morva_training.networks import LayerNormGatedNetwork, PlainGatedNetwork, network_input
 from morva_training.spectra import FULL_32K, SMALL_8K, SMALL_16K, analyse, frame_energies, frames_of
-from morva_training.spectra import level_gains, log_features, vorbis_window
+from morva_training.spectra import level_gains, log_features, power_of, vorbis_window
 from morva_training.voice import stream_features
 
 
@@ -49,23 +49,25 @@ def recording(rate: int) -> np.ndarray:
     return samples
 
 
-def logits(weight: mvw.Weight, features: np.ndarray, scale: torch.Tensor, context: int) -> torch.Tensor:
+def logits(weight: mvw.Weight, features: torch.Tensor, scale: torch.Tensor, context: int) -> torch.Tensor:
     network = network_of(weight)
     with torch.no_grad():
-        x = network_input(torch.from_numpy(features)[None], torch.from_numpy(weight["MU"]), scale, context)
+        x = network_input(features[None], torch.from_numpy(weight["MU"]), scale, context)
         return network(x, network.initial_state(1))[0][0]
 
 
 def assert_same_sound(weight: mvw.Weight, path: Path, frame_ms: int) -> None:
     layout = layout_of(weight)
-    samples, hop = recording(layout.rate), layout.hop
-    spectra, frames = analyse(samples, layout), frames_of(samples, hop)
-    features = log_features(spectra, level_gains(np.square(frames).mean(-1), layout.active_frames), layout)
-    masks = torch.sigmoid(logits(weight, features, torch.from_numpy(weight["SD"]), layout.preview)).numpy()
+    samples, hop = torch.from_numpy(recording(layout.rate)), layout.hop
+    spectra = analyse(samples, layout)
+    gains = level_gains(frames_of(samples, hop).square().mean(-1)[None], layout.active_frames)[0]
+    features = log_features(power_of(spectra), gains, layout)
+    masks = torch.sigmoid(logits(weight, features, torch.from_numpy(weight["SD"]), layout.preview))
     spectra[:, : layout.bins] *= masks[:, layout.band_of_bin()] ** 2
     spectra[:, layout.bins] = 0
-    cleaned = np.fft.irfft(spectra) * vorbis_window(layout.frame)
-    expected = (cleaned[:-1, hop:] + cleaned[1:, :hop]).reshape(-1)  # in the samples' place, but for the last hop
+    cleaned = torch.fft.irfft(spectra) * vorbis_window(layout.frame)
+    expected = (cleaned[:-1, hop:] + cleaned[1:, :hop]).flatten().numpy()  # in the samples' place, but for the last hop
+    samples, masks = samples.numpy(), masks.numpy()
     result = morva.denoise(samples / 32768, layout.rate, frame_ms=frame_ms, model=str(path)) * 32768
     assert np.ptp(masks) > 0.01 and np.abs(expected).max() > 100, "the comparison must not be of silence"
     assert np.abs(result[: len(expected)] - expected).max() < 0.1
@@ -73,7 +75,7 @@ def assert_same_sound(weight: mvw.Weight, path: Path, frame_ms: int) -> None:
 
 def assert_same_scores(weight: mvw.Weight, path: Path, frame_ms: int) -> None:
     samples = recording(8000)
-    features = stream_features(samples[None], 8 * frame_ms)[0]
+    features = torch.from_numpy(stream_features(samples[None], 8 * frame_ms)[0])
     y = logits(weight, features, torch.sqrt(torch.from_numpy(weight["SD"]) + 1e-7), 5)[:, 0].numpy()
     low, high = weight["Test_MINMAX"]
     expected = np.interp(y, [low, weight["Test_BestF1"][0], high], [0, 0.5, 1]).clip(1e-5, 0.99999)
@@ -113,9 +115,12 @@ def test_shipped_weight(path: Path) -> None:
     (assert_same_scores if b"VAD" in weight["Version"] else assert_same_sound)(weight, path, 10)
 
 
-def test_level_gain_of_a_piece_in_the_middle_of_a_call() -> None:
-    """The energies come from the spectra, and a long history outweighs the start."""
-    samples = np.random.default_rng(2).standard_normal(320 * 400).astype(np.float32) * 300
-    estimate = frame_energies(analyse(samples, FULL_32K), FULL_32K.frame)[1:]
-    assert np.mean(estimate / np.square(frames_of(samples, 320)).mean(-1)[1:]) == pytest.approx(1, abs=0.02)
-    assert np.allclose(level_gains(np.full(50, 1e4), 300, history=1e4), 20.0)
+def test_level_gain_follows_the_last_active_frames() -> None:
+    """The energies come from the spectra, silence does not count, and a long history outweighs the start."""
+    samples = torch.randn(320 * 400, generator=torch.Generator().manual_seed(2)) * 300
+    estimate = frame_energies(power_of(analyse(samples, FULL_32K)), FULL_32K.frame)[1:]
+    assert (estimate / frames_of(samples, 320).square().mean(-1)[1:]).mean().item() == pytest.approx(1, abs=0.02)
+    energies = torch.cat([torch.full((2, 50), 1e4), torch.zeros(2, 20), torch.full((2, 90), 4e4)], 1)
+    gains = level_gains(energies, 60, history=torch.tensor([np.nan, 1e4]))
+    assert np.allclose(gains[1, :50], 20.0) and np.allclose(gains[0, 49], 2000 / np.sqrt((4e6 + 50e4) / 51), rtol=1e-5)
+    assert np.allclose(gains[:, -1], 10.0), "after sixty active frames nothing else is left"
