@@ -56,7 +56,7 @@ def steps_done(folder: Path) -> int:
 
 
 class Run:
-    """State of one training run in a folder: `checkpoint.pt`, `log.jsonl`."""
+    """State of one training run in a folder: `checkpoint.pt`, `log.jsonl`, and `best.pt`, the network to use."""
 
     def __init__(self, network: nn.Module, folder: Path, schedule: Schedule, extra: dict | None = None) -> None:
         self.network = network
@@ -103,9 +103,10 @@ class Run:
             "extra": self.extra,
             "schedule": asdict(self.schedule),
         }
-        partial = self.checkpoint.with_suffix(".partial")
-        torch.save(state, partial)
-        partial.rename(self.checkpoint)
+        for file, content in ((self.checkpoint, state), (self.folder / "best.pt", (self.best, self.extra))):
+            partial = file.with_suffix(".partial")
+            torch.save(content, partial)
+            partial.rename(file)
 
     def log(self, entry: dict) -> None:
         if together.rank() != 0:

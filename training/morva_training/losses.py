@@ -26,6 +26,7 @@ from .measures import PAUSE_DB
 from .spectra import Layout
 
 EXPONENT = 0.3  # of magnitudes in the compressed spectra
+EVEN_UP_TO_HZ = 2000.0  # bins above have less and less say
 SPEECH_SPL = 79.0  # dB, level at which P.862 listens
 TRUSTED_EDGE_HZ = 7000.0  # of recordings without content above 8 kHz
 HIGH_EDGE_HZ, HIGH_SHARE = 8400.0, 0.3  # what such recordings may say about the noise above
@@ -39,18 +40,20 @@ PREDICTION_ORDER, PREDICTION_FLOOR_DB, UNLIKELIEST = 16, -45.0, 2.0
 
 @dataclass(frozen=True)
 class LossWeights:
-    compressed: float = 8.0
-    phase: float = 2.0
-    lost_speech: float = 5.0
-    ratio: float = 0.1  # per dB
-    lost_db: float = 0.25  # per dB
-    envelope: float = 1.0
+    compressed: float = 60.0
+    phase: float = 10.0
+    lost_speech: float = 40.0
+    ratio: float = 0.06  # per dB
+    lost_db: float = 0.05  # per dB
+    envelope: float = 0.7
     loudness: float = 0.3  # per point of listening quality
     pause: float = 0.012  # per dB of noise left in pauses
     deepest_db: float = -30.0  # more than this in pauses earns nothing
 
 
-LEVEL_WEIGHTS = LossWeights(loudness=0.0, ratio=0.01, lost_db=0.0, envelope=0.0, deepest_db=-40.0)  # of the level model's share of the mask loss
+LEVEL_WEIGHTS = LossWeights(  # of the level model's share of the mask loss
+    compressed=8.0, phase=2.0, lost_speech=5.0, loudness=0.0, ratio=0.01, lost_db=0.0, envelope=0.0, deepest_db=-40.0
+)
 
 
 def bark(frequency: np.ndarray) -> np.ndarray:
@@ -222,11 +225,11 @@ class MaskLoss:
         self.loudness = LoudnessModel(layout, device)
         self.lost_speech = LostSpeech(layout, device)
         self.envelope = Envelope(layout, device)
-        share = layout.band_widths()[layout.band_of_bin()] ** -0.5
+        lower = np.arange(layout.bins) * (layout.rate / layout.frame)
+        share = np.maximum(lower / EVEN_UP_TO_HZ, 1.0) ** -0.5
         self.bin_weight = torch.tensor(share / share.sum(), dtype=torch.float32, device=device)
         # Without any say above 8 kHz the mask opens there whenever a narrow-band talker speaks, and
         # the noise comes and goes with the words; with a full say it would mute everybody's treble.
-        lower = np.arange(layout.bins) * (layout.rate / layout.frame)
         trusted = np.where(lower < TRUSTED_EDGE_HZ, 1.0, np.where(lower >= HIGH_EDGE_HZ, HIGH_SHARE, 0.0))
         self.trusted = torch.tensor(trusted, dtype=torch.float32, device=device)
 

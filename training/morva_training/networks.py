@@ -1,4 +1,4 @@
-"""The three networks as PyTorch modules that run over whole sequences.
+"""The networks as PyTorch modules that run over whole sequences.
 
 All weights are stored inputs-down, outputs-across (x W + b), the way the weight file holds them,
 and every matrix that also sees the recurrent state has the state's rows first. Products with the
@@ -163,4 +163,62 @@ class PlainGatedNetwork(nn.Module):
         return (y @ self.output + self.output_bias).transpose(0, 1), state
 
 
-Network = LayerNormGatedNetwork | PlainGatedNetwork
+class Both(nn.Module):
+    """Recurrence over the bands, both ways, then over time; the weights are those of every band and frame.
+
+    x [T, B, F, C] to the same shape.
+    """
+
+    def __init__(self, channels: int, across: int) -> None:
+        super().__init__()
+        self.norms = nn.ModuleList(nn.LayerNorm(channels) for _ in range(2))
+        self.bands = nn.GRU(channels, across, bidirectional=True)
+        self.mixed = nn.Linear(2 * across, channels)
+        self.time = nn.GRU(channels, channels)
+
+    def forward(self, x: Tensor) -> Tensor:
+        frames, pieces, bands, _ = x.shape
+        along = self.norms[0](x).permute(2, 0, 1, 3).flatten(1, 2)
+        across = self.mixed(self.bands(along)[0]).unflatten(1, (frames, pieces))
+        x = x + across.permute(1, 2, 0, 3)
+        return x + self.time(self.norms[1](x).flatten(1, 2))[0].unflatten(1, (pieces, bands))
+
+
+class BandSharedNetwork(nn.Module):
+    """A network that treats all bands alike: bins are gathered in two steps, recurrent layers run over bands and over
+    time with shared weights, and the way back to single bins sees what the way there saw. No weight version yet.
+    """
+
+    def __init__(self, context: int, bins: int, channels: int = 20, across: int = 12, depth: int = 2) -> None:
+        super().__init__()
+        self.context, self.bins, self.channels = context, bins, channels
+        half = channels * 3 // 4
+        self.gather = nn.ModuleList([nn.Linear(5 * context, half), nn.Linear(3 * half, channels)])
+        self.place = nn.Parameter(torch.zeros(bins // 4, channels))  # where in the spectrum a band is
+        self.blocks = nn.ModuleList(Both(channels, across) for _ in range(depth))
+        self.spread = nn.ModuleList([nn.Linear(channels, 2 * half), nn.Linear(half, 2 * half)])
+        self.output = nn.Linear(3 * (half + context), 1)
+        nn.init.constant_(self.output.bias, 1.0)
+
+    def initial_state(self, batch: int) -> Tensor:
+        return self.place.new_zeros(batch)
+
+    @staticmethod
+    def neighbours(x: Tensor, count: int, step: int) -> Tensor:
+        """Windows of `count` bins [..., F / step, count * C] of x [..., F, C]."""
+        padded = functional.pad(x, (0, 0, count // 2, count // 2))
+        return padded.unfold(-2, count, step).flatten(-2)
+
+    def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
+        seen = x.unflatten(-1, (self.context, self.bins)).permute(1, 0, 3, 2)
+        fine = functional.relu(self.gather[0](self.neighbours(seen, 5, 2)))
+        y = functional.relu(self.gather[1](self.neighbours(fine, 3, 2))) + self.place
+        for block in self.blocks:
+            y = block(y)
+        y = functional.relu(self.spread[0](y).unflatten(-1, (2, -1)).flatten(-3, -2) + fine)
+        y = functional.relu(self.spread[1](y).unflatten(-1, (2, -1)).flatten(-3, -2))
+        logits = self.output(self.neighbours(torch.cat([y, seen], -1), 3, 1))[..., 0]
+        return logits.transpose(0, 1), state
+
+
+Network = LayerNormGatedNetwork | PlainGatedNetwork | BandSharedNetwork

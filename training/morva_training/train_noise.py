@@ -16,7 +16,7 @@ from .convert import network_of, noise_weight
 from .losses import LEVEL_WEIGHTS, LevelLoss, LossWeights, MaskLoss
 from .mixing import Recipe
 from .mvw import Weight
-from .networks import LayerNormGatedNetwork, Network, PlainGatedNetwork
+from .networks import BandSharedNetwork, LayerNormGatedNetwork, Network, PlainGatedNetwork
 from .reshape import widened
 from .spectra import FULL_32K, SMALL_8K, SMALL_16K
 
@@ -31,7 +31,8 @@ class NoiseTask(trainer.Task):
 
     def __init__(self, args: argparse.Namespace) -> None:
         super().__init__(args)
-        self.layout = LAYOUTS[args.model]
+        layout = LAYOUTS[args.model]
+        self.layout = replace(layout, compress=0) if args.band_shared else layout
         self.context = self.layout.preview
         self.recipe = replace(LEVEL_RECIPE if args.level else Recipe(), seconds=args.seconds)
         asked = {term: getattr(args, term) for term in TERMS if getattr(args, term) is not None}
@@ -52,6 +53,8 @@ class NoiseTask(trainer.Task):
         if start:
             network = network_of(start)
             return widened(network, self.args.hidden or network.hidden)
+        if self.args.band_shared:
+            return BandSharedNetwork(self.context, self.layout.bins)
         kind = PlainGatedNetwork if self.args.plain else LayerNormGatedNetwork
         features = self.layout.preview * self.layout.bands
         return kind(features, self.args.hidden or HIDDEN[self.args.model], self.layout.bands)
@@ -83,13 +86,17 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     trainer.add_options(parser, steps=6000, batch=32, rate=1.5e-3, seed=1)
     parser.add_argument("--name", default="noise", help='"ModelName" of the weight file')
     parser.add_argument("--plain", action="store_true", help="version 0.0.5 network")
+    parser.add_argument("--band-shared", action="store_true", help="weights shared over bands; no weight file yet")
     parser.add_argument("--level", action="store_true", help="train for the level of the removed noise")
     parser.add_argument("--hidden", type=int, help="units per layer; more than in --start doubles some")
     parser.add_argument("--seconds", type=float, default=3.0, help="length of a piece")
     parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw of speech and noise")
     for term in TERMS:
         parser.add_argument(f"--{term.replace('_', '-')}", type=float, help="weight of this part of the loss")
-    return parser.parse_args(arguments)
+    args = parser.parse_args(arguments)
+    if args.band_shared and args.out:
+        parser.error("no weight version holds a network that shares its weights over the bands")
+    return args
 
 
 def main(arguments: list[str] | None = None) -> None:

@@ -20,6 +20,7 @@ from .convert import half_precision
 from .loop import Run, Schedule, steps_done
 from .mvw import Weight
 from .networks import Network, network_input
+from .spectra import Layout
 
 STATISTICS_BATCHES = 4
 
@@ -29,6 +30,7 @@ class Task(ABC):
 
     context: int  # frames of features that the network sees
     skipped: int  # frames at the start of a piece, while the memory fills
+    layout: Layout | None = None  # of the noise models
 
     def __init__(self, args: argparse.Namespace) -> None:
         self.args = args
@@ -108,7 +110,7 @@ def train_as(task: Task, rank: int) -> Run:
     else:
         some = torch.cat([next(batches)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
         mean, spread = (together.from_the_first(v) for v in task.statistics(some))
-    extra = {"mean": mean.tolist(), "spread": spread.tolist()}
+    extra = {"mean": mean.tolist(), "spread": spread.tolist(), "layout": task.layout}
     run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate, args.core_minutes), extra)
     task.standardise(run.extra["mean"], run.extra["spread"])
     run.train(batches, task.loss, task.validate)
