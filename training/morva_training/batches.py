@@ -75,9 +75,7 @@ class MixtureBatches(IterableDataset):
     Every draw is used `reuse` times, each time in another noise.
     """
 
-    def __init__(
-        self, store: Path, recipe: Recipe, size: int, seed: int, reuse: int = 2, split: str = "train"
-    ) -> None:
+    def __init__(self, store: Path, recipe: Recipe, size: int, seed: int, reuse: int = 2, split: str = "train") -> None:
         self.store, self.recipe, self.size = store, recipe, size
         self.seed, self.reuse, self.split = seed, reuse, split
 

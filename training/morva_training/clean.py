@@ -35,12 +35,12 @@ def cleaned(samples: np.ndarray, network: Network, layout: Layout, mean: Tensor,
     return (frames[:-1, layout.hop :] + frames[1:, : layout.hop]).flatten()[: len(samples)].numpy()
 
 
-def main() -> None:
+def main(arguments: list[str] | None = None) -> None:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("run", type=Path)
     parser.add_argument("input", type=Path)
     parser.add_argument("output", type=Path)
-    args = parser.parse_args()
+    args = parser.parse_args(arguments)
     torch.set_num_threads(1)
     network, extra = torch.load(args.run / "best.pt")
     layout: Layout = extra["layout"]

@@ -8,10 +8,11 @@ from pathlib import Path
 
 import numpy as np
 import pytest
+import soundfile
 import torch
 
 import morva
-from morva_training import mvw, together, train_noise, train_voice
+from morva_training import clean, mvw, together, train_noise, train_voice
 from morva_training.loop import Run, Schedule
 from morva_training.optimisers import orthogonalised
 
@@ -40,6 +41,37 @@ def test_noise_model_learns_resumes_and_grows(store: Path, tmp_path: Path) -> No
     others = entries(other, "dev_ratio_db")
     assert others[0] == pytest.approx(ratios[-1], abs=0.5) and others[-1] > ratios[-1]
     assert mvw.read(copy)["WeightGRU"].shape[1] == 24
+
+
+def test_network_shared_over_bands_learns_and_cleans(store: Path, tmp_path: Path) -> None:
+    """Without a weight file; frames do not depend on later ones."""
+    arguments = [
+        "8k",
+        "--band-shared",
+        "--store",
+        store,
+        "--run",
+        tmp_path,
+        "--steps",
+        12,
+        "--batch",
+        6,
+        "--workers",
+        0,
+    ]
+    train_noise.main([*map(str, arguments), "--rate", "0.01"])
+    losses = entries(tmp_path, "dev_loss")
+    assert losses[-1] < losses[0]
+    network = torch.load(tmp_path / "best.pt")[0]
+    x = torch.randn(2, 9, 3 * 80)
+    early, late = (network(x[:, :count], network.initial_state(2))[0][:, :5] for count in (5, 9))
+    assert torch.allclose(early, late, atol=1e-5)
+    soundfile.write(tmp_path / "in.wav", 0.1 * np.random.default_rng(3).standard_normal(4000), 8000)
+    clean.main([str(tmp_path / name) for name in ("", "in.wav", "out.wav")])
+    assert (
+        0 < np.std(soundfile.read(tmp_path / "out.wav")[0]) < 0.1
+        and soundfile.info(tmp_path / "out.wav").frames == 4000
+    )
 
 
 def test_level_model_with_its_own_loss_weights(store: Path, tmp_path: Path) -> None:
