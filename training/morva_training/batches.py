@@ -75,9 +75,7 @@ class MixtureBatches(IterableDataset):
     Every draw is used `reuse` times, each time in another noise.
     """
 
-    def __init__(
-        self, store: Path, recipe: Recipe, size: int, seed: int, reuse: int = 2, split: str = "train"
-    ) -> None:
+    def __init__(self, store: Path, recipe: Recipe, size: int, seed: int, reuse: int = 2, split: str = "train") -> None:
         self.store, self.recipe, self.size = store, recipe, size
         self.seed, self.reuse, self.split = seed, reuse, split
 
@@ -95,6 +93,6 @@ class MixtureBatches(IterableDataset):
                 base = drawn[len(items) % len(drawn)]
                 if base.noisy and base.has_speech:
                     other = sources[rng.integers(len(sources))]
-                    base = base.remixed(other, rng.uniform(*self.recipe.snr_db))
+                    base = base.remixed(other, self.recipe.snr(rng))
                 items.append(make_item(base, rng))
             yield {name: torch.stack([item[name] for item in items]) for name in items[0]}

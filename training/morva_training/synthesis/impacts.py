@@ -53,7 +53,9 @@ def hits(rng: Rng, thing: Thing, variants: int, rate: int) -> np.ndarray:
     return sounds / (np.abs(sounds).max() + 1e-9)
 
 
-def sequence(rng: Rng, times: np.ndarray, things: list[np.ndarray], spread_db: float, count: int, rate: int) -> np.ndarray:
+def sequence(
+    rng: Rng, times: np.ndarray, things: list[np.ndarray], spread_db: float, count: int, rate: int
+) -> np.ndarray:
     """Hits at the times (seconds), each of a random variant of a random object and of its own strength."""
     out = np.zeros(count, np.float32)
     for time in times:

@@ -9,7 +9,9 @@ from .sources import Rng, added, cycle_of, decays, log_uniform, normal, played
 SCALES = ((0, 2, 4, 5, 7, 9, 11), (0, 2, 3, 5, 7, 8, 10), (0, 3, 5, 7, 10))
 
 
-def _note(rng: Rng, bright: np.ndarray, dull: np.ndarray, hz: float, seconds: float, held: bool, rate: int) -> np.ndarray:
+def _note(
+    rng: Rng, bright: np.ndarray, dull: np.ndarray, hz: float, seconds: float, held: bool, rate: int
+) -> np.ndarray:
     """Plucked: bright first, then dull and soft. Held: with a soft start, an end, and vibrato."""
     count = int(seconds * rate)
     time = np.arange(count, dtype=np.float32) / rate
@@ -65,7 +67,11 @@ def drums(rng: Rng, count: int, rate: int) -> np.ndarray:
     for index in range(int(count / rate / beat) + 2):
         now = int((index - rng.random() * 0.02) * beat * rate)
         noise = normal(rng, len(time))
-        sounds = (kick, shell + noise * np.exp(-time * 25), 0.4 * np.diff(noise, prepend=noise[:1]) * np.exp(-time * 60))
+        sounds = (
+            kick,
+            shell + noise * np.exp(-time * 25),
+            0.4 * np.diff(noise, prepend=noise[:1]) * np.exp(-time * 60),
+        )
         for sound, bar in zip(sounds, chances):
             if bar[index % 8]:
                 added(out, sound * np.float32(rng.uniform(0.5, 1.0)), now)

@@ -27,7 +27,9 @@ def _drops(rng: Rng, count: int, per_second: float, sound: np.ndarray, rate: int
     """A sound at random times and strengths."""
     train = np.zeros(count, np.float32)
     number = rng.poisson(per_second * count / rate)
-    np.add.at(train, rng.integers(count, size=number), np.exp(spread * normal(rng, number)) * np.sign(normal(rng, number)))
+    np.add.at(
+        train, rng.integers(count, size=number), np.exp(spread * normal(rng, number)) * np.sign(normal(rng, number))
+    )
     size = sfft.next_fast_len(count + len(sound), real=True)
     return sfft.irfft(sfft.rfft(train, size) * sfft.rfft(sound, size), size)[:count]
 
@@ -51,7 +53,9 @@ def fire(rng: Rng, count: int, rate: int) -> np.ndarray:
     sound = normal(rng, size) * np.exp(-6.9 * np.arange(size) / size).astype(np.float32)
     crackles = _drops(rng, count, log_uniform(rng, 20.0, 1500.0), sound, rate, rng.uniform(0.5, 1.5))
     crackles *= np.exp(rng.uniform(0.3, 1.5) * stretched(wander(rng, steps, rng.uniform(1.0, 8.0))[:, 0], count))
-    return unit(crackles) + unit(moving_noise(rng, floor, count, rate)) * np.float32(10 ** (rng.uniform(-25.0, 3.0) / 20))
+    return unit(crackles) + unit(moving_noise(rng, floor, count, rate)) * np.float32(
+        10 ** (rng.uniform(-25.0, 3.0) / 20)
+    )
 
 
 def wind(rng: Rng, count: int, rate: int) -> np.ndarray:
