@@ -120,7 +120,7 @@ class Folder:
                 tone = joined(sorted(pieces, key=len, reverse=True), rate)
                 said = self.speakers[speaker]
                 row = {"kind": "noise", "category": "room_tone", "recording": f"room of {speaker}", "split": "train"}
-                self.write(row | {"source": said["source"], "licence": said["licence"]}, tone, rate)
+                self.write(row | {name: said.get(name) or "" for name in ("source", "licence")}, tone, rate)
 
     def write_tables(self) -> None:
         for kind, rows in self.rows.items():
