@@ -93,6 +93,6 @@ class MixtureBatches(IterableDataset):
                 base = drawn[len(items) % len(drawn)]
                 if base.noisy and base.has_speech:
                     other = sources[rng.integers(len(sources))]
-                    base = base.remixed(other, rng.uniform(*self.recipe.snr_db))
+                    base = base.remixed(other, self.recipe.snr(rng))
                 items.append(make_item(base, rng))
             yield {name: torch.stack([item[name] for item in items]) for name in items[0]}

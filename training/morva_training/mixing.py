@@ -1,25 +1,37 @@
 """Mixtures for training: speech, rooms, noises, levels and equalisation drawn at random.
 
-One `MixtureMaker` owns a random generator and a corpus; `draw` returns a piece of speech and what
-disturbs it, and how what is heard is clipped. Room reverberation belongs to the speech: the task is to
-remove noise, not the room. Speech without content above 8 kHz is flagged, so that the loss gives it no
-say about the bins above.
+One `MixtureMaker` owns a random generator and a corpus; `draw` returns a piece of speech, what
+disturbs it, and the channel through which the sum is heard. Early reflections belong to the speech; so
+does the rest of the room, unless the recipe says that only what is early is wanted. Speech without
+content above 8 kHz is flagged, so that the loss gives it no say about the bins above.
 """
 
 from __future__ import annotations
 
-from dataclasses import dataclass, replace
+from dataclasses import dataclass, field, replace
 from pathlib import Path
 
 import numpy as np
 from scipy import fft as sfft
-from scipy.ndimage import gaussian_filter1d
-from scipy.signal import lfilter
 
+from . import synthesis
+from .channels import (
+    CODECS,
+    CONVERTER_HZ,
+    FULL_SCALE,
+    Channel,
+    gain_steps,
+    gaps,
+    low_pass,
+    microphone_gain,
+    smooth_gain,
+)
 from .corpus import BASE_RATE, Clip, Corpus
 from .measures import active_level
-
-FULL_SCALE = 32768.0
+from .rooms import convolved, parted, simulated_room
+from .synthesis import machines, texture
+from .synthesis.sources import added
+from .voices import formants_moved, whispered
 
 # Short sounds are a small part of the recordings and a large part of what callers complain about.
 IMPULSIVE = (
@@ -34,44 +46,102 @@ class Recipe:
 
     seconds: float = 4.0
     snr_db: tuple[float, float] = (-8.0, 24.0)
+    hard_share: float | None = None  # of pieces below `hard_db`; evenly over the range unless given
+    hard_db: float = 5.0
     level_db: tuple[float, float] = (-42.0, -14.0)
     clean_share: float = 0.06
     noise_only_share: float = 0.04
-    room_share: float = 0.30
-    simulated_room_share: float = 0.4  # of the rooms
-    second_noise_share: float = 0.35
-    synthetic_share: float = 0.06
-    babble_share: float = 0.08
-    band_limit_share: float = 0.06
-    clip_share: float = 0.03
+    # speech
     pause_share: float = 0.5
     pause_seconds: float = 0.5  # mean length
     speed_share: float = 0.25
     speed: tuple[float, float] = (0.9, 1.1)
-    noise_speed_share: float = 0.5
-    noise_speed: tuple[float, float] = (0.75, 1.35)
+    formant_share: float = 0.0
+    formants: tuple[float, float] = (0.84, 1.19)
     whisper_share: float = 0.04
     full_band_share: float = 0.35
-    equaliser_db: float = 3.0  # deviation from one point of the equaliser to the next
+    # rooms
+    room_share: float = 0.30
+    simulated_room_share: float = 0.4  # of the rooms
+    early_only: bool = False  # late reverberation is no part of the wanted speech
+    # noise
+    second_noise_share: float = 0.35
+    synthetic_share: float = 0.06
+    babble_share: float = 0.08
+    talkers: tuple[int, int] = (4, 9)
+    made_share: float = 0.0
+    texture_share: float = 0.0
+    noise_speed_share: float = 0.5
+    noise_speed: tuple[float, float] = (0.75, 1.35)
+    noise_room_share: float = 0.0
+    start_stop_share: float = 0.0
     boosted: tuple[str, ...] = IMPULSIVE  # noise categories drawn three times as often
+    # microphone and connection
+    equaliser_db: float = 3.0  # deviation from one point of the equaliser to the next
+    microphone_share: float = 0.0
+    band_limit_share: float = 0.06
+    band_limit_hz: tuple[float, float] = (3300.0, 12000.0)
+    converter_share: float = 0.0
+    gain_step_share: float = 0.0
+    gap_share: float = 0.0
+    clip_share: float = 0.03
+    overload_share: float = 0.0  # of pieces so loud that full scale clips them
+    codec_share: float = 0.0
+
+    def snr(self, rng: np.random.Generator) -> float:
+        low, high = self.snr_db
+        if self.hard_share is not None:
+            low, high = (low, self.hard_db) if rng.random() < self.hard_share else (self.hard_db, high)
+        return float(rng.uniform(low, high))
+
+
+RECIPES = {
+    "plain": Recipe(),
+    "widened": Recipe(
+        snr_db=(-10.0, 25.0),
+        hard_share=0.55,
+        level_db=(-46.0, -12.0),
+        speed_share=0.4,
+        speed=(0.85, 1.2),
+        formant_share=0.2,
+        room_share=0.5,
+        simulated_room_share=0.75,
+        early_only=True,
+        synthetic_share=0.0,
+        babble_share=0.1,
+        talkers=(3, 25),
+        made_share=0.35,
+        texture_share=0.15,
+        noise_room_share=0.25,
+        start_stop_share=0.15,
+        microphone_share=0.4,
+        band_limit_share=0.5,
+        band_limit_hz=(3400.0, 14000.0),
+        converter_share=0.5,
+        gain_step_share=0.1,
+        gap_share=0.04,
+        overload_share=0.03,
+        codec_share=0.12,
+    ),
+}
 
 
 @dataclass(frozen=True)
 class Waves:
     """A piece of speech and what disturbs it, as samples on the 16-bit scale."""
 
-    speech: np.ndarray
+    speech: np.ndarray  # the part of it that is wanted
     noise: np.ndarray
     rate: int
     wideband: bool  # False for speech that holds nothing above 8 kHz
     has_speech: bool
     noisy: bool  # False for a piece that is clean but for a faint background
-    clip: float | None = None  # share of its peak at which the microphone clips the sum
+    late: np.ndarray | None = None  # late reverberation of the speech, where it is not wanted
+    channel: Channel = field(default_factory=Channel)
 
     def heard(self) -> np.ndarray:
         total = self.speech + self.noise
-        limit = FULL_SCALE if self.clip is None else min(FULL_SCALE, self.clip * np.abs(total).max())
-        return np.clip(total, -limit, limit)
+        return self.channel.heard(total if self.late is None else total + self.late, self.rate)
 
     def remixed(self, other: Waves, snr_db: float) -> Waves:
         """This speech in the noise of another piece."""
@@ -84,54 +154,6 @@ def at_level(samples: np.ndarray, rate: int, reference: float, db: float) -> np.
     return samples * np.float32(reference * 10 ** (db / 20) / (active_level(samples, rate) + 1e-3))
 
 
-def simulated_room(rng: np.random.Generator, rate: int) -> np.ndarray:
-    """A room response as decaying, slowly darkening noise behind the direct sound."""
-    t60 = rng.uniform(0.12, 0.7)
-    direct_to_reverberant = rng.uniform(-2.0, 12.0)
-    length = int(min(t60, 0.6) * rate)
-    time = np.arange(length) / rate
-    tail = rng.standard_normal(length) * np.exp(-6.9 * time / t60)
-    tail = lfilter([1 - rng.uniform(0.1, 0.6)], [1, -rng.uniform(0.1, 0.6)], tail)
-    tail[: int(rng.uniform(0.001, 0.006) * rate)] = 0.0
-    tail *= 10 ** (-direct_to_reverberant / 20) / (np.sqrt(np.sum(tail**2)) + 1e-9)
-    tail[0] = 1.0
-    return tail.astype(np.float32)
-
-
-def whispered(rng: np.random.Generator, samples: np.ndarray, rate: int) -> np.ndarray:
-    """The same words without a voice: the smoothed spectrum, excited by noise, thin below 500 Hz."""
-    size = rate // 50
-    frames = np.lib.stride_tricks.sliding_window_view(np.pad(samples, (size, size)), size)[:: size // 2]
-    window = np.sin(np.pi * (np.arange(size) + 0.5) / size).astype(np.float32)
-    spectra = sfft.rfft(frames * window, axis=-1)
-    envelope = gaussian_filter1d(np.abs(spectra), 4.0, axis=-1)
-    frequency = np.arange(envelope.shape[-1]) * 50.0
-    noise = rng.standard_normal((*envelope.shape, 2)).astype(np.float32)
-    spectra = envelope * (noise[..., 0] + 1j * noise[..., 1]) * (frequency / (frequency + 500.0))
-    pieces = sfft.irfft(spectra.astype(np.complex64), n=size, axis=-1) * window
-    out = np.zeros((len(pieces) + 1, size // 2), np.float32)
-    out[:-1] += pieces[:, : size // 2]
-    out[1:] += pieces[:, size // 2 :]
-    return out.reshape(-1)[size : size + len(samples)]
-
-
-def coloured_noise(rng: np.random.Generator, count: int, rate: int) -> np.ndarray:
-    """Steady or slowly breathing noise with a random spectral slope and now and then a hum."""
-    spectrum = sfft.rfft(rng.standard_normal(count).astype(np.float32))
-    frequency = np.maximum(sfft.rfftfreq(count, 1 / rate), 20.0)
-    spectrum *= (frequency / 1000.0) ** rng.uniform(-1.2, 0.3)
-    noise = sfft.irfft(spectrum, n=count)
-    time = np.arange(count) / rate
-    if rng.random() < 0.3:
-        base = rng.choice([50.0, 60.0, rng.uniform(80, 400)])
-        for harmonic in range(1, rng.integers(2, 12)):
-            swing = rng.uniform(0, 2 * np.pi)
-            noise += noise.std() * rng.uniform(0, 0.8) * np.sin(2 * np.pi * base * harmonic * time + swing)
-    if rng.random() < 0.4:
-        noise *= 1.0 + rng.uniform(0.1, 0.7) * np.sin(2 * np.pi * rng.uniform(0.1, 6.0) * time)
-    return noise.astype(np.float32)
-
-
 def resampled(samples: np.ndarray, ratio: float) -> np.ndarray:
     """Band-limited, about `ratio` times as long (as the transform finds convenient)."""
     size = sfft.next_fast_len(len(samples), real=True)
@@ -141,13 +163,14 @@ def resampled(samples: np.ndarray, ratio: float) -> np.ndarray:
     return out[: round(len(samples) * target / size)]
 
 
-def smooth_gain(rng: np.random.Generator, bins: int, rate: int, deviation_db: float) -> np.ndarray:
-    """A smooth random equaliser over the bins up to rate / 2: six points, evenly spaced in octaves."""
-    points = np.cumsum(rng.normal(0.0, deviation_db, 6)) * 0.6
-    frequency = np.linspace(0.0, rate / 2, bins)
-    position = np.log2(1 + frequency / 200.0) / np.log2(1 + rate / 400.0) * 5
-    curve = np.interp(position, np.arange(6), points - points.mean())
-    return (10 ** (curve / 20)).astype(np.float32)
+def faded(samples: np.ndarray, fade: int) -> np.ndarray:
+    """Without steps at its ends; a copy."""
+    samples, fade = samples.copy(), min(fade, len(samples) // 2)
+    if fade:
+        rise = np.sin(np.linspace(0.0, np.pi / 2, fade)).astype(np.float32)
+        samples[:fade] *= rise
+        samples[-fade:] *= rise[::-1]
+    return samples
 
 
 class Warped:
@@ -182,7 +205,8 @@ class MixtureMaker:
         self.recipe, self.rate = recipe or Recipe(), rate
         self.rng = np.random.default_rng(seed)
         self.corpus, self.warped = Corpus(store, rate), Warped(store, rate)
-        self.block = rate // 50
+        self.block, self.fade = rate // 50, rate // 200
+        self.textures: dict[str, texture.Texture] = {}
         self.count = int(self.recipe.seconds * rate) // self.block * self.block
         self.rooms = self.corpus.rooms(split)
         self.voices = {band: self._long(self.corpus.voices(split, band)) for band in ("full", "8k")}
@@ -191,6 +215,8 @@ class MixtureMaker:
         self.category_names = list(self.categories)
         odds = odds_of(self.categories) * np.where(np.isin(self.category_names, self.recipe.boosted), 3.0, 1.0)
         self.category_odds = odds / odds.sum()
+        chances = np.array(list(synthesis.KINDS.values()))
+        self.kinds, self.kind_odds = list(synthesis.KINDS), chances / chances.sum()
 
     def _long(self, groups: dict[str, list[Clip]]) -> dict[str, list[Clip]]:
         """Groups, in the order of their names, without clips that are shorter than a block."""
@@ -215,55 +241,108 @@ class MixtureMaker:
                 piece = self.warped.read(clip, offset, self.count - position, self.rng.uniform(*self.recipe.speed))
             else:
                 piece = self.corpus.read(clip, offset, self.count)
-            piece = piece[: self.count - position]
+            piece = faded(piece[: self.count - position], self.fade)
             out[position : position + len(piece)] = piece
             position += len(piece)
             if pauses and self.rng.random() < self.recipe.pause_share:
                 position += int(self.rng.exponential(self.recipe.pause_seconds) * self.rate)
         return out
 
-    def babble(self) -> np.ndarray:
-        """Many talkers at similar levels, most of them in the same room."""
-        total = np.zeros(self.count, np.float32)
-        for _ in range(self.rng.integers(4, 9)):
-            voice = self.talk(self.voice()[1], pauses=False)
-            total += at_level(voice, self.rate, 1.0, self.rng.normal(0, 3))
-        return self.in_room(total)
-
-    def in_room(self, samples: np.ndarray) -> np.ndarray:
+    def one_room(self) -> np.ndarray:
         if self.rooms and self.rng.random() > self.recipe.simulated_room_share:
-            room = self.rooms[self.rng.integers(len(self.rooms))]
-        else:
-            room = simulated_room(self.rng, self.rate)
-        size = sfft.next_fast_len(len(samples) + len(room), real=True)
-        product = sfft.rfft(samples, size) * sfft.rfft(room, size)
-        return sfft.irfft(product, size)[: len(samples)]
+            return self.rooms[self.rng.integers(len(self.rooms))]
+        return simulated_room(self.rng, self.rate)
 
-    def one_noise(self) -> np.ndarray:
-        draw = self.rng.random()
-        if draw < self.recipe.synthetic_share:
-            return coloured_noise(self.rng, self.count, self.rate)
-        if draw < self.recipe.synthetic_share + self.recipe.babble_share:
-            return self.babble()
-        clips = self.categories[self.rng.choice(self.category_names, p=self.category_odds)]
-        clip = clips[self.rng.integers(len(clips))]
-        out = np.zeros(self.count, np.float32)
-        offset = int(self.rng.integers(clip.length)) if self.rng.random() < 0.7 else 0
-        position = 0
-        warped = self.rng.random() < self.recipe.noise_speed_share
+    def babble(self) -> np.ndarray:
+        """Many talkers at similar levels, in two places of a room."""
+        places = np.zeros((2, self.count), np.float32)
+        low, high = self.recipe.talkers
+        for _ in range(int(low * (high / low) ** self.rng.random())):
+            voice = self.chatter(self.voice()[1])
+            places[self.rng.integers(2)] += at_level(voice, self.rate, 1.0, self.rng.normal(0, 3))
+        return sum(convolved(place, [self.one_room()])[0] for place in places if place.any())
+
+    def chatter(self, clips: list[Clip]) -> np.ndarray:
+        """One speaker without a rest."""
+        out, position = np.zeros(self.count, np.float32), 0
         while position < self.count:
-            if warped:
-                speed = self.rng.uniform(*self.recipe.noise_speed)
-                piece = self.warped.read(clip, offset, self.count - position, speed)
-            else:
-                piece = self.corpus.read(clip, offset, self.count)
-            piece = piece[: self.count - position]
+            clip = clips[self.rng.integers(len(clips))]
+            offset = int(self.rng.integers(max(1, clip.length - self.rate)))
+            piece = faded(self.corpus.read(clip, offset, self.count - position), self.fade)
             out[position : position + len(piece)] = piece
             position += len(piece)
-            offset = 0
-            if clip.length < 2 * self.rate:  # a short sound: with a rest before it comes again
-                position += int(self.rng.uniform(0, 0.8) * self.rate)
         return out
+
+    def recorded(self) -> np.ndarray:
+        """Recordings of one category: where one ends the next fades in; short sounds come with rests between."""
+        clips = self.categories[self.rng.choice(self.category_names, p=self.category_odds)]
+        out = np.zeros(self.count, np.float32)
+        speed = (
+            self.rng.uniform(*self.recipe.noise_speed) if self.rng.random() < self.recipe.noise_speed_share else None
+        )
+        position, fade = 0, self.rate // 10
+        while self.count - position > self.block:
+            clip = clips[self.rng.integers(len(clips))]
+            short = clip.length < 2 * self.rate
+            offset = int(self.rng.integers(clip.length)) if not short and self.rng.random() < 0.7 else 0
+            length = self.count - position
+            if speed is None:
+                piece = self.corpus.read(clip, offset, length)
+            else:
+                piece = self.warped.read(clip, offset, length, speed)
+            if not short:  # what one is louder than the next is the recordists' choice
+                piece = at_level(piece, self.rate, 1000.0, 0.0)
+            added(out, faded(piece, self.fade if short else fade), position)
+            position += (
+                len(piece) + int(self.rng.uniform(0, 0.8) * self.rate) if short else max(fade, len(piece) - fade)
+            )
+        return out
+
+    def textured(self) -> np.ndarray:
+        """Fresh noise with the statistics of one or two recordings."""
+        first = texture.varied(self.rng, self.texture())
+        if self.rng.random() < 0.3:
+            first = texture.mixed(first, self.texture(), self.rng.uniform(0.2, 0.6))
+        return texture.played(self.rng, first, self.count, self.rate)
+
+    def texture(self) -> texture.Texture:
+        """Of a random recording that is long enough; measured once."""
+        while True:
+            clips = self.categories[self.rng.choice(self.category_names, p=self.category_odds)]
+            clip = clips[self.rng.integers(len(clips))]
+            if clip.length >= texture.SHORTEST * self.rate:
+                break
+        if clip.path not in self.textures:
+            self.textures[clip.path] = texture.measured(self.corpus.read(clip, 0, 6 * self.rate), self.rate)
+        return self.textures[clip.path]
+
+    def one_noise(self) -> np.ndarray:
+        r = self.recipe
+        shares = np.array([r.synthetic_share, r.babble_share, r.made_share, r.texture_share])
+        kind = int(np.searchsorted(np.cumsum(shares), self.rng.random(), "right"))
+        if kind == 0:
+            noise = machines.coloured(self.rng, self.count, self.rate)
+        elif kind == 1:
+            return self.babble()
+        elif kind == 2:
+            made = self.kinds[self.rng.choice(len(self.kinds), p=self.kind_odds)]
+            noise = made(self.rng, self.count, self.rate)
+        else:
+            noise = self.textured() if kind == 3 else self.recorded()
+        if self.rng.random() < r.noise_room_share:
+            noise = convolved(noise, [self.one_room()])[0]
+        if self.rng.random() < r.start_stop_share:
+            noise = self.started_and_stopped(noise)
+        return noise
+
+    def started_and_stopped(self, noise: np.ndarray) -> np.ndarray:
+        """A part of the piece, suddenly or not."""
+        length = int(self.count * self.rng.uniform(0.2, 0.8))
+        start = int(self.rng.integers(-length // 2, self.count - length // 2))
+        part = slice(max(0, start), start + length)
+        out = np.zeros_like(noise)
+        out[part] = faded(noise[part], int(self.rate * 0.005 * 100.0 ** self.rng.random()))
+        return out if out.any() else noise
 
     def noises(self) -> np.ndarray:
         noise = at_level(self.one_noise(), self.rate, 1.0, 0.0)
@@ -271,18 +350,50 @@ class MixtureMaker:
             noise += at_level(self.one_noise(), self.rate, 1.0, self.rng.uniform(-12, 3))
         return noise
 
-    def equalised(self, speech: np.ndarray, noise: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
-        """Both as the microphone takes them, the noise also as its place does."""
-        bins = self.count // 2 + 1
-        gain = smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)
-        if self.rng.random() < self.recipe.band_limit_share:
-            edge = self.rng.uniform(3300, 12000) / (self.rate / 2)
-            steepness = np.clip((np.arange(bins) / bins - edge) * 200, -40, 40)
-            gain = (gain / (1 + np.exp(steepness))).astype(np.float32)
-        gains = np.stack([gain, gain * smooth_gain(self.rng, bins, self.rate, self.recipe.equaliser_db)])
-        spectra = sfft.rfft(np.stack([speech, noise]).astype(np.float32), axis=-1)
-        speech, noise = sfft.irfft(spectra * gains, n=self.count, axis=-1)
-        return speech, noise
+    def equalised(self, speech: np.ndarray, noise: np.ndarray) -> np.ndarray:
+        """All as the microphone takes them, the noise also as its place does: `speech` [parts, n] and then `noise`."""
+        r, bins = self.recipe, self.count // 2 + 1
+        gain = smooth_gain(self.rng, bins, self.rate, r.equaliser_db)
+        if self.rng.random() < r.microphone_share:
+            gain *= microphone_gain(self.rng, bins, self.rate)
+        if self.rng.random() < r.band_limit_share:
+            low, high = r.band_limit_hz
+            gain *= low_pass(bins, self.rate, low * (high / low) ** self.rng.random())
+        if self.rng.random() < r.converter_share:
+            gain *= low_pass(bins, self.rate, CONVERTER_HZ)
+        spectra = sfft.rfft(np.concatenate([speech, noise[None]]).astype(np.float32, copy=False), axis=-1)
+        spectra *= gain
+        spectra[-1] *= smooth_gain(self.rng, bins, self.rate, r.equaliser_db)
+        return sfft.irfft(spectra, n=self.count, axis=-1)
+
+    def spoken(self, band: str, clips: list[Clip]) -> np.ndarray:
+        """[1 or 2, n]: what is wanted of a speaker in a room, and what is not."""
+        r = self.recipe
+        speech = self.talk(clips)
+        if self.rng.random() < r.whisper_share:
+            speech = whispered(self.rng, speech, self.rate)
+        elif self.rng.random() < r.formant_share:
+            highest = min(0.45 * self.rate, 14000.0 if band == "full" else 7000.0)
+            speech = formants_moved(speech, self.rate, self.rng.uniform(*r.formants), highest)
+        if self.rng.random() >= r.room_share:
+            return speech[None]
+        room = self.one_room()
+        return convolved(speech, list(parted(room, self.rate)) if r.early_only else [room])
+
+    def over_time(self, parts: np.ndarray) -> np.ndarray:
+        """Gains that change, and packets that are lost, for all parts alike."""
+        if self.rng.random() < self.recipe.gain_step_share:
+            parts = parts * gain_steps(self.rng, self.count, self.rate)
+        if self.rng.random() < self.recipe.gap_share:
+            parts = parts * gaps(self.rng, self.count, self.rate)
+        return parts
+
+    def channel(self) -> Channel:
+        r = self.recipe
+        clip = self.rng.uniform(0.3, 0.9) if self.rng.random() < r.clip_share else None
+        if self.rng.random() >= r.codec_share:
+            return Channel(clip)
+        return Channel(clip, str(self.rng.choice(list(CODECS))), self.rng.random())
 
     def draw(self) -> Waves:
         """One piece of `recipe.seconds`."""
@@ -290,22 +401,23 @@ class MixtureMaker:
         kind = self.rng.random()
         band, clips = self.voice()
         has_speech = kind >= r.noise_only_share
-        speech = self.talk(clips) if has_speech else np.zeros(self.count, np.float32)
-        if has_speech and self.rng.random() < r.whisper_share:
-            speech = whispered(self.rng, speech, self.rate)
-        if has_speech and self.rng.random() < r.room_share:
-            speech = self.in_room(speech)
+        speech = self.spoken(band, clips) if has_speech else np.zeros((1, self.count), np.float32)
         clean = has_speech and kind < r.noise_only_share + r.clean_share
-        noise = coloured_noise(self.rng, self.count, self.rate) if clean else self.noises()
-        speech, noise = self.equalised(speech, noise)
+        noise = machines.coloured(self.rng, self.count, self.rate) if clean else self.noises()
+        *speech, noise = self.over_time(self.equalised(speech, noise))
         level = FULL_SCALE * 10 ** (self.rng.uniform(*r.level_db) / 20)
-        snr = self.rng.uniform(*((35.0, 70.0) if clean else r.snr_db))
+        if has_speech and self.rng.random() < r.overload_share:
+            wanted = FULL_SCALE / self.rng.uniform(0.25, 0.9)
+            level = wanted * active_level(speech[0], self.rate) / (np.abs(speech[0]).max() + 1e-3)
+        snr = self.rng.uniform(35.0, 70.0) if clean else r.snr(self.rng)
+        scale = np.float32(level / (active_level(speech[0], self.rate) + 1e-3))
         return Waves(
-            speech=at_level(speech, self.rate, level, 0.0),
+            speech=speech[0] * scale,
             noise=at_level(noise, self.rate, level, -snr),
             rate=self.rate,
             wideband=band == "full" or not has_speech,  # nobody is heard: all bands are known to be noise
             has_speech=has_speech,
             noisy=not clean,
-            clip=self.rng.uniform(0.3, 0.9) if self.rng.random() < r.clip_share else None,
+            late=speech[1] * scale if len(speech) > 1 else None,
+            channel=self.channel(),
         )

@@ -14,7 +14,7 @@ from . import trainer
 from .batches import Batch, MixtureBatches
 from .convert import network_of, noise_weight
 from .losses import LEVEL_WEIGHTS, LevelLoss, LossWeights, MaskLoss
-from .mixing import Recipe
+from .mixing import RECIPES
 from .mvw import Weight
 from .networks import BandSharedNetwork, LayerNormGatedNetwork, Network, PlainGatedNetwork
 from .reshape import widened
@@ -22,7 +22,7 @@ from .spectra import FULL_32K, SMALL_8K, SMALL_16K
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
 HIDDEN = {"32k": 304, "16k": 208, "8k": 160}
-LEVEL_RECIPE = Recipe(snr_db=(-8.0, 40.0), noise_only_share=0.15, synthetic_share=0.25)
+LEVEL_CHANGES = {"snr_db": (-8.0, 40.0), "hard_share": None, "noise_only_share": 0.15, "synthetic_share": 0.25}
 TERMS = tuple(vars(LossWeights()))
 
 
@@ -34,7 +34,7 @@ class NoiseTask(trainer.Task):
         layout = LAYOUTS[args.model]
         self.layout = replace(layout, compress=0) if args.band_shared else layout
         self.context = self.layout.preview
-        self.recipe = replace(LEVEL_RECIPE if args.level else Recipe(), seconds=args.seconds)
+        self.recipe = replace(RECIPES[args.recipe], seconds=args.seconds, **(LEVEL_CHANGES if args.level else {}))
         asked = {term: getattr(args, term) for term in TERMS if getattr(args, term) is not None}
         weights = replace(LEVEL_WEIGHTS if args.level else LossWeights(), **asked)
         self.band_of_bin = torch.from_numpy(self.layout.band_of_bin()).to(self.device)
@@ -88,6 +88,7 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     parser.add_argument("--plain", action="store_true", help="version 0.0.5 network")
     parser.add_argument("--band-shared", action="store_true", help="weights shared over bands; no weight file yet")
     parser.add_argument("--level", action="store_true", help="train for the level of the removed noise")
+    parser.add_argument("--recipe", choices=RECIPES, default="plain", help="how mixtures are drawn")
     parser.add_argument("--hidden", type=int, help="units per layer; more than in --start doubles some")
     parser.add_argument("--seconds", type=float, default=3.0, help="length of a piece")
     parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw of speech and noise")
