@@ -1,9 +1,10 @@
 #!/usr/bin/python3
 """Says how much noise a cleaned recording lost and draws it before and after.
 
-    scripts/demo_picture.py NOISY CLEAN CLEANED PICTURE
+    scripts/demo_picture.py NOISY CLEAN CLEANED SCORES PICTURE
 
-CLEAN is the speech in NOISY without its noise; the three files are mono, of one rate and length.
+CLEAN is the speech in NOISY without its noise; the three files are mono, of one rate and length. SCORES is what
+`morva vad NOISY --format csv` says; the pauses are taken from it, as everywhere where no clean speech is known.
 """
 
 import sys
@@ -19,7 +20,7 @@ from PIL import Image
 
 sys.path.insert(0, str(Path(__file__).resolve().parents[1] / "training"))
 
-from morva_training.measures import level_db, pauses_of, si_sdr  # noqa: E402
+from morva_training.measures import noise_in_pauses, pauses_of_scores, si_sdr  # noqa: E402
 
 
 def draw(sounds: dict[str, np.ndarray], rate: int, path: str) -> None:
@@ -38,13 +39,13 @@ def draw(sounds: dict[str, np.ndarray], rate: int, path: str) -> None:
 
 
 def main() -> None:
-    noisy_path, clean_path, cleaned_path, picture = sys.argv[1:]
+    noisy_path, clean_path, cleaned_path, scores, picture = sys.argv[1:]
     noisy, rate = soundfile.read(noisy_path)
     clean, _ = soundfile.read(clean_path)
     cleaned, _ = soundfile.read(cleaned_path)
-    quiet = pauses_of(clean, rate)
-    before, after = level_db(noisy[quiet]), level_db(cleaned[quiet])
-    print(f"noise in pauses   {before:6.1f} dBFS -> {after:6.1f} dBFS   ({before - after:.1f} dB quieter)")
+    pauses = pauses_of_scores(np.loadtxt(scores, delimiter=",", skiprows=1, usecols=1))
+    before, after = noise_in_pauses(noisy, cleaned, pauses, rate)
+    print(f"noise in pauses   {before:6.1f} dBFS -> {after:6.1f} dBFS   ({before - after:.0f} dB quieter)")
     before, after = si_sdr(clean, noisy), si_sdr(clean, cleaned)
     print(f"SI-SDR            {before:6.1f} dB   -> {after:6.1f} dB     ({after - before:+.1f} dB)")
     draw({"Before": noisy, "After": cleaned, "The speech without noise, for comparison": clean}, rate, picture)

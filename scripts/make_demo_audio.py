@@ -16,9 +16,13 @@ import numpy as np
 import soundfile
 from scipy import signal
 
+sys.path.insert(0, str(pathlib.Path(__file__).resolve().parents[1] / "training"))
+
+from morva_training.measures import active_level  # noqa: E402
+
 RATE = 48000
 SECONDS = 10
-SNR_DB = 7.0  # speech to noise, both over the time in which somebody speaks
+SNR_DB = 7.6  # active level of the speech over that of the noise
 LINES = [  # start in seconds, voice, text
     (0.9, "slt", "The train leaves from platform four, at half past nine."),
     (5.4, "rms", "Thank you. Please keep a seat free for me, next to the window."),
@@ -80,10 +84,7 @@ def main() -> None:
     rng = np.random.default_rng(20260101)
     clean = speech()
     noise = fan(rng) + car(rng) + typing(rng)
-    envelope = signal.lfilter([0.001], [1, -0.999], clean**2)
-    spoken = envelope > 1e-3 * envelope.max()
-    ratio = np.mean(clean[spoken] ** 2) / np.mean(noise[spoken] ** 2)
-    noise *= np.sqrt(ratio) * 10 ** (-SNR_DB / 20)
+    noise *= active_level(clean, RATE) / active_level(noise, RATE) * 10 ** (-SNR_DB / 20)
     for name, sound in [("clean", clean), ("noisy", clean + noise)]:
         assert np.abs(sound).max() < 1, "the mixture would clip"
         soundfile.write(folder / f"{name}.flac", sound, RATE, subtype="PCM_16")

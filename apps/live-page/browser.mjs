@@ -6,7 +6,10 @@ import path from 'node:path';
 import { fileURLToPath } from 'node:url';
 import { require } from './dependencies.mjs';
 
-const recording = new URL('../../examples/audio/noisy.flac', import.meta.url);
+/** The bundled noisy recording. */
+export const recording = fileURLToPath(
+  new URL('../../examples/audio/noisy.flac', import.meta.url),
+);
 const TIMEOUT_MS = 180_000;
 
 /** Path of the browser, or null: $CHROMIUM, else one on the search path. */
@@ -21,7 +24,7 @@ export function findChromium() {
 /** @param {string} folder where the microphone's file may lie */
 export async function openBrowser(folder) {
   const microphone = path.join(folder, 'microphone.wav');
-  execFileSync('sox', [fileURLToPath(recording), '-b', '16', microphone]);
+  execFileSync('sox', [recording, '-b', '16', microphone]);
   return require('playwright-core').chromium.launch({
     executablePath: findChromium(),
     timeout: TIMEOUT_MS,
@@ -35,11 +38,11 @@ export async function openBrowser(folder) {
 }
 
 /**
- * A tab with the page. `prelude` runs before the page's own code, `main` in place of its main.mjs.
+ * A tab with the page. `prelude` runs before the page's own code.
  * @returns {Promise<{ page: import('playwright-core').Page, complaints: string[] }>} `complaints` grows
  *   with every console error, exception and failed request
  */
-export async function openPage(browser, url, { prelude, main, ...options } = {}) {
+export async function openPage(browser, url, { prelude, ...options } = {}) {
   const page = await browser.newPage({ viewport: { width: 1220, height: 900 }, ...options });
   page.setDefaultTimeout(TIMEOUT_MS);
   const complaints = [];
@@ -52,10 +55,6 @@ export async function openPage(browser, url, { prelude, main, ...options } = {})
     if (!failed.url().startsWith('blob:')) complaints.push(`failed: ${failed.url()}`);
   });
   if (prelude) await page.addInitScript(prelude);
-  if (main) {
-    const answer = { contentType: 'text/javascript', body: main };
-    await page.route('**/main.mjs', (route) => route.fulfill(answer));
-  }
   await page.goto(url);
   return { page, complaints };
 }

@@ -1,11 +1,8 @@
 #include "report_page.h"
 
 #include <algorithm>
-#include <cmath>
 #include <cstdint>
 #include <nlohmann/json.hpp>
-#include <numeric>
-#include <span>
 #include <string_view>
 
 #include "audio_file.h"
@@ -42,16 +39,6 @@ std::string scriptSafe(nlohmann::ordered_json const& page) {
     return text;
 }
 
-double power(std::span<float const> samples) {
-    return std::transform_reduce(samples.begin(), samples.end(), 0.0, std::plus<>(), [](float x) {
-        return static_cast<double>(x) * static_cast<double>(x);
-    });
-}
-
-double db(double meanPower) {
-    return 10.0 * std::log10(meanPower + 1e-12);
-}
-
 double lengthSeconds(Report const& report) {
     return static_cast<double>(report.before.size()) / std::max(report.rateHz, 1);
 }
@@ -60,12 +47,6 @@ std::vector<std::pair<std::string, std::string>> summary(Report const& report) {
     std::vector<std::pair<std::string, std::string>> items{
         {"Length", formatted("%.2f s", lengthSeconds(report))},
         {"Rate", formatted("%d Hz", report.rateHz)}};
-    if (auto const pauses = pauseLevels(report); pauses.found) {
-        items.emplace_back("Pauses before", formatted("%.1f dBFS", pauses.beforeDb));
-        items.emplace_back("Pauses after", formatted("%.1f dBFS", pauses.afterDb));
-        items.emplace_back("Noise reduction",
-                           formatted("%.1f dB", pauses.beforeDb - pauses.afterDb));
-    }
     if (!report.scores.empty()) {
         items.emplace_back(
             "Speech", formatted("%.2f s in %zu segment%s", totalMs(report.segments) / 1000.0,
@@ -82,42 +63,6 @@ std::vector<std::pair<std::string, std::string>> summary(Report const& report) {
 }
 
 }  // namespace
-
-PauseLevels pauseLevels(Report const& report) {
-    struct Frame {
-        double before;
-        double after;
-        bool speech;
-    };
-    auto const size = static_cast<std::size_t>(std::max(report.rateHz * report.frameMs / 1000, 1));
-    std::vector<Frame> frames;
-    for (std::size_t at = 0; at + size <= report.before.size(); at += size) {
-        double const middleMs =
-            (static_cast<double>(at) + static_cast<double>(size) / 2) * 1000.0 / report.rateHz;
-        bool const speech = std::ranges::any_of(report.segments, [&](Segment const& segment) {
-            return segment.startMs <= middleMs && middleMs < segment.endMs;
-        });
-        frames.push_back({power(std::span(report.before).subspan(at, size)),
-                          power(std::span(report.after).subspan(at, size)), speech});
-    }
-    bool const told = !report.scores.empty() && !std::ranges::all_of(frames, &Frame::speech);
-    if (told) {
-        std::erase_if(frames, [](Frame const& frame) { return frame.speech; });
-    } else {
-        std::ranges::sort(frames, {}, &Frame::before);
-        frames.resize((frames.size() + 9) / 10);
-    }
-    if (frames.empty()) return {};
-    double const samples = static_cast<double>(frames.size() * size);
-    PauseLevels levels{0.0, 0.0, true};
-    for (auto const& frame : frames) {
-        levels.beforeDb += frame.before;
-        levels.afterDb += frame.after;
-    }
-    levels.beforeDb = db(levels.beforeDb / samples);
-    levels.afterDb = db(levels.afterDb / samples);
-    return levels;
-}
 
 std::string renderPage(Report const& report) {
     nlohmann::ordered_json data{{"file", report.file},

@@ -22,15 +22,6 @@ struct Report {
     std::vector<std::string> notes;
 };
 
-// Mean power in decibels re full scale of the pauses, before and after. Pauses are the frames
-// outside the speech segments or, where these tell of none, the quietest tenth of the frames.
-struct PauseLevels {
-    double beforeDb = 0.0;
-    double afterDb = 0.0;
-    bool found = false;
-};
-PauseLevels pauseLevels(Report const& report);
-
 std::string renderPage(Report const& report);
 
 }  // namespace morva::cli

@@ -4,7 +4,7 @@ from __future__ import annotations
 
 import numpy as np
 import tree  # noqa: F401
-from morva_training.measures import level_db, pauses_of
+from morva_training.measures import noise_in_pauses, pauses_of
 from scipy.signal import resample_poly
 
 PESQ_RATE = 16000
@@ -87,12 +87,6 @@ def stoi_score(reference: np.ndarray, result: np.ndarray, rate: int) -> float:
 
 
 def pause_attenuation(speech: np.ndarray, noisy: np.ndarray, result: np.ndarray, rate: int) -> float:
-    """How far the noise in the pauses is pushed down; NaN with less than 0.3 s of pause.
-
-    The cleaned level is not taken below -100 dB of full scale, so that digital silence does not count as infinite.
-    """
-    count = min(len(speech), len(noisy), len(result))
-    quiet = pauses_of(speech[:count], rate)
-    if quiet.sum() < 0.3 * rate or level_db(noisy[:count][quiet]) < -75:
-        return float("nan")
-    return level_db(noisy[:count][quiet]) - max(level_db(result[:count][quiet]), -100.0)
+    """How far the noise in the pauses of clean speech goes down; NaN where that cannot be said."""
+    before, after = noise_in_pauses(noisy, result, pauses_of(speech, rate), rate)
+    return before - after

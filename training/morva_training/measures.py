@@ -10,7 +10,9 @@ from scipy.ndimage import binary_closing, binary_opening
 from scipy.signal import butter, sosfiltfilt
 
 PAUSE_DB = -45.0  # below the loud speech nobody speaks
+PAUSE_SCORE = 0.5  # where only a voice score is known, nobody speaks below it
 PAUSE_SETTLE, PAUSE_EDGE = 0.35, 0.03  # seconds after and before speech that are no pause either
+FEWEST_PAUSES, LEAST_NOISE_DB, LEAST_LEFT_DB = 30, -75.0, -100.0  # blocks; levels, re full scale
 VOICE_DB, DOUBT_DB = -30.0, -42.0
 LOWEST_VOICE_HZ = 80.0
 
@@ -43,22 +45,39 @@ def active_level(samples: np.ndarray, rate: int) -> float:
     return float(np.sqrt(power[power > power.max() * 1e-3].mean()))
 
 
-def pauses_of(speech: np.ndarray, rate: int) -> np.ndarray:
-    """The samples (bool) of clean speech that are a pause.
+def calm_blocks(spoken: np.ndarray) -> np.ndarray:
+    """The blocks of 10 ms (bool) that are a pause: PAUSE_SETTLE after one that is spoken to PAUSE_EDGE before the next."""
+    calm = np.ones(len(spoken), bool)
+    for index in np.flatnonzero(spoken):
+        calm[max(0, index - round(PAUSE_EDGE * 100)) : index + round(PAUSE_SETTLE * 100)] = False
+    return calm
 
-    A block of 10 ms is speech when its power is above PAUSE_DB of the loud ones (the 95th percentile);
-    a pause begins PAUSE_SETTLE after speech and ends PAUSE_EDGE before it.
+
+def pauses_of(speech: np.ndarray, rate: int) -> np.ndarray:
+    """The pauses (blocks, bool) of clean speech: what lies below PAUSE_DB of its loud blocks (95th percentile)."""
+    power = block_powers(speech, rate // 100)
+    loud = np.percentile(power, 95) if len(power) else 0.0
+    return calm_blocks(power > loud * 10 ** (PAUSE_DB / 10))
+
+
+def pauses_of_scores(scores: np.ndarray) -> np.ndarray:
+    """The pauses (blocks, bool) of a recording whose voice scores per block are known, and not its clean speech."""
+    return calm_blocks(scores >= PAUSE_SCORE)
+
+
+def noise_in_pauses(noisy: np.ndarray, result: np.ndarray, pauses: np.ndarray, rate: int) -> tuple[float, float]:
+    """Level of the noise before and after, in dB of full scale: the median over the blocks that are a pause.
+
+    NaN with too few pauses and where nothing is to be heard in them before. What is left is not taken below
+    LEAST_LEFT_DB, so that digital silence does not count as infinite.
     """
-    block = rate // 100
-    power = block_powers(speech, block)
-    quiet = np.zeros(len(speech), bool)
-    if len(power):
-        settle, edge = round(PAUSE_SETTLE * 100), round(PAUSE_EDGE * 100)
-        calm = np.ones(len(power), bool)
-        for index in np.flatnonzero(power > np.percentile(power, 95) * 10 ** (PAUSE_DB / 10)):
-            calm[max(0, index - edge) : index + settle] = False
-        quiet[: len(power) * block] = np.repeat(calm, block)
-    return quiet
+    powers = [block_powers(samples, rate // 100) for samples in (noisy, result)]
+    count = min(len(pauses), *map(len, powers))
+    calm = np.flatnonzero(pauses[:count])
+    if len(calm) < FEWEST_PAUSES:
+        return float("nan"), float("nan")
+    before, after = (float(10 * np.log10(np.median(power[calm]) + 1e-12)) for power in powers)
+    return (before, max(after, LEAST_LEFT_DB)) if before >= LEAST_NOISE_DB else (float("nan"), float("nan"))
 
 
 def relative_power(samples: np.ndarray, block: int) -> np.ndarray:

@@ -71,8 +71,7 @@ def test_composite_ratings_fall_with_noise_and_with_a_bent_envelope() -> None:
 def test_pauses() -> None:
     rate = 16000
     speech = np.concatenate([np.zeros(rate, np.float32), noise(1, 3), np.zeros(rate, np.float32)])
-    changes = np.flatnonzero(np.diff(pauses_of(speech, rate).astype(int)))
-    assert changes.tolist() == [int(0.97 * rate) - 1, int(2.34 * rate) - 1]
+    assert np.flatnonzero(np.diff(pauses_of(speech, rate).astype(int))).tolist() == [96, 233]
     noisy = speech + 0.1 * noise(3, 2)
     result = np.where(np.arange(3 * rate) // rate == 1, noisy, 0.1 * noisy)
     assert metrics.pause_attenuation(speech, noisy, result, rate) == pytest.approx(20, abs=0.5)

@@ -3,6 +3,8 @@
 /** Largest file that is opened, bytes. */
 export const MAX_FILE_BYTES = 100 * 1024 * 1024;
 
+const DECODED_RATE = 48000;
+
 const minutes = (seconds) => `${Math.ceil(seconds / 60)} minutes`;
 const megabytes = (bytes) => `${Math.round(bytes / 1024 / 1024)} MB`;
 
@@ -29,6 +31,20 @@ function announcedSeconds(blob) {
   });
 }
 
+/** Sampling rate according to the head of a WAV or FLAC file; 0 when it does not say. */
+function announcedRate(head) {
+  const view = new DataView(head);
+  const isAt = (at, letters) => [...letters].every((c, i) => view.getUint8(at + i) === c.charCodeAt(0));
+  if (view.byteLength < 44) return 0;
+  if (isAt(0, 'fLaC')) return view.getUint32(18) >>> 12;
+  if (!isAt(8, 'WAVE')) return 0;
+  // Chunks of odd length are followed by one more byte.
+  for (let at = 12; at + 16 <= view.byteLength; at += 8 + ((view.getUint32(at + 4, true) + 1) & ~1)) {
+    if (isAt(at, 'fmt ')) return view.getUint32(at + 12, true);
+  }
+  return 0;
+}
+
 function toMono16(buffer) {
   const channels = Array.from({ length: buffer.numberOfChannels }, (_, i) =>
     buffer.getChannelData(i),
@@ -38,27 +54,35 @@ function toMono16(buffer) {
     let sum = 0;
     for (const channel of channels) sum += channel[i];
     const value = sum / channels.length;
-    samples[i] = Math.round(Math.max(-1, Math.min(1, value)) * 32767);
+    samples[i] = Math.max(-32768, Math.min(32767, Math.round(value * 32768)));
   }
   return samples;
 }
 
-/** Samples at the context's rate. Rejects with a sentence for people. */
-export async function readSoundFile(file, name, context, maxSeconds) {
+/**
+ * 16-bit mono at the file's own rate, if that is among `rates` and a WAV or FLAC file announces it, else at
+ * DECODED_RATE. Rejects with a sentence for people.
+ * @returns {Promise<{ samples: Int16Array, rate: number, announced: number }>} `announced`: the file's own
+ *   rate, 0 when that is not known
+ */
+export async function readSoundFile(file, name, { maxSeconds, sampleRates }) {
   if (file.size > MAX_FILE_BYTES) {
     throw new Error(
       `"${name}" has ${megabytes(file.size)}; this page takes up to ${megabytes(MAX_FILE_BYTES)}.`,
     );
   }
   checkLength(await announcedSeconds(file), maxSeconds, name);
+  const bytes = await file.arrayBuffer();
+  const announced = announcedRate(bytes);
+  const rate = sampleRates.includes(announced) ? announced : DECODED_RATE;
   let decoded;
   try {
-    decoded = await context.decodeAudioData(await file.arrayBuffer());
+    decoded = await new OfflineAudioContext(1, 1, rate).decodeAudioData(bytes);
   } catch {
     throw new Error(`"${name}" is no sound file that this browser can decode.`);
   }
   checkLength(decoded.duration, maxSeconds, name);
-  return { samples: toMono16(decoded), channels: decoded.numberOfChannels };
+  return { samples: toMono16(decoded), rate, announced };
 }
 
 /** A mono 16-bit WAV file. */

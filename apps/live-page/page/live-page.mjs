@@ -22,6 +22,7 @@ let engine = null; // what the link's other side said in its hello
 let sound = null; // { context, recorder, player }, made when first needed
 let take = null;
 let state = 'idle';
+let lastSaid = ''; // once nothing was under way
 let isSeeking = false;
 
 const view = new View({
@@ -35,9 +36,15 @@ const say = (text) => {
   element('status').textContent = text;
 };
 
+function sayAtRest(text) {
+  lastSaid = text;
+  say(text);
+}
+
 function complain(error) {
   element('problem-text').textContent = error.message;
   element('problem').hidden = false;
+  element('retry').hidden = engine !== null;
 }
 
 function settle() {
@@ -47,6 +54,7 @@ function settle() {
 function enter(next) {
   state = next;
   document.body.classList.toggle('recording', state === 'recording');
+  document.body.classList.toggle('empty', take === null);
   element('record-label').textContent = state === 'recording' ? 'Stop' : 'Record';
   element('progress').hidden = state !== 'cleaning';
   const isUp = engine !== null;
@@ -78,7 +86,11 @@ function showPosition() {
   if (element('time').textContent !== text) element('time').textContent = text;
 }
 
-const restingState = () => (take?.isComplete ? 'ready' : 'idle');
+/** Where the page stands when nothing is being opened; the rest of a take may still be on its way. */
+function restingState() {
+  if (take === null || take.isComplete) return take === null ? 'idle' : 'ready';
+  return link.isOpen ? 'cleaning' : 'idle';
+}
 
 // ---- sound --------------------------------------------------------------------------------------
 
@@ -97,11 +109,10 @@ function needSound() {
   return sound;
 }
 
-function beginTake(name) {
+function beginTake(name, rate) {
   settle();
-  const { context, player } = needSound();
-  player.clear();
-  take = new Take(context.sampleRate, name);
+  needSound().player.clear();
+  take = new Take(rate, name);
   element('pauses').textContent = '–';
 }
 
@@ -121,7 +132,7 @@ async function record() {
     onEnded: stopRecording,
   });
   if (engine === null) return recorder.stop(); // lost while the person was asked
-  beginTake('recording');
+  beginTake('recording', sound.context.sampleRate);
   startStream();
   enter('recording');
   say('Recording. Speak, be silent, make noise.');
@@ -163,13 +174,19 @@ async function openFile(file, name) {
   settle();
   enter('opening');
   say(`Reading ${name} …`);
-  const { context } = needSound();
-  const { samples } = await readSoundFile(file, name, context, engine.maxSeconds);
+  const { samples, rate, announced } = await readSoundFile(file, name, engine);
   if (samples.length === 0) throw new Error(`"${name}" holds no sound.`);
-  beginTake(name);
+  beginTake(name, rate);
+  take.conversion = conversionOf(rate, announced);
   const begun = take;
   await addOriginal(begun, samples);
   if (take === begun) await cleanTake();
+}
+
+function conversionOf(rate, announced) {
+  if (rate === announced) return '';
+  const origin = announced === 0 ? 'as the browser decodes it' : `converted from ${announced} Hz`;
+  return ` (${origin}, at ${rate} Hz)`;
 }
 
 async function openExample() {
@@ -184,11 +201,10 @@ function finishTake() {
   if (player.duration > 0) player.replaceCleaned(after, take.rate);
   else player.load({ before: take.before.samples.values, after, rate: take.rate });
   take.isComplete = true;
-  const reduction = take.pauseReduction();
-  const text = reduction === null ? 'no pauses' : `${reduction.toFixed(0).replace('-', '−')} dB`;
-  element('pauses').textContent = text;
+  element('pauses').textContent = take.noiseInPauses ?? 'no pauses';
   showModels();
-  say(`${take.name}: ${take.seconds.toFixed(1)} s cleaned. Play, and swap before and after.`);
+  const what = `${take.name}${take.conversion}: ${take.seconds.toFixed(1)} s`;
+  sayAtRest(`${what} cleaned. Play, and swap before and after.`);
   enter('ready');
 }
 
@@ -217,7 +233,7 @@ function listen() {
     );
     element('example').hidden = !engine.example;
     settle();
-    if (take === null) say('Ready. Record, drop a file anywhere, or choose one.');
+    if (take === null) sayAtRest('Ready. Record, drop a file anywhere, or choose one.');
     enter(state);
   });
 
@@ -255,7 +271,7 @@ const attempt = (action) => async () => {
   try {
     await action();
   } catch (error) {
-    say('');
+    say(engine === null ? 'Not connected.' : lastSaid);
     complain(error);
     if (state === 'opening') enter(restingState());
   }

@@ -1,5 +1,6 @@
 // One recording as the page holds it: what went in, what came back, and what was measured on the way.
 // Samples are 16-bit mono at `rate`; cleaned ones are in step with the original.
+import { noiseInPauses } from './pauses.mjs';
 import { FRAME_MS } from './protocol.mjs';
 import { Spectra } from './spectra.mjs';
 
@@ -44,13 +45,10 @@ class Sound {
   }
 }
 
-// Frames below this score count as pauses.
-const PAUSE_SCORE = 0.5;
-const FEWEST_PAUSE_FRAMES = 20;
-
-const energy = (samples) => samples.reduce((sum, sample) => sum + sample ** 2, 0);
-
 export class Take {
+  /** What was done to its rate, in words; empty for nothing. */
+  conversion = '';
+
   constructor(rate, name) {
     this.rate = rate;
     this.name = name;
@@ -81,21 +79,15 @@ export class Take {
     return this.before.samples.length / this.rate;
   }
 
-  /**
-   * How much quieter the pauses have become, in dB: the median of their frames, which a few frames of
-   * speech among them do not move. Null when there are hardly any.
-   */
-  pauseReduction() {
-    const frameSize = (this.rate * FRAME_MS) / 1000;
-    const [before, after] = [this.before.samples.values, this.after.samples.values];
-    const changes = [];
-    this.voice.values.forEach((score, k) => {
-      const frame = [k * frameSize, (k + 1) * frameSize];
-      const original = energy(before.subarray(...frame));
-      if (score >= PAUSE_SCORE || original === 0) return;
-      changes.push(10 * Math.log10((energy(after.subarray(...frame)) + 1) / original));
+  /** How far the noise in the pauses goes down, in words, or null. */
+  get noiseInPauses() {
+    return noiseInPauses({
+      before: this.before.samples.values,
+      after: this.after.samples.values,
+      rate: this.rate,
+      scores: this.voice.values,
+      frameMs: FRAME_MS,
+      cut: 0.5, // the engine's 16-bit interface drops fractions
     });
-    if (changes.length < FEWEST_PAUSE_FRAMES) return null;
-    return changes.sort((a, b) => a - b)[changes.length >> 1];
   }
 }
