@@ -1,6 +1,7 @@
-"""Pictures of ten recordings before and after a model, for docs/examples.
+"""Pictures of recordings before and after a model: ten for docs/examples, or the one in the README.
 
     python bench/quality/spectrograms.py --store STORE --out docs/examples models/c6.xs.f.ca03f4.mvw
+    python bench/quality/spectrograms.py --store STORE --out docs/images --only office models/c6.xs.f.ca03f4.mvw
 
 Speech and noise are held-out material; the whisper is synthesised by espeak-ng. Prints for every
 example the numbers that stand in its title.
@@ -9,25 +10,20 @@ example the numbers that stand in its title.
 from __future__ import annotations
 
 import argparse
-import io
 import subprocess
 import tempfile
 from dataclasses import dataclass
 from pathlib import Path
 
-import matplotlib
 import numpy as np
 import soundfile
 
-matplotlib.use("Agg")
-import matplotlib.pyplot as plt  # noqa: E402
-from PIL import Image  # noqa: E402
-
-import metrics  # noqa: E402
-import mixtures  # noqa: E402
-import systems  # noqa: E402
-from morva_training.corpus import BASE_RATE, Corpus  # noqa: E402
-from morva_training.measures import si_sdr  # noqa: E402
+import metrics
+import mixtures
+import pictures
+import systems
+from morva_training.corpus import BASE_RATE, Corpus
+from morva_training.measures import si_sdr
 
 SECONDS = 6
 
@@ -38,8 +34,11 @@ class Example:
     noise: str = ""  # category; "" for none, "babble" for talkers
     snr_db: float = 5.0
     voice: str = ""  # "", "whisper" or "shout"
+    talker: str = ""  # what the path of the speech holds, and of the noise; any where it is empty
+    recording: str = ""
 
 
+README = Example("office", "keyboard", 5, talker="vctk_p244", recording="livekit")
 EXAMPLES = (
     Example("typing", "keyboard", 5),
     Example("dog", "dog_bark", 0),
@@ -63,8 +62,8 @@ class Material:
     def fitted(self, samples: np.ndarray) -> np.ndarray:
         return np.tile(samples, -(-self.count // len(samples)))[: self.count]
 
-    def talk(self) -> np.ndarray:
-        clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 3 * BASE_RATE]
+    def talk(self, talker: str) -> np.ndarray:
+        clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 3 * BASE_RATE and talker in c.path]
         clip = clips[self.rng.integers(len(clips))]
         out = np.zeros(self.count, np.float32)
         start = BASE_RATE
@@ -72,7 +71,7 @@ class Material:
         out[start : start + len(samples)] = samples
         return out
 
-    def shout(self) -> np.ndarray:
+    def shout(self, _talker: str) -> np.ndarray:
         """The held-out recording of acted emotions with the brightest voice."""
         clips = [c for c in self.corpus.clips("speech", "heldout") if "emodb" in c.path]
 
@@ -83,7 +82,7 @@ class Material:
         loud = max(clips, key=lambda c: brightness(self.corpus.read(c)))
         return self.fitted(np.concatenate([np.zeros(BASE_RATE, np.float32), self.corpus.read(loud)]))
 
-    def whisper(self) -> np.ndarray:
+    def whisper(self, _talker: str) -> np.ndarray:
         with tempfile.NamedTemporaryFile(suffix=".wav") as file:
             text = "Nobody in the room should hear what I am telling you now."
             subprocess.run(["espeak-ng", "-v", "en+whisper", "-s", "140", "-w", file.name, text], check=True)
@@ -91,40 +90,26 @@ class Material:
         samples = metrics.at_rate(samples, rate, BASE_RATE) * 32768.0
         return self.fitted(np.concatenate([np.zeros(BASE_RATE), samples, np.zeros(BASE_RATE)]).astype(np.float32))
 
-    def disturbance(self, category: str) -> np.ndarray:
+    def disturbance(self, category: str, recording: str) -> np.ndarray:
         if category == "babble":
             clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 2 * BASE_RATE]
             chosen = self.rng.choice(len(clips), 6, replace=False)
             voices = [self.fitted(self.corpus.read(clips[i])) for i in chosen]
             return np.sum([mixtures.scaled(v, 1.0) for v in voices], axis=0)
-        clips = self.corpus.groups("noise", "heldout")[category]
+        clips = [c for c in self.corpus.groups("noise", "heldout")[category] if recording in c.path]
         return self.fitted(self.corpus.read(max(clips, key=lambda c: c.length)))
 
 
 def mixture(material: Material, example: Example) -> tuple[np.ndarray, np.ndarray]:
     """Noisy and clean, -1..1."""
-    voice = {"": material.talk, "whisper": material.whisper, "shout": material.shout}[example.voice]()
+    voice = {"": material.talk, "whisper": material.whisper, "shout": material.shout}[example.voice](example.talker)
     level = 10 ** ((-14 if example.voice == "shout" else -24) / 20)
     voice = mixtures.scaled(voice, level)
     if not example.noise:
         return voice, voice
-    noise = mixtures.scaled(material.disturbance(example.noise), level * 10 ** (-example.snr_db / 20))
+    noise = material.disturbance(example.noise, example.recording)
+    noise = mixtures.scaled(noise, level * 10 ** (-example.snr_db / 20))
     return np.clip(voice + noise, -1, 1).astype(np.float32), voice
-
-
-def draw(path: Path, title: str, noisy: np.ndarray, result: np.ndarray) -> None:
-    figure, axes = plt.subplots(2, 1, figsize=(6.4, 4.2), sharex=True, constrained_layout=True)
-    for axis, samples, name in zip(axes, (noisy, result), ("before", "after")):
-        floor = np.random.default_rng(0).normal(0, 1e-7, len(samples))  # no logarithm of zero
-        axis.specgram(samples + floor, NFFT=1024, Fs=BASE_RATE, noverlap=512, cmap="magma", vmin=-130, vmax=-40)
-        axis.set_ylabel(f"{name}, Hz")
-        axis.set_ylim(0, 12000)
-    axes[0].set_title(title, fontsize=9)
-    axes[1].set_xlabel("s")
-    buffer = io.BytesIO()
-    figure.savefig(buffer, dpi=72)
-    plt.close(figure)
-    Image.open(buffer).convert("RGB").quantize(48).save(path, optimize=True)
 
 
 def main() -> None:
@@ -132,11 +117,15 @@ def main() -> None:
     parser.add_argument("weight", type=Path)
     parser.add_argument("--store", type=Path, required=True)
     parser.add_argument("--out", type=Path, required=True)
+    parser.add_argument("--only", choices=[example.name for example in (*EXAMPLES, README)])
     parser.add_argument("--seed", type=int, default=7)
     args = parser.parse_args()
     args.out.mkdir(parents=True, exist_ok=True)
     process = systems.from_weight(args.weight)
-    for number, example in enumerate(EXAMPLES):
+    wanted = [args.only] if args.only else [example.name for example in EXAMPLES]
+    for number, example in enumerate((*EXAMPLES, README)):
+        if example.name not in wanted:
+            continue
         noisy, clean = mixture(Material(args.store, args.seed + number), example)
         result = process(noisy, BASE_RATE)
         before, after = si_sdr(clean, noisy), si_sdr(clean, result)
@@ -148,7 +137,8 @@ def main() -> None:
             title += f", pauses down {pause:.0f} dB" if np.isfinite(pause) else ""
         else:
             title += f", SI-SDR {after:.1f} dB"
-        draw(args.out / f"{example.name}.png", title, noisy, result)
+        size, words = ((10, 6), "") if example is README else ((6.4, 4.2), title)
+        pictures.draw(args.out / f"{example.name}.png", {"Before": noisy, "After": result}, BASE_RATE, size, words)
         print(title)
 
 
