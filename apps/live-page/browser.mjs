@@ -7,9 +7,7 @@ import { fileURLToPath } from 'node:url';
 import { require } from './dependencies.mjs';
 
 /** The bundled noisy recording. */
-export const recording = fileURLToPath(
-  new URL('../../examples/audio/noisy.flac', import.meta.url),
-);
+export const recording = fileURLToPath(new URL('../../examples/audio/noisy.flac', import.meta.url));
 const TIMEOUT_MS = 180_000;
 
 /** Path of the browser, or null: $CHROMIUM, else one on the search path. */

@@ -34,13 +34,15 @@ function announcedSeconds(blob) {
 /** Sampling rate according to the head of a WAV or FLAC file; 0 when it does not say. */
 function announcedRate(head) {
   const view = new DataView(head);
-  const isAt = (at, letters) => [...letters].every((c, i) => view.getUint8(at + i) === c.charCodeAt(0));
+  const isAt = (at, letters) =>
+    [...letters].every((c, i) => view.getUint8(at + i) === c.charCodeAt(0));
   if (view.byteLength < 44) return 0;
   if (isAt(0, 'fLaC')) return view.getUint32(18) >>> 12;
   if (!isAt(8, 'WAVE')) return 0;
-  // Chunks of odd length are followed by one more byte.
-  for (let at = 12; at + 16 <= view.byteLength; at += 8 + ((view.getUint32(at + 4, true) + 1) & ~1)) {
+  for (let at = 12; at + 16 <= view.byteLength; ) {
     if (isAt(at, 'fmt ')) return view.getUint32(at + 12, true);
+    const size = view.getUint32(at + 4, true);
+    at += 8 + size + (size % 2);
   }
   return 0;
 }
