@@ -1,6 +1,8 @@
 """Which model the rates go through, and where the sound ends that comes out: noise through the engine at no attenuation.
 
     python bench/quality/bandwidth.py
+
+Prints the table of docs/quality.md.
 """
 
 from __future__ import annotations
