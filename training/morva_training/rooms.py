@@ -40,7 +40,7 @@ def simulated_room(rng: np.random.Generator, rate: int) -> np.ndarray:
     """A room response, the direct sound first and of height one; near and far talkers, dead and live rooms."""
     size = rng.uniform([2.0, 1.8, 2.2], [9.0, 7.0, 3.6])
     distance = 0.3 * 12.0 ** rng.random()
-    t60 = rng.uniform(0.15, 0.9)
+    t60 = 0.12 * 6.0 ** rng.random()
     volume, surface = float(np.prod(size)), 2 * float(size[0] * size[1] + size[1] * size[2] + size[0] * size[2])
     absorbed = min(0.9, 0.161 * volume / (surface * t60))
     early = _reflections(rng, rate, size, distance, np.sqrt(1.0 - absorbed))
@@ -52,7 +52,7 @@ def simulated_room(rng: np.random.Generator, rate: int) -> np.ndarray:
     start = int(rng.uniform(0.005, 0.03) * rate)
     tail[:start] *= np.square(np.linspace(0.0, 1.0, start, dtype=np.float32))
     critical = 0.057 * np.sqrt(volume / t60)  # distance at which the room is as loud as the direct sound
-    loudness = min(2.5, distance / critical * rng.uniform(0.5, 1.2))
+    loudness = min(1.8, distance / critical * rng.uniform(0.5, 1.2))
     tail *= loudness / (np.sqrt(np.sum(np.square(tail))) + 1e-9)
     room = np.zeros(max(count, len(early)), np.float32)
     added(room, early.astype(np.float32), 0)
