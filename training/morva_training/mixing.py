@@ -39,6 +39,8 @@ IMPULSIVE = (
     "dog_bark", "eating_drinking", "human_nonspeech", "notification",
 )  # fmt: skip
 
+ROOM_TONE = "room_tone"  # the category of what rooms and microphones add where nobody speaks
+
 
 @dataclass(frozen=True)
 class Recipe:
@@ -273,9 +275,15 @@ class MixtureMaker:
             position += len(piece)
         return out
 
-    def recorded(self) -> np.ndarray:
+    def background(self) -> np.ndarray:
+        """What is faintly there where nothing disturbs."""
+        if ROOM_TONE in self.categories and self.rng.random() < 0.5:
+            return self.recorded(ROOM_TONE)
+        return machines.coloured(self.rng, self.count, self.rate)
+
+    def recorded(self, category: str | None = None) -> np.ndarray:
         """Recordings of one category: where one ends the next fades in; short sounds come with rests between."""
-        clips = self.categories[self.rng.choice(self.category_names, p=self.category_odds)]
+        clips = self.categories[category or self.rng.choice(self.category_names, p=self.category_odds)]
         out = np.zeros(self.count, np.float32)
         speed = (
             self.rng.uniform(*self.recipe.noise_speed) if self.rng.random() < self.recipe.noise_speed_share else None
@@ -403,7 +411,7 @@ class MixtureMaker:
         has_speech = kind >= r.noise_only_share
         speech = self.spoken(band, clips) if has_speech else np.zeros((1, self.count), np.float32)
         clean = has_speech and kind < r.noise_only_share + r.clean_share
-        noise = machines.coloured(self.rng, self.count, self.rate) if clean else self.noises()
+        noise = self.background() if clean else self.noises()
         *speech, noise = self.over_time(self.equalised(speech, noise))
         level = FULL_SCALE * 10 ** (self.rng.uniform(*r.level_db) / 20)
         if has_speech and self.rng.random() < r.overload_share:

@@ -23,6 +23,7 @@ from tqdm import tqdm
 
 from .corpus import KINDS, Row, read_manifest, without_excluded
 from .measures import block_powers
+from .mixing import ROOM_TONE
 
 MARGIN = 0.15  # seconds of silence that stay at both ends
 TONE_SHORTEST, TONE_FADE, TONE_LONGEST = 0.4, 0.1, 20.0  # seconds of a pause, of its cross-fade, of a speaker's clip
@@ -119,7 +120,7 @@ class Folder:
             if pieces:
                 tone = joined(sorted(pieces, key=len, reverse=True), rate)
                 said = self.speakers[speaker]
-                row = {"kind": "noise", "category": "room_tone", "recording": f"room of {speaker}", "split": "train"}
+                row = {"kind": "noise", "category": ROOM_TONE, "recording": f"room of {speaker}", "split": "train"}
                 self.write(row | {name: said.get(name) or "" for name in ("source", "licence")}, tone, rate)
 
     def write_tables(self) -> None:
