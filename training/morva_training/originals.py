@@ -21,7 +21,7 @@ import numpy as np
 import soundfile
 from tqdm import tqdm
 
-from .corpus import KINDS, Row, read_manifest, without_excluded
+from .corpus import KINDS, Row, read_manifest, recording_of, without_excluded
 from .measures import block_powers
 from .mixing import ROOM_TONE
 
@@ -134,10 +134,11 @@ class Folder:
 
 
 def kept(old: Path, kind: str, replaced: set[str]) -> list[Row]:
-    """Rows of the old folder that nothing takes the place of, with paths from the root."""
+    """Rows of the old folder that nothing takes the place of: paths from the root, recordings as they were."""
     rows = read_manifest(old / f"{kind}.tsv") if (old / f"{kind}.tsv").exists() else []
     stays = [row for row in rows if row["path"] not in replaced and row.get("source") not in replaced]
-    return [{**row, "path": str((old / row["path"]).resolve())} for row in stays]
+    known = [{"recording": recording_of(row)} if kind == "noise" else {} for row in stays]
+    return [{**row, **more, "path": str((old / row["path"]).resolve())} for row, more in zip(stays, known)]
 
 
 def main() -> None:
