@@ -23,8 +23,12 @@ SPEECH_CREDITS = """
 - VCTK corpus (CC BY 4.0): C. Veaux, J. Yamagishi, K. MacDonald, University of Edinburgh; without p232 and p257.
 - speechocean762: J. Zhang and others, SpeechOcean and Xiaomi.
 - GCompris voices (CC BY-SA): the GCompris project and its speakers.
-- Kathleen, Kerstin, Nathalie, OHF voice samples, EmoDB (CC0), LJSpeech (K. Ito, public domain) and the modified rhyme
-  test recordings of NIST (public domain) ask for no mention and have earned it.
+- Arabic speech commands (CC BY 4.0): A. Ghandoura, F. Hjabo, O. Al Dakkak.
+- Speech-to-intent and wake-word recordings (Apache-2.0): Picovoice Inc. and its speakers; Lyra's test data: Google.
+- Artikulate courses (CC BY-SA 3.0): D. Kardarakos (Greek), O. Gupta (Bengali).
+- Toki Pona words (CC BY-SA): kala Asi; OpenDungeons voices (CC BY-SA 3.0): eugeneloza.
+- Kathleen, Kerstin, Nathalie, Thorsten, OHF voice samples, EmoDB (CC0) and the modified rhyme test recordings of NIST
+  (public domain) ask for no mention and have earned it.
 """
 
 
