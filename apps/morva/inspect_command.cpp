@@ -49,7 +49,7 @@ Trial tryOut(Engine& engine, std::filesystem::path const& file, WeightFacts cons
             return {true, "", std::nullopt};
         }
         CleaningSession const session(engine, setup);
-        return {true, "", session.latencySamples() * 1000.0 / setup.rateHz};
+        return {true, "", session.latency() * 1000.0 / setup.rateHz};
     } catch (Error const& error) {
         return {false, error.what(), std::nullopt};
     }

@@ -2,6 +2,7 @@
 #pragma once
 
 #include <filesystem>
+#include <limits>
 #include <string>
 
 #include "engine.h"
@@ -14,6 +15,7 @@ struct EngineOptions {
     ModelChoice model;
     std::filesystem::path models;  // folder of the shipped ones; empty: beside the program
     int frameMs = 10;
+    float limitDb = std::numeric_limits<float>::infinity();
     bool verbose = false;
 };
 
@@ -29,6 +31,7 @@ struct Workbench {
     Models models;
     ModelFiles model;  // of --model and --control
     int frameMs;
+    float limitDb;
 };
 
 }  // namespace morva::cli
