@@ -5,6 +5,7 @@
 
 #include "command.h"
 #include "error.h"
+#include "output_file.h"
 #include "text_output.h"
 #include "weight_facts.h"
 
@@ -142,6 +143,7 @@ std::string asText(InspectOptions const& options, WeightFacts const& facts, Tria
 }
 
 int run(InspectOptions const& options) {
+    InputFiles{options.file}.mustNotHold(options.output);
     Streams streams(options.verbose);
     Engine engine(streams);
     if (!std::filesystem::is_regular_file(options.file)) {
@@ -154,7 +156,7 @@ int run(InspectOptions const& options) {
                            {},
                            [&] { return asJson(options, facts, trial); }});
     if (!trial.runs) streams.err("morva: " + trial.reason + '\n');
-    return trial.runs ? 0 : 1;
+    return trial.runs ? done : failed;
 }
 
 }  // namespace

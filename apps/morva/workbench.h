@@ -7,6 +7,7 @@
 
 #include "engine.h"
 #include "models.h"
+#include "output_file.h"
 #include "streams.h"
 
 namespace morva::cli {
@@ -17,6 +18,11 @@ struct EngineOptions {
     int frameMs = 10;
     float limitDb = std::numeric_limits<float>::infinity();
     bool verbose = false;
+
+    // `sound` and the files that are named here.
+    InputFiles inputs(std::filesystem::path const& sound) const {
+        return {sound, model.model, model.control};
+    }
 };
 
 struct Workbench {

@@ -111,7 +111,9 @@ def test_other_rates_are_refused_on_standard_error(plugins, capfd, rate):
 
 @pytest.mark.skipif(not shutil.which("sox"), reason="sox is not installed")
 def test_in_a_real_host(morva, tmp_path):
-    library, noisy = BUILD / "libmorva_ladspa.so", SOURCE / "examples/audio/noisy.flac"
+    library, noisy = BUILD / "libmorva_ladspa.so", tmp_path / "noisy.wav"
+    sound, _ = soundfile.read(SOURCE / "examples/audio/noisy.flac", dtype="i2")
+    soundfile.write(noisy, sound, 32000)  # where the latency, of which hosts take out whole samples, is whole
     morva("denoise", noisy, tmp_path / "wanted.wav")
     wanted = soundfile.read(tmp_path / "wanted.wav", dtype="i2")[0].astype(int)
     command = f"sox -D {noisy} {tmp_path}/out.wav remix 1 1 ladspa -l {library} morva_stereo 100 0"
