@@ -91,6 +91,15 @@ bool writeSamples(SNDFILE* file, int format, std::span<float const> samples) {
     return sf_write_int(file, integers.data(), count) == count;
 }
 
+// Why the last call failed, as part of a sentence.
+std::string reasonOf(SNDFILE* file) {
+    std::string text = sf_strerror(file);
+    constexpr std::string_view opening = "Error : ";
+    if (text.starts_with(opening)) text.erase(0, opening.size());
+    if (text.ends_with('.')) text.pop_back();
+    return text;
+}
+
 void copyTags(SNDFILE* from, SNDFILE* to) {
     for (int const tag :
          {SF_STR_TITLE, SF_STR_COPYRIGHT, SF_STR_ARTIST, SF_STR_COMMENT, SF_STR_DATE, SF_STR_ALBUM,
@@ -117,7 +126,7 @@ SoundReader::SoundReader(fs::path const& path) : path_(path), file_(nullptr, &sf
         file_.reset(sf_open(path.c_str(), SFM_READ, &info_));
     }
     if (!file_) {
-        throw Error(spokenInput(path) + ": cannot be read: " + sf_strerror(nullptr) +
+        throw Error(spokenInput(path) + ": cannot be read: " + reasonOf(nullptr) +
                     (stream ? " (through a pipe: WAV, AIFF, AU or Ogg)" : ""));
     }
 }
@@ -144,7 +153,7 @@ std::size_t SoundReader::read(std::span<float> interleaved) {
 
 void SoundReader::noteDamage() {
     std::string reason;
-    if (sf_error(file_.get()) != SF_ERR_NO_ERROR) reason = sf_strerror(file_.get());
+    if (sf_error(file_.get()) != SF_ERR_NO_ERROR) reason = reasonOf(file_.get());
     if (reason.empty() && framesRead_ >= frames() && !isCut()) return;
     if (reason.empty()) reason = "it ends early";
     auto const name = spokenInput(path_);
@@ -265,7 +274,7 @@ void SoundWriter::correctHeader() {
 
 void SoundWriter::fail() {
     throw Error((path_ == standardStream ? "standard output" : path_.string()) +
-                ": cannot be written: " + sf_strerror(file_.get()));
+                ": cannot be written: " + reasonOf(file_.get()));
 }
 
 std::string wavFile(std::span<float const> samples, int rateHz) {
@@ -276,7 +285,7 @@ std::string wavFile(std::span<float const> samples, int rateHz) {
     Descriptor const memory = memoryFile();
     SoundHandle file(sf_open_fd(memory.get(), SFM_WRITE, &info, SF_FALSE), &sf_close);
     if (!file || !writeSamples(file.get(), info.format, samples) || sf_close(file.release()) != 0) {
-        throw Error(std::string("a sound cannot be held in memory: ") + sf_strerror(file.get()));
+        throw Error("a sound cannot be held in memory: " + reasonOf(file.get()));
     }
     return contentFrom(memory, 0);
 }

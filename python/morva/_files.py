@@ -64,10 +64,10 @@ def clean_file(
 ) -> None:
     """denoise_file() that tells `advance` of every block (its samples, those of the file); what that raises ends it."""
     target = Path(target)
-    if target.exists() and target.samefile(source):
-        raise ValueError(f"{target} is the input as well; choose another output")
     with ExitStack() as stack:
         reader = stack.enter_context(soundfile.SoundFile(source))
+        if target.exists() and target.samefile(source):
+            raise ValueError(f"{target} is the input as well; choose another output")
         streams = [stack.enter_context(Denoiser(reader.samplerate, **options)) for _ in range(reader.channels)]
         unfinished = stack.enter_context(_complete_or_absent(target))
         kind = target.suffix[1:].upper()

@@ -62,7 +62,7 @@ TEST(Latency, IsWhatIsReported) {
                 auto* const session = openNc(in, out, ms, model.c_str());
                 ASSERT_EQ(MorvaExt_NC_SetBypass(session, bypass), 0);
                 double latency = MorvaExt_SessionLatencySamples(session);
-                if (!bypass) ASSERT_EQ(MorvaExt_SessionExactLatency(session, &latency), 0);
+                if (!bypass) MorvaExt_SessionExactLatency(session, &latency);
                 (bypass ? bypassed : cleaned)
                     .add(offset(cleanAll(session, sent), out, latency), 0.0);
             }
