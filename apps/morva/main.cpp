@@ -33,7 +33,7 @@ void addLimit(CLI::App& command, EngineOptions& options) {
         .add_option("--limit", options.limitDb,
                     "Lower no part of the sound by more than this, in decibels (default: no limit)")
         ->type_name("DB")
-        ->check(CLI::NonNegativeNumber);
+        ->check(CLI::Range(0.0, 200.0));
 }
 
 namespace {

@@ -44,12 +44,14 @@ void Progress::say(std::string const& line) {
 }
 
 void Progress::draw(Clock::time_point now) {
+    constexpr double enoughToTell = 0.01;
     double const done = std::min(done_ / total_, 1.0);
     auto const filled = static_cast<std::size_t>(done * barWidth);
     std::chrono::duration<double> const taken = now - start_;
+    auto const left = taken.count() * (1.0 / done - 1.0);
     streams_.err("\r[" + std::string(filled, '#') + std::string(barWidth - filled, ' ') +
-                 formatted("] %3.0f%%  %s left \033[K", std::floor(100.0 * done),
-                           clockTime(taken.count() * (1.0 / done - 1.0) + 0.5).c_str()));
+                 formatted("] %3.0f%%", std::floor(100.0 * done)) +
+                 (done < enoughToTell ? "" : "  " + clockTime(left + 0.5) + " left") + "\033[K");
     onScreen_ = true;
 }
 

@@ -6,20 +6,10 @@ import numpy as np
 import pytest
 import soundfile
 
-from conftest import SOURCE, constant_mask, speechlike
+from conftest import SOURCE, constant_mask, lag_and_likeness, speechlike
 
 RATES = [4000, 8000, 11025, 12000, 16000, 22050, 24000, 32000, 37800, 44100, 48000, 64000, 88200, 96000]
 RATES += [192000, 384000]
-
-
-def lag_and_likeness(before, after, rate):
-    """Samples by which `after` is late, and how alike the two are once that is undone."""
-    hz = np.fft.rfftfreq(len(before), 1 / rate)
-    band = (hz > 250) & (hz < 0.95 * min(3000, 0.4 * rate))
-    x, y, turns = np.fft.rfft(before)[band], np.fft.rfft(after)[band], 2 * np.pi * hz[band] / rate
-    both = y * np.conj(x)
-    lag = -np.sum(turns * np.abs(both) * np.angle(both)) / np.sum(turns**2 * np.abs(both))
-    return lag, np.real(np.sum(both * np.exp(1j * turns * lag))) / (np.linalg.norm(x) * np.linalg.norm(y))
 
 
 @pytest.mark.parametrize("rate", RATES)
@@ -76,7 +66,7 @@ def test_a_folder_of_all_kinds(morva, model, recording, tmp_path):
         assert (out_rate, after.shape) == (rate, before.shape), name
         if name.endswith(".wav"):
             assert (tmp_path / "out1" / name).read_bytes() == (out / name).read_bytes()
-        if len(before) > 4000 and not name.endswith(".ogg"):  # Vorbis couples channels
+        if len(before) > 5000 and not name.endswith(".ogg"):  # Vorbis couples channels
             count = before.shape[1]
             likeness = np.corrcoef(before.T, after.T)[:count, count:]
             assert np.abs(likeness - np.eye(count)).max() < 0.1, name
