@@ -1,5 +1,6 @@
 #include "fractional_delay.h"
 
+#include <algorithm>
 #include <cmath>
 #include <numbers>
 #include <numeric>
@@ -12,7 +13,7 @@ constexpr double beta = 8.0;         // of the window: ripples below -80 dB
 constexpr double negligible = 1e-6;  // samples
 
 double sinc(double x) {
-    return x == 0.0 ? 1.0 : std::sin(std::numbers::pi * x) / (std::numbers::pi * x);
+    return std::abs(x) < negligible ? 1.0 : std::sin(std::numbers::pi * x) / (std::numbers::pi * x);
 }
 
 double kaiser(double x) {  // -1..1
@@ -21,14 +22,15 @@ double kaiser(double x) {  // -1..1
 
 // Delay by reach - fraction.
 std::vector<float> tapsFor(double fraction) {
-    std::vector<double> exact(2 * reach);
+    std::vector<double> exact(std::size_t{2} * reach);
     for (std::size_t i = 0; i < exact.size(); ++i) {
         double const at = static_cast<double>(i) - reach + fraction;
         exact[i] = sinc(at) * kaiser(at / reach);
     }
     double const sum = std::reduce(exact.begin(), exact.end());
-    std::vector<float> taps;
-    for (double const tap : exact) taps.push_back(static_cast<float>(tap / sum));
+    std::vector<float> taps(exact.size());
+    std::ranges::transform(exact, taps.begin(),
+                           [sum](double tap) { return static_cast<float>(tap / sum); });
     return taps;
 }
 
