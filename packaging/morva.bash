@@ -13,17 +13,17 @@ _morva() {
         --models) mapfile -t COMPREPLY < <(compgen -d -- "$current") && return ;;
         --model | --control | --vad-model | --level-model | -o | --output)
             mapfile -t COMPREPLY < <(compgen -f -- "$current") && return ;;
-        -j | --jobs | --threshold | --release-threshold | --min-silence | --padding | --max-seconds)
+        -j | --jobs | --limit | --threshold | --release-threshold | --min-silence | --padding | --max-seconds)
             return ;;
     esac
 
     local engine='--model --models --control --frame --verbose --help' options
     case $command in
         '') options='denoise inspect vad level report --help --version' ;;
-        denoise) options="$engine --output --jobs --quiet" ;;
+        denoise) options="$engine --output --jobs --limit --skip-existing --quiet" ;;
         vad) options="$engine --threshold --release-threshold --min-silence --padding --output --format" ;;
         level) options="$engine --output --format" ;;
-        report) options="$engine --vad-model --level-model --max-seconds" ;;
+        report) options="$engine --limit --vad-model --level-model --max-seconds" ;;
         inspect) options='--output --frame --json --verbose --help' ;;
     esac
     if [[ -z $command || $current == -* ]]; then

@@ -1,5 +1,6 @@
 #include "audio_file.h"
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -8,11 +9,15 @@
 #include <cmath>
 #include <initializer_list>
 #include <string>
+#include <string_view>
 #include <system_error>
 #include <vector>
 
+#include "cut_container.h"
 #include "descriptor.h"
 #include "error.h"
+#include "formatted.h"
+#include "wav_header.h"
 
 namespace morva::cli {
 namespace fs = std::filesystem;
@@ -26,6 +31,7 @@ std::string lowerEnding(fs::path const& path) {
 }
 
 int container(fs::path const& path) {
+    if (path == standardStream) return SF_FORMAT_WAV;
     auto const ending = lowerEnding(path);
     if (ending == ".wav") return SF_FORMAT_WAV;
     if (ending == ".flac") return SF_FORMAT_FLAC;
@@ -55,24 +61,15 @@ std::initializer_list<int> typesHolding(int type) {
 // WAV cannot hold more than 4 GiB; its 64-bit sister can.
 int wavFor(std::int64_t frames, int channels) {
     constexpr std::int64_t limit = (std::int64_t{1} << 32) - (std::int64_t{1} << 20);
-    return frames > limit / 8 / std::max(channels, 1) ? SF_FORMAT_RF64 : SF_FORMAT_WAV;
+    bool const fits = frames > 0 && frames <= limit / 8 / std::max(channels, 1);
+    return fits ? SF_FORMAT_WAV : SF_FORMAT_RF64;
 }
 
 // Bits of an integer sample type; 0 for every other.
 int integerBits(int format) {
-    switch (format & SF_FORMAT_SUBMASK) {
-        case SF_FORMAT_PCM_U8:
-        case SF_FORMAT_PCM_S8:
-            return 8;
-        case SF_FORMAT_PCM_16:
-            return 16;
-        case SF_FORMAT_PCM_24:
-            return 24;
-        case SF_FORMAT_PCM_32:
-            return 32;
-        default:
-            return 0;
-    }
+    int const type = format & SF_FORMAT_SUBMASK;
+    bool const integer = type >= SF_FORMAT_PCM_S8 && type <= SF_FORMAT_PCM_U8;
+    return integer ? 8 * sampleBytes(format) : 0;
 }
 
 // The sample, rounded to `bits`, in the top bits of an integer. The library would cut the rest off.
@@ -94,6 +91,15 @@ bool writeSamples(SNDFILE* file, int format, std::span<float const> samples) {
     return sf_write_int(file, integers.data(), count) == count;
 }
 
+// Why the last call failed, as part of a sentence.
+std::string reasonOf(SNDFILE* file) {
+    std::string text = sf_strerror(file);
+    constexpr std::string_view opening = "Error : ";
+    if (text.starts_with(opening)) text.erase(0, opening.size());
+    if (text.ends_with('.')) text.pop_back();
+    return text;
+}
+
 void copyTags(SNDFILE* from, SNDFILE* to) {
     for (int const tag :
          {SF_STR_TITLE, SF_STR_COPYRIGHT, SF_STR_ARTIST, SF_STR_COMMENT, SF_STR_DATE, SF_STR_ALBUM,
@@ -104,30 +110,77 @@ void copyTags(SNDFILE* from, SNDFILE* to) {
 
 }  // namespace
 
+std::string spokenInput(fs::path const& path) {
+    return path == standardStream ? "standard input" : path.string();
+}
+
 SoundReader::SoundReader(fs::path const& path) : path_(path), file_(nullptr, &sf_close) {
-    std::error_code error;
-    auto const status = fs::status(path, error);
-    if (!fs::exists(status)) throw Error(path.string() + ": no such file");
-    if (fs::is_directory(status)) throw Error(path.string() + ": is a folder");
-    file_.reset(sf_open(path.c_str(), SFM_READ, &info_));
-    if (!file_) throw Error(path.string() + ": cannot be read: " + sf_strerror(nullptr));
+    bool const stream = path == standardStream;
+    if (stream) {
+        file_.reset(sf_open_fd(STDIN_FILENO, SFM_READ, &info_, SF_FALSE));
+    } else {
+        std::error_code error;
+        auto const status = fs::status(path, error);
+        if (!fs::exists(status)) throw Error(path.string() + ": no such file");
+        if (fs::is_directory(status)) throw Error(path.string() + ": is a folder");
+        file_.reset(sf_open(path.c_str(), SFM_READ, &info_));
+    }
+    if (!file_) {
+        throw Error(spokenInput(path) + ": cannot be read: " + reasonOf(nullptr) +
+                    (stream ? " (through a pipe: WAV, AIFF, AU or Ogg)" : ""));
+    }
+}
+
+std::int64_t SoundReader::frames() const {
+    constexpr std::int64_t absurd = std::int64_t{1} << 48;
+    if (info_.frames >= absurd) return 0;
+    auto const bytes = info_.frames * info_.channels * sampleBytes(info_.format);
+    bool const told = info_.seekable != 0 || !isPlaceholder(static_cast<std::uint64_t>(bytes));
+    return told ? info_.frames : 0;
 }
 
 std::size_t SoundReader::read(std::span<float> interleaved) {
+    if (ended_) return 0;
     auto const wanted = static_cast<sf_count_t>(interleaved.size()) / info_.channels;
     auto const got = sf_readf_float(file_.get(), interleaved.data(), wanted);
     framesRead_ += got;
-    bool const damaged = sf_error(file_.get()) != SF_ERR_NO_ERROR;
-    bool const cut = got < wanted && info_.frames != SF_COUNT_MAX && framesRead_ < info_.frames;
-    if (damaged || cut) {
-        throw Error(path_.string() + ": damaged after " + std::to_string(framesRead_) + " samples" +
-                    (damaged ? std::string(": ") + sf_strerror(file_.get()) : std::string()));
+    if (got < wanted) {
+        ended_ = true;
+        noteDamage();
     }
     return static_cast<std::size_t>(got);
 }
 
+void SoundReader::noteDamage() {
+    std::string reason;
+    if (sf_error(file_.get()) != SF_ERR_NO_ERROR) reason = reasonOf(file_.get());
+    if (reason.empty() && framesRead_ >= frames() && !isCut()) return;
+    if (reason.empty()) reason = "it ends early";
+    auto const name = spokenInput(path_);
+    if (framesRead_ == 0) throw Error(name + ": nothing of it can be read: " + reason);
+    double const seconds = static_cast<double>(framesRead_) / rateHz();
+    damage_ = name + formatted(": only its first %.2f s can be read: ", seconds) + reason;
+}
+
+bool SoundReader::isCut() const {
+    if ((info_.format & SF_FORMAT_TYPEMASK) == SF_FORMAT_OGG) {
+        if (info_.seekable != 0) return info_.frames == SF_COUNT_MAX;  // no last page
+        char log[8192] = {};
+        sf_command(file_.get(), SFC_GET_LOG_INFO, log, sizeof log);
+        return std::string_view(log).find("End-Of-Stream") != std::string_view::npos;
+    }
+    if (path_ == standardStream) return endsInsideSound(STDIN_FILENO);
+    return endsInsideSound(Descriptor(::open(path_.c_str(), O_RDONLY | O_CLOEXEC)).get());
+}
+
 bool isWritableEnding(fs::path const& path) {
     return container(path) != 0;
+}
+
+bool isSoundEnding(fs::path const& path) {
+    static constexpr std::array<std::string_view, 9> others{
+        ".opus", ".mp3", ".aiff", ".aif", ".aifc", ".au", ".caf", ".w64", ".rf64"};
+    return isWritableEnding(path) || std::ranges::find(others, lowerEnding(path)) != others.end();
 }
 
 int outputFormat(fs::path const& path, int sourceFormat, int channels, int rateHz) {
@@ -152,43 +205,76 @@ int outputFormat(fs::path const& path, int sourceFormat, int channels, int rateH
                 " channels of " + std::to_string(rateHz) + " Hz");
 }
 
-SoundWriter::SoundWriter(fs::path const& path, SoundReader const& source, int format)
-    : path_(path),
-      part_(path.string() + ".part-" + std::to_string(::getpid())),
-      file_(nullptr, &sf_close) {
-    std::error_code error;
-    auto const status = fs::status(path, error);
-    if (fs::is_directory(status)) throw Error(path.string() + ": is a folder");
-    if (fs::exists(status) && !fs::is_regular_file(status)) {
-        throw Error(path.string() + ": cannot be written: not a regular file");
-    }
+SoundWriter::SoundWriter(fs::path const& path, SoundReader const& source, int format,
+                         Streams const& streams)
+    : path_(path), standardOutput_(streams.outDescriptor()), file_(nullptr, &sf_close) {
     info_.channels = source.channels();
     info_.samplerate = source.rateHz();
     info_.format = format;
-    if ((format & SF_FORMAT_TYPEMASK) == SF_FORMAT_WAV) {
-        info_.format = (format & ~SF_FORMAT_TYPEMASK) | wavFor(source.frames(), info_.channels);
-    }
-    file_.reset(sf_open(part_.path().c_str(), SFM_WRITE, &info_));
-    if (!file_) throw Error(path.string() + ": cannot be written: " + sf_strerror(nullptr));
+    path == standardStream ? openStream(source) : openFile(source);
     sf_command(file_.get(), SFC_SET_CLIPPING, nullptr, SF_TRUE);
+}
+
+void SoundWriter::openFile(SoundReader const& source) {
+    target_.emplace(path_);
+    if ((info_.format & SF_FORMAT_TYPEMASK) == SF_FORMAT_WAV) {
+        info_.format &= ~SF_FORMAT_TYPEMASK;
+        info_.format |= wavFor(source.frames(), info_.channels);
+    }
+    file_.reset(sf_open_fd(target_->unfinished().descriptor().get(), SFM_WRITE, &info_, SF_FALSE));
+    if (!file_) fail();
+    sf_command(file_.get(), SFC_RF64_AUTO_DOWNGRADE, nullptr, SF_TRUE);
     double quality = 0.7;
     sf_command(file_.get(), SFC_SET_VBR_ENCODING_QUALITY, &quality, sizeof quality);
     copyTags(source.file_.get(), file_.get());
 }
 
+// The library cannot write WAV to a pipe, but bare samples.
+void SoundWriter::openStream(SoundReader const& source) {
+    if (::isatty(standardOutput_) == 1)
+        throw Error("standard output is a terminal: send the sound to a file or a program");
+    announced_ = source.frames();
+    if (!writeAll(standardOutput_, wavHeader(info_, announced_))) fail();
+    info_.format = SF_FORMAT_RAW | SF_ENDIAN_LITTLE | (info_.format & SF_FORMAT_SUBMASK);
+    // Not by its descriptor: the library refuses one that stands behind a header.
+    SF_VIRTUAL_IO onlyWrites{
+        .get_filelen = [](void*) -> sf_count_t { return 0; },
+        .seek = [](sf_count_t, int, void*) -> sf_count_t { return 0; },
+        .read = [](void*, sf_count_t, void*) -> sf_count_t { return 0; },
+        .write = [](void const* bytes, sf_count_t count, void* output) -> sf_count_t {
+            std::string_view const text(static_cast<char const*>(bytes),
+                                        static_cast<std::size_t>(count));
+            return writeAll(*static_cast<int*>(output), text) ? count : 0;
+        },
+        .tell = [](void*) -> sf_count_t { return 0; }};
+    file_.reset(sf_open_virtual(&onlyWrites, SFM_WRITE, &info_, &standardOutput_));
+    if (!file_) fail();
+}
+
 void SoundWriter::write(std::span<float const> interleaved) {
-    if (!writeSamples(file_.get(), info_.format, interleaved)) {
-        throw Error(path_.string() + ": cannot be written: " + sf_strerror(file_.get()));
-    }
+    if (!writeSamples(file_.get(), info_.format, interleaved)) fail();
+    written_ += static_cast<std::int64_t>(interleaved.size()) / info_.channels;
 }
 
 void SoundWriter::finish() {
-    if (sf_close(file_.release()) != 0) throw Error(path_.string() + ": cannot be written");
-    try {
-        part_.become(path_);
-    } catch (fs::filesystem_error const& error) {
-        throw Error(path_.string() + ": cannot be written: " + error.code().message());
-    }
+    if (sf_close(file_.release()) != 0) fail();
+    target_ ? target_->finish() : correctHeader();
+}
+
+// Where standard output is a file, its header can say what came in the end.
+void SoundWriter::correctHeader() {
+    auto const length = written_ * info_.channels * sampleBytes(info_.format);
+    auto const end = ::lseek(standardOutput_, 0, SEEK_CUR);
+    bool const appends = (::fcntl(standardOutput_, F_GETFL) & O_APPEND) != 0;
+    if (written_ == announced_ || end < 0 || appends) return;
+    auto const header = wavHeader(info_, written_);
+    auto const start = end - length - static_cast<off_t>(header.size());
+    if (::pwrite(standardOutput_, header.data(), header.size(), start) < 0) fail();
+}
+
+void SoundWriter::fail() {
+    throw Error((path_ == standardStream ? "standard output" : path_.string()) +
+                ": cannot be written: " + reasonOf(file_.get()));
 }
 
 std::string wavFile(std::span<float const> samples, int rateHz) {
@@ -199,7 +285,7 @@ std::string wavFile(std::span<float const> samples, int rateHz) {
     Descriptor const memory = memoryFile();
     SoundHandle file(sf_open_fd(memory.get(), SFM_WRITE, &info, SF_FALSE), &sf_close);
     if (!file || !writeSamples(file.get(), info.format, samples) || sf_close(file.release()) != 0) {
-        throw Error(std::string("a sound cannot be held in memory: ") + sf_strerror(file.get()));
+        throw Error("a sound cannot be held in memory: " + reasonOf(file.get()));
     }
     return contentFrom(memory, 0);
 }

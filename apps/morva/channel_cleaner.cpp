@@ -6,9 +6,10 @@ namespace morva::cli {
 ChannelCleaner::ChannelCleaner(Engine& engine, int fileRateHz, SessionSetup const& setup)
     : session_(engine, setup),
       toEngine_(fileRateHz, setup.rateHz),
+      toWhole_(session_.latency()),
       fromEngine_(setup.rateHz, fileRateHz),
       frameSize_(setup.frameSize()),
-      toSkip_(session_.latencySamples()),
+      toSkip_(toWhole_.wholeDelay()),
       frame_(frameSize_) {}
 
 void ChannelCleaner::push(std::span<float const> in, std::vector<float>& out) {
@@ -43,7 +44,9 @@ void ChannelCleaner::takeFrames(std::vector<float>& out) {
     std::size_t at = 0;
     for (; pending_.size() - at >= frameSize_; at += frameSize_) {
         session_.clean(std::span(pending_).subspan(at, frameSize_), frame_);
-        release(frame_, out);
+        aligned_.clear();
+        toWhole_.push(frame_, aligned_);
+        release(aligned_, out);
     }
     pending_.erase(pending_.begin(), pending_.begin() + static_cast<std::ptrdiff_t>(at));
 }

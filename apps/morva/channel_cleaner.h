@@ -1,6 +1,7 @@
 // One channel of a sound file on its way through the engine, sample in, sample out.
 //
-//   file rate -> [rate converter] -> session frames -> latency cut -> [rate converter] -> file rate
+//   file rate -> [rate converter] -> session frames -> fraction of a sample -> latency cut
+//             -> [rate converter] -> file rate
 //
 // The output is as long as the input and lies in time where the input lay. Thread rule: one thread.
 #pragma once
@@ -10,6 +11,7 @@
 #include <vector>
 
 #include "engine.h"
+#include "fractional_delay.h"
 #include "rate_converter.h"
 
 namespace morva::cli {
@@ -30,15 +32,17 @@ private:
 
     CleaningSession session_;
     RateConverter toEngine_;
+    FractionalDelay toWhole_;  // the session's latency becomes a whole number of samples
     RateConverter fromEngine_;
     std::size_t frameSize_;
-    std::int64_t toSkip_;        // cleaned samples still to be dropped: the session's latency
+    std::int64_t toSkip_;        // cleaned samples still to be dropped: that number
     std::int64_t fed_ = 0;       // samples given to the session, padding not counted
     std::int64_t released_ = 0;  // cleaned samples passed on
     std::int64_t in_ = 0;        // samples pushed, at the file's rate
     std::int64_t out_ = 0;       // samples handed out, at the file's rate
     std::vector<float> pending_;
     std::vector<float> frame_;
+    std::vector<float> aligned_;
 };
 
 }  // namespace morva::cli

@@ -48,15 +48,15 @@ std::vector<ChannelCleaner> openChannels(Engine& engine, SoundReader const& read
 }  // namespace
 
 CleanedFile cleanFile(Workbench& bench, Job const& job,
-                      std::function<void(std::int64_t)> const& advance) {
+                      std::function<void(double)> const& advance) {
     SoundReader reader(job.input);
     auto const setup =
-        bench.setup(ShippedKind::NC, bench.model, job.input.string(), reader.rateHz());
+        bench.setup(ShippedKind::NC, bench.model, spokenInput(job.input), reader.rateHz());
     int const format =
         outputFormat(job.output, reader.format(), reader.channels(), reader.rateHz());
-    CleanedFile result{0, reader.channels(), reader.rateHz(), setup.model};
+    CleanedFile result{0, reader.channels(), reader.rateHz(), setup.model, {}};
     auto channels = openChannels(bench.engine, reader, setup);
-    SoundWriter writer(job.output, reader, format);
+    SoundWriter writer(job.output, reader, format, bench.streams);
 
     Interleaver ready(channels.size());
     std::vector<float> block(framesPerRead * channels.size());
@@ -69,11 +69,12 @@ CleanedFile cleanFile(Workbench& bench, Job const& job,
         }
         ready.drainTo(writer);
         result.frames += static_cast<std::int64_t>(frames);
-        advance(static_cast<std::int64_t>(frames));
+        advance(static_cast<double>(frames) / reader.rateHz());
     }
     for (std::size_t c = 0; c < channels.size(); ++c) channels[c].finish(ready.channel(c));
     ready.drainTo(writer);
     writer.finish();
+    result.damage = reader.damage();
     return result;
 }
 

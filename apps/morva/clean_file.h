@@ -15,11 +15,11 @@ struct CleanedFile {
     int channels = 0;
     int rateHz = 0;
     std::string model;
+    std::string damage;  // of the input, whose rest is missing; a line for the user
 };
 
-// `advance` is told of the input frames done since its last call. Throws Error; then no output
+// `advance` is told of the seconds of input done since its last call. Throws Error; then no output
 // exists.
-CleanedFile cleanFile(Workbench& bench, Job const& job,
-                      std::function<void(std::int64_t)> const& advance);
+CleanedFile cleanFile(Workbench& bench, Job const& job, std::function<void(double)> const& advance);
 
 }  // namespace morva::cli

@@ -26,6 +26,9 @@ void addFrameOptions(CLI::App& command, int& frameMs, bool& verbose);
 // These, --model, --models and --control.
 void addEngineOptions(CLI::App& command, EngineOptions& options);
 
+// --limit.
+void addLimit(CLI::App& command, EngineOptions& options);
+
 void addDenoise(CLI::App& app, Action& action);
 void addInspect(CLI::App& app, Action& action);
 void addVad(CLI::App& app, Action& action);

@@ -12,6 +12,7 @@
 #include "error.h"
 #include "formatted.h"
 #include "jobs.h"
+#include "output_file.h"
 #include "progress.h"
 
 namespace morva::cli {
@@ -23,19 +24,37 @@ struct DenoiseOptions {
     std::optional<std::filesystem::path> output;
     unsigned int jobs = 0;  // 0: one per core
     bool quiet = false;
+    bool skipExisting = false;
 };
 
-std::int64_t framesOf(Job const& job) {
+// 0 when it is not known; a failure is told when the file's turn comes.
+double secondsOf(Job const& job) {
     try {
-        return SoundReader(job.input).frames();
+        return job.input == standardStream ? 0.0 : SoundReader(job.input).seconds();
     } catch (Error const&) {
-        return 0;  // told when its turn comes
+        return 0.0;
     }
+}
+
+std::string files(std::size_t count) {
+    return std::to_string(count) + (count == 1 ? " file" : " files");
+}
+
+// What is not cleaned, for a line each.
+std::vector<std::string> skipped(Plan const& plan, std::size_t alreadyDone) {
+    std::vector<std::string> lines;
+    if (alreadyDone > 0) lines.push_back(files(alreadyDone) + " skipped: cleaned already");
+    if (plan.ignored.size() == 1)
+        lines.push_back("1 file skipped: " + plan.ignored.front().string() + " is no sound file");
+    if (plan.ignored.size() > 1)
+        lines.push_back(files(plan.ignored.size()) + " skipped: no sound files by their endings");
+    return lines;
 }
 
 std::string summary(Job const& job, CleanedFile const& file, double seconds) {
     double const length = static_cast<double>(file.frames) / file.rateHz;
-    return job.input.string() + " -> " + job.output.string() +
+    auto const output = job.output == standardStream ? "standard output" : job.output.string();
+    return spokenInput(job.input) + " -> " + output +
            formatted(" (%.1f s, %d Hz, %d channel%s, %s, %.0f x real time)", length, file.rateHz,
                      file.channels, file.channels == 1 ? "" : "s", file.model.c_str(),
                      length / std::max(seconds, 1e-3));
@@ -54,24 +73,30 @@ void onThreads(std::size_t threads, std::size_t count, Work const& work) {
 }
 
 int run(DenoiseOptions const& options) {
-    auto const jobs = planJobs(options.inputs, options.output);
-    bool const batch = jobs.size() > 1;
-    if (options.output && (batch || !options.output->has_filename())) makeFolders(jobs);
+    auto plan = planJobs(options.inputs, options.output);
+    bool const batch = plan.jobs.size() > 1;
+    auto const alreadyDone = options.skipExisting ? leaveOutDone(plan.jobs) : 0;
+    auto const& jobs = plan.jobs;
+    if (plan.intoFolder) makeFolders(jobs);
 
     Workbench bench(options.engine);
-    std::int64_t total = 0;
-    for (auto const& job : jobs) total += framesOf(job);
+    double total = 0.0;
+    for (auto const& job : jobs) total += secondsOf(job);
     Progress progress(bench.streams, total, !options.quiet);
 
     std::atomic<std::size_t> failures = 0;
+    std::atomic<std::size_t> damaged = 0;
     auto const cleanOne = [&](std::size_t index) {
         auto const& job = jobs[index];
         try {
             auto const start = std::chrono::steady_clock::now();
             auto const file =
-                cleanFile(bench, job, [&](std::int64_t frames) { progress.advance(frames); });
+                cleanFile(bench, job, [&](double seconds) { progress.advance(seconds); });
             std::chrono::duration<double> const taken = std::chrono::steady_clock::now() - start;
             if (!options.quiet) progress.say(summary(job, file, taken.count()));
+            if (file.damage.empty()) return;
+            ++damaged;
+            progress.say("morva: " + file.damage);
         } catch (std::exception const& error) {
             ++failures;
             progress.say(std::string("morva: ") + error.what());
@@ -79,11 +104,14 @@ int run(DenoiseOptions const& options) {
     };
     auto const cores = std::max(std::thread::hardware_concurrency(), 1U);
     onThreads(options.jobs == 0 ? cores : options.jobs, jobs.size(), cleanOne);
-    if (failures > 0 && batch) {
-        progress.say("morva: " + std::to_string(failures) + " of " + std::to_string(jobs.size()) +
-                     " files failed");
+    for (auto const& line : skipped(plan, alreadyDone)) {
+        if (!options.quiet) progress.say(line);
     }
-    return failures == 0 ? 0 : 1;
+    if (failures > 0 && batch) {
+        progress.say("morva: " + std::to_string(failures) + " of " + files(jobs.size()) +
+                     " failed");
+    }
+    return failures > 0 ? failed : damaged > 0 ? incomplete : done;
 }
 
 }  // namespace
@@ -92,12 +120,17 @@ void addDenoise(CLI::App& app, Action& action) {
     auto& command = *app.add_subcommand("denoise", "Remove background noise from sound files");
     auto& options = addOptions(command, action, &run);
     command
-        .add_option("files", options.inputs, "Input files or folders; without -o: input, output")
+        .add_option("files", options.inputs,
+                    "Input files or folders; without -o: input, output; - is standard input")
         ->required();
-    command.add_option("-o,--output", options.output, "Output file, or folder for several inputs");
+    command.add_option("-o,--output", options.output,
+                       "Output file, - for standard output, or folder for several inputs");
     command.add_option("-j,--jobs", options.jobs,
                        "Files cleaned at a time (default: one per core)");
+    command.add_flag("--skip-existing", options.skipExisting,
+                     "Leave out files whose output exists");
     command.add_flag("-q,--quiet", options.quiet, "Print nothing but errors");
+    addLimit(command, options.engine);
     addEngineOptions(command, options.engine);
 }
 

@@ -3,6 +3,7 @@
 #include <sys/mman.h>
 #include <unistd.h>
 
+#include <cerrno>
 #include <utility>
 
 namespace morva::cli {
@@ -18,6 +19,16 @@ Descriptor::~Descriptor() {
 
 int Descriptor::release() {
     return std::exchange(number_, -1);
+}
+
+bool writeAll(int descriptor, std::string_view text) noexcept {
+    while (!text.empty()) {
+        auto const written = ::write(descriptor, text.data(), text.size());
+        if (written < 0 && errno == EINTR) continue;
+        if (written <= 0) return false;
+        text.remove_prefix(static_cast<std::size_t>(written));
+    }
+    return true;
 }
 
 Descriptor memoryFile() {

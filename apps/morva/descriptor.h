@@ -2,6 +2,7 @@
 #pragma once
 
 #include <string>
+#include <string_view>
 
 namespace morva::cli {
 
@@ -18,6 +19,9 @@ public:
 private:
     int number_;
 };
+
+// False when not all can be written.
+bool writeAll(int descriptor, std::string_view text) noexcept;
 
 // Empty, open for reading and writing; -1 when the system has none to give.
 Descriptor memoryFile();

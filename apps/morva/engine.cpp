@@ -62,12 +62,13 @@ void Engine::addModel(std::filesystem::path const& file, std::string const& name
 }
 
 CleaningSession::CleaningSession(Engine& engine, SessionSetup const& setup)
-    : session_(open(engine, setup, &Morva_NC_CloseSession,
-                    [](auto rate, auto frame, auto model) {
-                        return Morva_NC_CreateSession(rate, rate, frame, model);
-                    })),
-      latencySamples_(MorvaExt_SessionLatencySamples(session_.get())) {
-    if (latencySamples_ < 0) throw Error("the engine does not say its latency");
+    : session_(open(engine, setup, &Morva_NC_CloseSession, [](auto rate, auto frame, auto model) {
+          return Morva_NC_CreateSession(rate, rate, frame, model);
+      })) {
+    if (MorvaExt_SessionExactLatency(session_.get(), &latency_) != 0)
+        throw Error("the engine does not say its latency");
+    if (MorvaExt_NC_SetAttenuationLimit(session_.get(), setup.limitDb) != 0)
+        throw Error("the engine refuses this attenuation limit");
 }
 
 void CleaningSession::clean(std::span<float const> in, std::span<float> out) {

@@ -8,6 +8,7 @@
 
 #include <cstddef>
 #include <filesystem>
+#include <limits>
 #include <memory>
 #include <span>
 #include <string>
@@ -20,7 +21,8 @@ namespace morva::cli {
 struct SessionSetup {
     int rateHz = 0;
     int frameMs = 10;
-    std::string model;  // name under which it was registered
+    std::string model;                                       // name under which it was registered
+    float limitDb = std::numeric_limits<float>::infinity();  // of cleaning: no part lowered by more
 
     std::size_t frameSize() const;  // samples
 };
@@ -55,11 +57,11 @@ public:
     // Both spans hold one frame.
     void clean(std::span<float const> in, std::span<float> out);
     // Samples by which the output lags the input.
-    int latencySamples() const { return latencySamples_; }
+    double latency() const { return latency_; }
 
 private:
     SessionHandle session_;
-    int latencySamples_;
+    double latency_ = 0.0;
 };
 
 class VoiceSession {

@@ -5,6 +5,7 @@
 #include <span>
 
 #include "audio_file.h"
+#include "error.h"
 #include "rate_converter.h"
 
 namespace morva::cli {
@@ -34,9 +35,14 @@ MonoSound readMono(std::filesystem::path const& file, double maxSeconds) {
     auto const channels = static_cast<std::size_t>(reader.channels());
     auto const limit = maxSeconds > 0.0 ? static_cast<std::size_t>(maxSeconds * reader.rateHz())
                                         : static_cast<std::size_t>(-1);
-    MonoSound sound{file.string(), reader.rateHz(), {}};
+    MonoSound sound{.name = spokenInput(file),
+                    .rateHz = reader.rateHz(),
+                    .samples = {},
+                    .channels = reader.channels(),
+                    .isWhole = true,
+                    .damage = {}};
     std::vector<float> block(framesPerRead * channels);
-    while (sound.samples.size() < limit) {
+    while (sound.samples.size() <= limit) {
         auto const frames = reader.read(block);
         if (frames == 0) break;
         for (std::size_t i = 0; i < frames; ++i) {
@@ -45,8 +51,16 @@ MonoSound readMono(std::filesystem::path const& file, double maxSeconds) {
                                     static_cast<float>(channels));
         }
     }
+    sound.isWhole = sound.samples.size() <= limit;
     sound.samples.resize(std::min(sound.samples.size(), limit));
+    sound.damage = reader.damage();
     return sound;
+}
+
+int ended(Streams& streams, MonoSound const& sound) {
+    if (sound.damage.empty()) return done;
+    streams.err("morva: " + sound.damage + '\n');
+    return incomplete;
 }
 
 std::vector<float> voiceScores(Workbench& bench, ModelFiles const& model, MonoSound const& sound) {

@@ -13,7 +13,13 @@ struct MonoSound {
     std::string name;            // what the user calls it
     int rateHz = 0;              // of the file
     std::vector<float> samples;  // channels averaged
+    int channels = 0;
+    bool isWhole = true;  // nothing was left out for its length
+    std::string damage;   // of the file, whose rest is missing; a line for the user
 };
+
+// What a command returns when it has done with the sound; prints what is missing of it.
+int ended(Streams& streams, MonoSound const& sound);
 
 // Reads at most `maxSeconds`; 0 reads all. Throws Error.
 MonoSound readMono(std::filesystem::path const& file, double maxSeconds = 0.0);

@@ -5,6 +5,7 @@
 
 #include "command.h"
 #include "error.h"
+#include "output_file.h"
 #include "text_output.h"
 #include "weight_facts.h"
 
@@ -49,7 +50,7 @@ Trial tryOut(Engine& engine, std::filesystem::path const& file, WeightFacts cons
             return {true, "", std::nullopt};
         }
         CleaningSession const session(engine, setup);
-        return {true, "", session.latencySamples() * 1000.0 / setup.rateHz};
+        return {true, "", session.latency() * 1000.0 / setup.rateHz};
     } catch (Error const& error) {
         return {false, error.what(), std::nullopt};
     }
@@ -142,6 +143,7 @@ std::string asText(InspectOptions const& options, WeightFacts const& facts, Tria
 }
 
 int run(InspectOptions const& options) {
+    InputFiles{options.file}.mustNotHold(options.output);
     Streams streams(options.verbose);
     Engine engine(streams);
     if (!std::filesystem::is_regular_file(options.file)) {
@@ -154,7 +156,7 @@ int run(InspectOptions const& options) {
                            {},
                            [&] { return asJson(options, facts, trial); }});
     if (!trial.runs) streams.err("morva: " + trial.reason + '\n');
-    return trial.runs ? 0 : 1;
+    return trial.runs ? done : failed;
 }
 
 }  // namespace

@@ -7,6 +7,7 @@
 
 #include "audio_file.h"
 #include "error.h"
+#include "output_file.h"
 
 namespace morva::cli {
 namespace fs = std::filesystem;
@@ -29,75 +30,83 @@ fs::path placed(fs::path const& folder, fs::path relative) {
     return folder / relative;
 }
 
-void addFolder(fs::path const& folder, fs::path const& output, std::vector<Job>& jobs) {
-    std::vector<fs::path> found;
-    for (auto const& entry : fs::recursive_directory_iterator(folder)) {
-        if (entry.is_regular_file() && isWritableEnding(entry.path()) &&
-            !isInside(entry.path(), output)) {
-            found.push_back(entry.path());
-        }
-    }
-    if (found.empty())
-        throw Error(folder.string() + ": no .wav, .flac or .ogg file in this folder");
-    std::ranges::sort(found);
-    for (auto const& file : found)
-        jobs.push_back({file, placed(output, file.lexically_relative(folder))});
+bool isHidden(fs::path const& path) {
+    return path.filename().string().starts_with('.');
 }
 
-std::vector<Job> intoFolder(std::vector<fs::path> const& inputs, fs::path const& output) {
-    if (fs::exists(output) && !fs::is_directory(output)) {
-        throw Error(output.string() + ": is a file; several results need a folder");
+void addFolder(fs::path const& folder, fs::path const& output, Plan& plan) {
+    std::vector<fs::path> found;
+    for (auto at = fs::recursive_directory_iterator(folder); at != end(at); ++at) {
+        bool const ours = isHidden(at->path()) || isInside(at->path(), output);
+        if (ours && at->is_directory()) at.disable_recursion_pending();
+        if (ours || !at->is_regular_file()) continue;
+        (isSoundEnding(at->path()) ? found : plan.ignored).push_back(at->path());
     }
-    std::vector<Job> jobs;
+    if (found.empty()) throw Error(folder.string() + ": no sound file in this folder");
+    std::ranges::sort(found);
+    for (auto const& file : found)
+        plan.jobs.push_back({file, placed(output, file.lexically_relative(folder))});
+}
+
+Plan intoFolder(std::vector<fs::path> const& inputs, fs::path const& output) {
+    if (output == standardStream || (fs::exists(output) && !fs::is_directory(output))) {
+        throw Error(output.string() + ": is no folder; several results need one");
+    }
+    Plan plan{.jobs = {}, .intoFolder = true, .ignored = {}};
     for (auto const& input : inputs) {
         if (fs::is_directory(input)) {
             if (isInside(input, output))
                 throw Error(input.string() + ": lies in the output folder");
-            addFolder(input, output, jobs);
+            addFolder(input, output, plan);
         } else {
-            jobs.push_back({input, placed(output, input.filename())});
+            plan.jobs.push_back({input, placed(output, input.filename())});
         }
     }
-    return jobs;
+    return plan;
 }
 
 void check(std::vector<Job> const& jobs) {
-    std::set<fs::path> inputs;
-    for (auto const& job : jobs) inputs.insert(plain(job.input));
+    InputFiles inputs;
+    for (auto const& job : jobs) inputs.add(job.input);
     std::set<fs::path> outputs;
     for (auto const& job : jobs) {
-        auto const output = plain(job.output);
-        std::error_code ignored;
-        if (inputs.contains(output) || fs::equivalent(job.input, job.output, ignored)) {
-            throw Error(job.output.string() + ": is an input as well; choose another output");
-        }
-        if (!outputs.insert(output).second) {
+        inputs.mustNotHold(job.output);
+        if (!outputs.insert(plain(job.output)).second) {
             throw Error(job.output.string() + ": two inputs would be written to this file");
         }
     }
 }
 
-}  // namespace
-
-std::vector<Job> planJobs(std::vector<fs::path> inputs, std::optional<fs::path> const& output) {
-    std::vector<Job> jobs;
+Plan planFor(std::vector<fs::path> const& inputs, std::optional<fs::path> const& output) {
+    auto const isFolder = [](auto const& path) { return fs::is_directory(path); };
     if (!output) {
         if (inputs.size() != 2)
             throw Error("name one input and one output file, or the output with -o");
-        for (auto const& path : inputs) {
-            if (fs::is_directory(path)) {
-                throw Error(path.string() + ": is a folder; name an output folder with -o");
-            }
-        }
-        jobs.push_back({inputs[0], inputs[1]});
-    } else {
-        bool const folder =
-            inputs.size() > 1 || fs::is_directory(*output) || !output->has_filename() ||
-            std::ranges::any_of(inputs, [](auto const& path) { return fs::is_directory(path); });
-        jobs = folder ? intoFolder(inputs, *output) : std::vector<Job>{{inputs.at(0), *output}};
+        auto const folder = std::ranges::find_if(inputs, isFolder);
+        if (folder != inputs.end())
+            throw Error(folder->string() + ": is a folder; name an output folder with -o");
+        return {.jobs = {{inputs[0], inputs[1]}}, .intoFolder = false, .ignored = {}};
     }
-    check(jobs);
-    return jobs;
+    bool const folder = inputs.size() > 1 || isFolder(*output) || !output->has_filename() ||
+                        std::ranges::any_of(inputs, isFolder);
+    if (!folder) return {.jobs = {{inputs.at(0), *output}}, .intoFolder = false, .ignored = {}};
+    if (std::ranges::find(inputs, standardStream) != inputs.end())
+        throw Error("standard input needs an output file or \"-\"");
+    return intoFolder(inputs, *output);
+}
+
+}  // namespace
+
+Plan planJobs(std::vector<fs::path> const& inputs, std::optional<fs::path> const& output) {
+    auto plan = planFor(inputs, output);
+    check(plan.jobs);
+    return plan;
+}
+
+std::size_t leaveOutDone(std::vector<Job>& jobs) {
+    return std::erase_if(jobs, [](Job const& job) {
+        return job.output != standardStream && fs::is_regular_file(job.output);
+    });
 }
 
 void makeFolders(std::vector<Job> const& jobs) {

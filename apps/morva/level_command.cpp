@@ -39,6 +39,7 @@ std::string asCsv(std::vector<float> const& levels, double frameMs) {
 }
 
 int run(LevelOptions const& options) {
+    options.engine.inputs(options.file).mustNotHold(options.output.file);
     Workbench bench(options.engine);
     auto const sound = readMono(options.file);
     auto const levels = noiseLevels(bench, bench.model, sound);
@@ -52,7 +53,7 @@ int run(LevelOptions const& options) {
     };
     options.output.write(bench.streams, {[&] { return asText(levels, frameMs); },
                                          [&] { return asCsv(levels, frameMs); }, asJson});
-    return 0;
+    return ended(bench.streams, sound);
 }
 
 }  // namespace

@@ -1,10 +1,11 @@
-// Entry point of the command line: one subcommand per task, exit status 0 done, 1 failed, 2
-// misused.
+// Entry point of the command line: one subcommand per task.
 #include <cstdio>
 #include <exception>
 
 #include "command.h"
+#include "error.h"
 #include "morva-sdk/vocabulary.h"
+#include "vanishing_file.h"
 
 namespace morva::cli {
 
@@ -27,6 +28,14 @@ void addEngineOptions(CLI::App& command, EngineOptions& options) {
     addFrameOptions(command, options.frameMs, options.verbose);
 }
 
+void addLimit(CLI::App& command, EngineOptions& options) {
+    command
+        .add_option("--limit", options.limitDb,
+                    "Lower no part of the sound by more than this, in decibels (default: no limit)")
+        ->type_name("DB")
+        ->check(CLI::Range(0.0, 200.0));
+}
+
 namespace {
 
 int run(int argc, char** argv) {
@@ -44,7 +53,7 @@ int run(int argc, char** argv) {
     try {
         app.parse(argc, argv);
     } catch (CLI::ParseError const& error) {
-        return app.exit(error) == 0 ? 0 : 2;
+        return app.exit(error) == 0 ? done : misused;
     }
     return action();
 }
@@ -53,10 +62,11 @@ int run(int argc, char** argv) {
 }  // namespace morva::cli
 
 int main(int argc, char** argv) {
+    morva::cli::removeVanishingFilesOnSignals();
     try {
         return morva::cli::run(argc, argv);
     } catch (std::exception const& error) {
         std::fprintf(stderr, "morva: %s\n", error.what());
-        return 1;
+        return morva::cli::failed;
     }
 }

@@ -102,7 +102,8 @@ void Models::add(ModelFiles const& files, std::string const& name) {
     for (auto const& [key, value] : entriesOf(files.control)) {
         if (key != "WEIGHT") text.append(key).append(" ").append(value).append("\n");
     }
-    TemporaryFile const joined(".cfg", text);
+    VanishingFile joined(fs::temp_directory_path() / "morva-", ".cfg", "a temporary file");
+    joined.write(text);
     engine_.addModel(joined.path(), name);
 }
 

@@ -1,9 +1,9 @@
-// A progress bar on standard error, drawn only when that is a terminal. Thread rule: any thread.
+// A progress bar with the time left on standard error, drawn only when that is a terminal. Thread
+// rule: any thread.
 #pragma once
 
 #include <atomic>
 #include <chrono>
-#include <cstdint>
 #include <mutex>
 #include <string>
 
@@ -13,26 +13,29 @@ namespace morva::cli {
 
 class Progress {
 public:
-    // `total` in any unit that advance() uses too.
-    Progress(Streams& streams, std::int64_t total, bool wanted);
+    // `total` in any unit that advance() uses too; 0: not known, nothing is drawn.
+    Progress(Streams& streams, double total, bool wanted);
     ~Progress();
     Progress(Progress const&) = delete;
     Progress& operator=(Progress const&) = delete;
 
-    void advance(std::int64_t amount);
+    void advance(double amount);
     // A line above the bar.
     void say(std::string const& line);
 
 private:
-    void draw();
+    using Clock = std::chrono::steady_clock;
+
+    void draw(Clock::time_point now);
     void erase();
 
     Streams& streams_;
-    std::int64_t total_;
+    double total_;
     bool shown_;
-    std::atomic<std::int64_t> done_ = 0;
+    std::atomic<double> done_ = 0.0;
     std::mutex drawing_;
-    std::chrono::steady_clock::time_point last_{};
+    Clock::time_point start_ = Clock::now();
+    Clock::time_point last_{};
     bool onScreen_ = false;
 };
 

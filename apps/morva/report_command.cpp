@@ -2,7 +2,6 @@
 #include <algorithm>
 #include <string>
 
-#include "audio_file.h"
 #include "channel_cleaner.h"
 #include "command.h"
 #include "error.h"
@@ -57,7 +56,8 @@ Report measured(Workbench& bench, ReportOptions const& options) {
                   .segments = {},
                   .rules = {},
                   .levelsDb = {},
-                  .notes = {}};
+                  .notes = {},
+                  .isDamaged = false};
     report.scores = orNote(report, !options.vadModel.empty(), "Voice score",
                            [&] { return voiceScores(bench, voice, sound); });
     report.segments = speechSegments(report.scores, report.frameMs, report.rules);
@@ -65,24 +65,24 @@ Report measured(Workbench& bench, ReportOptions const& options) {
                              [&] { return noiseLevels(bench, level, sound); });
     for (float& value : report.levelsDb) value -= static_cast<float>(fullScaleDb);
     report.before = std::move(sound.samples);
+    if (sound.channels > 1) report.notes.push_back("Channels were averaged.");
+    if (!sound.isWhole)
+        report.notes.push_back(formatted("Only the first %g s are shown.", options.maxSeconds));
+    report.isDamaged = !sound.damage.empty();
+    if (report.isDamaged) report.notes.push_back(sound.damage);
     return report;
 }
 
 int run(ReportOptions const& options) {
-    std::error_code ignored;
-    if (std::filesystem::equivalent(options.file, options.page, ignored)) {
-        throw Error(options.page.string() + ": is the input; choose another output");
-    }
+    auto inputs = options.engine.inputs(options.file);
+    inputs.add(options.vadModel);
+    inputs.add(options.levelModel);
+    inputs.mustNotHold(options.page);
     Workbench bench(options.engine);
     auto report = measured(bench, options);
-    SoundReader const header(options.file);
-    if (header.channels() > 1) report.notes.push_back("Channels were averaged.");
-    if (header.frames() > static_cast<std::int64_t>(report.before.size())) {
-        report.notes.push_back(formatted("Only the first %g s are shown.", options.maxSeconds));
-    }
     TextOutput{options.page, {}}.write(bench.streams, renderPage(report));
     for (auto const& note : report.notes) bench.streams.err("morva: " + note + '\n');
-    return 0;
+    return report.isDamaged ? incomplete : done;
 }
 
 }  // namespace
@@ -101,6 +101,7 @@ void addReport(CLI::App& app, Action& action) {
                     "Length shown, from the start; 0 shows all")
         ->check(CLI::NonNegativeNumber)
         ->capture_default_str();
+    addLimit(command, options.engine);
     addEngineOptions(command, options.engine);
 }
 

@@ -20,6 +20,7 @@ struct Report {
     SegmentRules rules;
     std::vector<float> levelsDb;  // re full scale; empty: no noise-level model
     std::vector<std::string> notes;
+    bool isDamaged = false;  // the rest of the file is missing, as a note says
 };
 
 std::string renderPage(Report const& report);

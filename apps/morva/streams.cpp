@@ -21,16 +21,6 @@ std::string_view trimmed(std::string_view text) {
     return text.substr(first, text.find_last_not_of(blanks) - first + 1);
 }
 
-bool writeAll(int descriptor, std::string_view text) noexcept {
-    while (!text.empty()) {
-        auto const written = ::write(descriptor, text.data(), text.size());
-        if (written < 0 && errno == EINTR) continue;
-        if (written <= 0) return false;
-        text.remove_prefix(static_cast<std::size_t>(written));
-    }
-    return true;
-}
-
 void flushLibraries() {
     std::cout.flush();
     std::cerr.flush();

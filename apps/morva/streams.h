@@ -28,6 +28,8 @@ public:
     // Writes to the caller's standard error; a failure is ignored, there is nobody to tell.
     void err(std::string_view text) noexcept;
     bool errIsTerminal() const;
+    // Of the caller's standard output.
+    int outDescriptor() const { return out_.get(); }
     bool verbose() const { return verbose_; }
 
 private:

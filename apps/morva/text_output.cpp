@@ -1,10 +1,6 @@
 #include "text_output.h"
 
-#include <cerrno>
-#include <fstream>
-#include <system_error>
-
-#include "error.h"
+#include "output_file.h"
 
 namespace morva::cli {
 
@@ -18,12 +14,10 @@ void TextOutput::write(Streams& streams, Forms const& forms) const {
 }
 
 void TextOutput::write(Streams& streams, std::string const& text) const {
-    if (file.empty()) return streams.out(text);
-    std::ofstream stream(file, std::ios::binary);
-    stream << text << std::flush;
-    if (!stream)
-        throw Error(file.string() +
-                    ": cannot be written: " + std::generic_category().message(errno));
+    if (file.empty() || file == standardStream) return streams.out(text);
+    OutputFile target(file);
+    target.unfinished().write(text);
+    target.finish();
 }
 
 void addTextOutput(CLI::App& command, TextOutput& output) {

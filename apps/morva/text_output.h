@@ -20,7 +20,7 @@ struct Forms {
 };
 
 struct TextOutput {
-    std::filesystem::path file;  // empty: standard output
+    std::filesystem::path file;  // empty or "-": standard output
     std::string format;          // "text", "csv", "json"; empty: by the file's ending, else text
 
     // Both throw Error when it cannot be written.

@@ -70,6 +70,7 @@ nlohmann::ordered_json asJson(Findings const& found, VadOptions const& options) 
 }
 
 int run(VadOptions const& options) {
+    options.engine.inputs(options.file).mustNotHold(options.output.file);
     Workbench bench(options.engine);
     auto const sound = readMono(options.file);
     Findings found{.scores = voiceScores(bench, bench.model, sound),
@@ -80,7 +81,7 @@ int run(VadOptions const& options) {
     options.output.write(bench.streams,
                          {[&] { return asText(found); }, [&] { return asCsv(found); },
                           [&] { return asJson(found, options); }});
-    return 0;
+    return ended(bench.streams, sound);
 }
 
 }  // namespace

@@ -2,10 +2,12 @@
 #pragma once
 
 #include <filesystem>
+#include <limits>
 #include <string>
 
 #include "engine.h"
 #include "models.h"
+#include "output_file.h"
 #include "streams.h"
 
 namespace morva::cli {
@@ -14,7 +16,13 @@ struct EngineOptions {
     ModelChoice model;
     std::filesystem::path models;  // folder of the shipped ones; empty: beside the program
     int frameMs = 10;
+    float limitDb = std::numeric_limits<float>::infinity();
     bool verbose = false;
+
+    // `sound` and the files that are named here.
+    InputFiles inputs(std::filesystem::path const& sound) const {
+        return {sound, model.model, model.control};
+    }
 };
 
 struct Workbench {
@@ -29,6 +37,7 @@ struct Workbench {
     Models models;
     ModelFiles model;  // of --model and --control
     int frameMs;
+    float limitDb;
 };
 
 }  // namespace morva::cli

@@ -5,7 +5,7 @@ from __future__ import annotations
 import math
 import os
 import tempfile
-from collections.abc import Iterator
+from collections.abc import Callable, Iterator
 from contextlib import ExitStack, contextmanager
 from pathlib import Path
 from typing import Any
@@ -21,8 +21,8 @@ _BLOCK_SECONDS = 1.0
 
 @contextmanager
 def _complete_or_absent(target: Path) -> Iterator[Path]:
-    """A temporary file that takes the target's name only when its block ends well."""
-    handle, name = tempfile.mkstemp(prefix=f".{target.stem}-", suffix=target.suffix, dir=target.parent)
+    """A file beside the target, no sound by its name, that takes the target's only when its block ends well."""
+    handle, name = tempfile.mkstemp(prefix=f"{target.name}.part-", dir=target.parent)
     os.close(handle)
     try:
         yield Path(name)
@@ -44,16 +44,30 @@ def denoise_file(
 ) -> None:
     """Cleans a sound file (WAV, FLAC, Ogg) into another of the same length, channels and sample type.
 
-    The target appears only when it is complete. `progress` draws a bar on standard error.
+    The target appears only when it is complete and may be no link to the source. `progress` draws a bar on
+    standard error.
     """
+    with tqdm(unit="sample", unit_scale=True, disable=not progress, desc=Path(source).name) as bar:
+
+        def advance(samples: int, total: int) -> None:
+            bar.total = total
+            bar.update(samples)
+
+        clean_file(source, target, advance, frame_ms=frame_ms, model=model, attenuation_limit_db=attenuation_limit_db)
+
+
+def clean_file(
+    source: str | os.PathLike[str],
+    target: str | os.PathLike[str],
+    advance: Callable[[int, int], object],
+    **options: Any,
+) -> None:
+    """denoise_file() that tells `advance` of every block (its samples, those of the file); what that raises ends it."""
     target = Path(target)
     with ExitStack() as stack:
         reader = stack.enter_context(soundfile.SoundFile(source))
-        options: dict[str, Any] = {
-            "frame_ms": frame_ms,
-            "model": model,
-            "attenuation_limit_db": attenuation_limit_db,
-        }
+        if target.exists() and target.samefile(source):
+            raise ValueError(f"{target} is the input as well; choose another output")
         streams = [stack.enter_context(Denoiser(reader.samplerate, **options)) for _ in range(reader.channels)]
         unfinished = stack.enter_context(_complete_or_absent(target))
         kind = target.suffix[1:].upper()
@@ -61,16 +75,7 @@ def denoise_file(
         writer = stack.enter_context(
             soundfile.SoundFile(unfinished, "w", reader.samplerate, reader.channels, subtype, format=kind)
         )
-        bar = stack.enter_context(
-            tqdm(
-                total=reader.frames,
-                unit="sample",
-                unit_scale=True,
-                disable=not progress,
-                desc=Path(source).name,
-            )
-        )
         for block in reader.blocks(int(reader.samplerate * _BLOCK_SECONDS), dtype="float32", always_2d=True):
             writer.write(np.stack([s.push(block[:, c]) for c, s in enumerate(streams)], axis=1))
-            bar.update(len(block))
+            advance(len(block), reader.frames)
         writer.write(np.stack([s.flush() for s in streams], axis=1))

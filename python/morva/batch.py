@@ -3,7 +3,8 @@
 Files are cleaned side by side on threads, as the engine works outside the interpreter lock. An output
 appears only when it is complete. The journal beside the outputs holds one line per finished file, so
 that a run that was stopped goes on where it was; changed sources and failed files are done again.
-Files that fail are listed at the end and in the journal, and the status is 1.
+Files that fail are listed at the end and in the journal, and the status is 1. Interrupted or terminated,
+it leaves what is under way and the status is 130 or 143.
 """
 
 from __future__ import annotations
@@ -12,9 +13,10 @@ import argparse
 import json
 import math
 import os
+import signal
 import sys
 import threading
-from collections.abc import Iterable, Iterator
+from collections.abc import Callable, Iterable, Iterator
 from concurrent.futures import ThreadPoolExecutor, as_completed
 from dataclasses import dataclass
 from pathlib import Path
@@ -22,7 +24,7 @@ from typing import Any
 
 from tqdm import tqdm
 
-from ._files import denoise_file
+from ._files import clean_file
 
 JOURNAL = "morva-batch.jsonl"
 ENDINGS = (".wav", ".flac", ".ogg")
@@ -30,7 +32,7 @@ ENDINGS = (".wav", ".flac", ".ogg")
 
 @dataclass(frozen=True)
 class Job:
-    """One file; `settings` are the keyword arguments of denoise_file."""
+    """One file; `settings` are keyword arguments of denoise_file."""
 
     source: Path
     target: Path
@@ -102,24 +104,51 @@ class Journal:
             file.write("\n" + json.dumps(entry))
 
 
-def clean(job: Job) -> str | None:
+class Stopped(BaseException):
+    """Raised in the work under way when a signal has come."""
+
+
+class Stop:
+    """While it is open, the first signal that would end the program is noted; a second one ends it at once."""
+
+    number = 0
+
+    def __enter__(self) -> Stop:
+        self._before = {number: signal.signal(number, self._note) for number in (signal.SIGINT, signal.SIGTERM)}
+        return self
+
+    def __exit__(self, *_: object) -> None:
+        for number, handler in self._before.items():
+            signal.signal(number, handler)
+
+    def _note(self, number: int, _: object) -> None:
+        self.number = number
+        signal.signal(number, signal.SIG_DFL)
+
+    def check(self, *_: object) -> None:
+        if self.number:
+            raise Stopped
+
+
+def clean(job: Job, advance: Callable[[int, int], object]) -> str | None:
     """The error's text, or nothing when the file is done."""
     try:
         job.target.parent.mkdir(parents=True, exist_ok=True)
-        denoise_file(job.source, job.target, **job.settings)
+        clean_file(job.source, job.target, advance, **job.settings)
     except Exception as error:
         return f"{type(error).__name__}: {error}"
     return None
 
 
-def run(jobs: list[Job], journal: Journal, workers: int, *, progress: bool = True) -> dict[str, str]:
-    """Cleans what is not done yet; returns the failures by source."""
+def run(jobs: list[Job], journal: Journal, workers: int, stop: Stop, *, progress: bool = True) -> dict[str, str]:
+    """Cleans what is not done yet; returns the failures by source. Raises Stopped."""
     todo = [job for job in jobs if not journal.is_done(job)]
     if len(todo) < len(jobs):
         print(f"{len(jobs) - len(todo)} of {len(jobs)} files are done already", file=sys.stderr)
 
     def noted(job: Job) -> str | None:
-        error = clean(job)
+        stop.check()
+        error = clean(job, stop.check)
         journal.add(job, error)
         return error
 
@@ -131,7 +160,7 @@ def run(jobs: list[Job], journal: Journal, workers: int, *, progress: bool = Tru
             if (error := future.result()) is not None:
                 failures[str(futures[future].source)] = error
     finally:
-        pool.shutdown(cancel_futures=True)  # when interrupted: the files under way are finished, no others begun
+        pool.shutdown(cancel_futures=True)  # when stopped: no others are begun
     return failures
 
 
@@ -157,7 +186,12 @@ def main(arguments: list[str] | None = None) -> int:
     except (OSError, ValueError) as error:
         print(f"morva.batch: {error}", file=sys.stderr)
         return 2
-    failures = run(jobs, Journal(options.output), options.workers, progress=not options.quiet)
+    with Stop() as stop:
+        try:
+            failures = run(jobs, Journal(options.output), options.workers, stop, progress=not options.quiet)
+        except Stopped:
+            print("morva.batch: stopped; the same command goes on from here", file=sys.stderr)
+            return 128 + stop.number
     for source, reason in failures.items():
         print(f"{source}: {reason}", file=sys.stderr)
     print(f"{len(jobs) - len(failures)} of {len(jobs)} files cleaned", file=sys.stderr)

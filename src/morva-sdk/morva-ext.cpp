@@ -70,6 +70,14 @@ int MorvaExt_SessionLatencySamples(void* handle) {
     return code == kDone ? latency : -std::abs(code);
 }
 
+int MorvaExt_SessionExactLatency(void* handle, double* samples) {
+    return withSound(handle, [&](auto& sound) {
+        if (samples == nullptr) return 2;
+        *samples = sound.exactLatency();
+        return kDone;
+    });
+}
+
 int MorvaExt_SessionFrameSizes(void* handle, unsigned int* inputSize, unsigned int* outputSize) {
     return withSession(handle, [&](auto& session) {
         if (inputSize != nullptr) *inputSize = static_cast<unsigned>(session.inputFrameSize());

@@ -20,6 +20,10 @@ extern "C" {
  * Constant for the session's life, bypass included. Negative for any other handle. */
 MORVA_API int MorvaExt_SessionLatencySamples(void* session);
 
+/* [any thread] The same of the cleaned sound, not rounded, into `samples`; bypass keeps to the
+ * rounded one. */
+MORVA_API int MorvaExt_SessionExactLatency(void* session, double* samples);
+
 /* [any thread] Samples per frame that a session of any kind takes and gives (0 output samples for
  * voice activity). Either pointer may be null. */
 MORVA_API int MorvaExt_SessionFrameSizes(void* session, unsigned int* inputSize,

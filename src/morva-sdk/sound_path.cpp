@@ -37,7 +37,8 @@ SoundPath::SoundPath(NOISE_CANCELLER::NoiseModel model, std::size_t inputFrame,
     : controls_(model.controls),
       model_(std::move(model.cleaner), inputFrame, duration),
       toOutput_(model_.modelFrame(), outputFrame),
-      latency_(std::lround(latencyOf(model_.converter(), controls_.delay(), toOutput_))),
+      exactLatency_(latencyOf(model_.converter(), controls_.delay(), toOutput_)),
+      latency_(std::lround(exactLatency_)),
       bypass_(inputFrame, outputFrame, static_cast<std::size_t>(latency_)) {}
 
 void SoundPath::clean(std::vector<float>& frame) {

@@ -48,6 +48,7 @@ public:
     void clean(std::vector<float>& frame);
 
     // From sound in to sound out, in output samples.
+    double exactLatency() const { return exactLatency_; }
     long latencySamples() const { return latency_; }
 
     // [any thread] No limit: infinity. False, and nothing changed, for a negative one or a NaN.
@@ -67,7 +68,8 @@ private:
     NOISE_CANCELLER::SoundControls& controls_;  // of the model
     ModelStage model_;
     FrameConverter toOutput_;
-    long latency_;
+    double exactLatency_;
+    long latency_;  // rounded
     Bypass bypass_;
     std::unique_ptr<VoiceMeter> voice_;  // once enabled
 };

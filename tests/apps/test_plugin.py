@@ -10,7 +10,7 @@ import numpy as np
 import pytest
 import soundfile
 
-from conftest import BUILD, SOURCE
+from conftest import BUILD, SOURCE, lag_and_likeness
 
 RATES = [8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000]
 os.environ["MORVA_MODELS"] = str(SOURCE / "models")
@@ -83,7 +83,10 @@ def test_sound_is_the_command_lines_and_bypass_as_late(plugins, morva, recording
         out = instance.clean(sound, longest)
         late = int(instance.controls["latency"][0])
         assert rate / 100 < late < rate / 10 and np.all(out[:, : rate // 100] == 0)
-        assert np.array_equal(out[:, late:], wanted[:, :-late])
+        if rate in (8000, 16000, 32000, 96000):  # elsewhere the command line takes out a part of a sample, too
+            assert np.array_equal(out[:, late:], wanted[:, :-late])
+        lag, likeness = lag_and_likeness(wanted[0, :-late], out[0, late:], rate)
+        assert abs(lag) < 0.51 and likeness > 0.999
     instance.controls["Bypass"][0] = 1
     out = instance.clean(sound, 256)[:, late + rate // 50 :]  # behind the cross-fade
     assert np.abs(out - sound[:, rate // 50 : -late]).max() < 1e-6
@@ -111,7 +114,9 @@ def test_other_rates_are_refused_on_standard_error(plugins, capfd, rate):
 
 @pytest.mark.skipif(not shutil.which("sox"), reason="sox is not installed")
 def test_in_a_real_host(morva, tmp_path):
-    library, noisy = BUILD / "libmorva_ladspa.so", SOURCE / "examples/audio/noisy.flac"
+    library, noisy = BUILD / "libmorva_ladspa.so", tmp_path / "noisy.wav"
+    sound, _ = soundfile.read(SOURCE / "examples/audio/noisy.flac", dtype="i2")
+    soundfile.write(noisy, sound, 32000)  # where the latency, of which hosts take out whole samples, is whole
     morva("denoise", noisy, tmp_path / "wanted.wav")
     wanted = soundfile.read(tmp_path / "wanted.wav", dtype="i2")[0].astype(int)
     command = f"sox -D {noisy} {tmp_path}/out.wav remix 1 1 ladspa -l {library} morva_stereo 100 0"

@@ -25,6 +25,7 @@ short in16[160] = {};
 short out16[160] = {};
 float in32[160] = {};
 float out32[160] = {};
+double exact = 0;
 
 template <class Function, class... Arguments>
 auto call(Function function, Arguments... arguments) {
@@ -80,6 +81,7 @@ HandleCall const kHandleCalls[] = {
     {[](void* h) { return Morva_NoiseDB_FrameFloat(h, in32, 160); }, 3, -4},
     {[](void* h) { return MorvaExt_NoiseDB_FrameFloat(h, in32, 160, out32); }, 3, 2},
     {MorvaExt_SessionLatencySamples, 1, -2},
+    {[](void* h) { return MorvaExt_SessionExactLatency(h, &exact); }, 1, 2},
     {[](void* h) { return MorvaExt_SessionFrameSizes(h, nullptr, nullptr); }, 0, 2},
     {[](void* h) { return MorvaExt_NC_SetAttenuationLimit(h, 0.0F); }, 1, 2},
     {[](void* h) { return MorvaExt_NC_SetBypass(h, 1); }, 1, 2},
