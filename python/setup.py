@@ -1,4 +1,4 @@
-"""Puts the engine library and the models into the package.
+"""Puts the engine library, the models and the licences into the package.
 
 The library is taken from MORVA_LIBRARY, else from ../build/release, else built there. It is loaded at
 run time and links to no Python, so one wheel serves every Python version.
@@ -31,6 +31,14 @@ def engine_library() -> Path:
     return library
 
 
+def math_library_licence() -> Path | None:
+    """The engine carries the math library, whose licence asks for its text to go along."""
+    roots = [Path(os.environ["MKLROOT"])] if "MKLROOT" in os.environ else []
+    folders = [*roots, *(root / "licensing" for root in roots), ROOT / ".deps/mkl"]
+    found = (folder / name for folder in folders for name in ("LICENSE.txt", "license.txt"))
+    return next(filter(Path.exists, found), None)
+
+
 class BuildWithEngine(build_py):
     def run(self):
         super().run()
@@ -38,6 +46,11 @@ class BuildWithEngine(build_py):
         shutil.rmtree(bundled, ignore_errors=True)
         (bundled / "models").mkdir(parents=True)
         shutil.copyfile(engine_library(), bundled / "libmorva.so")
+        licences = bundled / "licenses"
+        licences.mkdir()
+        shutil.copyfile(ROOT / "LICENSE", licences / "LICENSE")
+        if (mkl := math_library_licence()) is not None:
+            shutil.copyfile(mkl, licences / "LICENSE.onemkl")
         for model in (ROOT / "models").iterdir():
             if model.suffix in (".mvw", ".md", ".json"):
                 shutil.copyfile(model, bundled / "models" / model.name)

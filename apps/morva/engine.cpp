@@ -3,6 +3,7 @@
 #include "error.h"
 #include "morva-ext.h"
 #include "morva-sdk/vocabulary.h"
+#include "streams.h"
 
 namespace morva::cli {
 namespace {
@@ -13,8 +14,8 @@ std::string withReason(std::string const& what, EngineTalk const& talk) {
 }
 
 template <class Create>
-SessionHandle open(Engine& engine, SessionSetup const& setup, int (*close)(void*), Create create) {
-    EngineTalk const talk(engine.streams());
+SessionHandle open(SessionSetup const& setup, int (*close)(void*), Create create) {
+    EngineTalk const talk;
     SessionHandle session(
         create(static_cast<MorvaSamplingRate>(setup.rateHz),
                static_cast<MorvaFrameDuration>(setup.frameMs), setup.model.c_str()),
@@ -43,8 +44,8 @@ std::wstring wide(std::filesystem::path const& path) {
     return {points.begin(), points.end()};
 }
 
-Engine::Engine(Streams& streams) : streams_(streams) {
-    EngineTalk const talk(streams_);
+Engine::Engine() {
+    EngineTalk const talk;
     if (Morva_SDK_GlobalInit(nullptr, 1) != 0) {
         throw Error(withReason("the engine cannot start", talk));
     }
@@ -55,14 +56,14 @@ Engine::~Engine() {
 }
 
 void Engine::addModel(std::filesystem::path const& file, std::string const& name) {
-    EngineTalk const talk(streams_);
+    EngineTalk const talk;
     if (Morva_SDK_SetModel(wide(file).c_str(), name.c_str()) != 0) {
         throw Error(withReason(name + ": not a usable model", talk));
     }
 }
 
-CleaningSession::CleaningSession(Engine& engine, SessionSetup const& setup)
-    : session_(open(engine, setup, &Morva_NC_CloseSession, [](auto rate, auto frame, auto model) {
+CleaningSession::CleaningSession(Engine& /*engine*/, SessionSetup const& setup)
+    : session_(open(setup, &Morva_NC_CloseSession, [](auto rate, auto frame, auto model) {
           return Morva_NC_CreateSession(rate, rate, frame, model);
       })) {
     if (MorvaExt_SessionExactLatency(session_.get(), &latency_) != 0)
@@ -76,8 +77,8 @@ void CleaningSession::clean(std::span<float const> in, std::span<float> out) {
                                                 count(out)));
 }
 
-VoiceSession::VoiceSession(Engine& engine, SessionSetup const& setup)
-    : session_(open(engine, setup, &Morva_VAD_CloseSession, &Morva_VAD_CreateSession)) {}
+VoiceSession::VoiceSession(Engine& /*engine*/, SessionSetup const& setup)
+    : session_(open(setup, &Morva_VAD_CloseSession, &Morva_VAD_CreateSession)) {}
 
 float VoiceSession::score(std::span<float const> frame) {
     float const score = Morva_VAD_FrameFloat(session_.get(), frame.data(), count(frame));
@@ -87,8 +88,8 @@ float VoiceSession::score(std::span<float const> frame) {
     return score;
 }
 
-LevelSession::LevelSession(Engine& engine, SessionSetup const& setup)
-    : session_(open(engine, setup, &Morva_NoiseDB_CloseSession, &Morva_NoiseDB_CreateSession)) {}
+LevelSession::LevelSession(Engine& /*engine*/, SessionSetup const& setup)
+    : session_(open(setup, &Morva_NoiseDB_CloseSession, &Morva_NoiseDB_CreateSession)) {}
 
 float LevelSession::level(std::span<float const> frame) {
     float level = 0.0F;

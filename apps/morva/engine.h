@@ -13,8 +13,6 @@
 #include <span>
 #include <string>
 
-#include "streams.h"
-
 namespace morva::cli {
 
 // What a session runs on.
@@ -30,7 +28,7 @@ struct SessionSetup {
 class Engine {
 public:
     // Throws Error when the processor lacks what the engine needs.
-    explicit Engine(Streams& streams);
+    Engine();
     ~Engine();
     Engine(Engine const&) = delete;
     Engine& operator=(Engine const&) = delete;
@@ -38,10 +36,6 @@ public:
     // Registers a weight or control file, given by its absolute path, under a name that no model
     // has yet; throws Error with the engine's reason.
     void addModel(std::filesystem::path const& file, std::string const& name);
-    Streams& streams() { return streams_; }
-
-private:
-    Streams& streams_;
 };
 
 // The engine's form of a path. File names are UTF-8, whatever the locale; others throw.

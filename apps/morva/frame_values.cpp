@@ -66,7 +66,6 @@ int ended(Streams& streams, MonoSound const& sound) {
 std::vector<float> voiceScores(Workbench& bench, ModelFiles const& model, MonoSound const& sound) {
     auto const setup = bench.setup(ShippedKind::VAD, model, sound.name, sound.rateHz);
     VoiceSession session(bench.engine, setup);
-    EngineTalk const talk(bench.streams);  // a score that it refuses is printed
     return forEachFrame(sound, setup, [&](auto frame) { return session.score(frame); });
 }
 

@@ -145,7 +145,7 @@ std::string asText(InspectOptions const& options, WeightFacts const& facts, Tria
 int run(InspectOptions const& options) {
     InputFiles{options.file}.mustNotHold(options.output);
     Streams streams(options.verbose);
-    Engine engine(streams);
+    Engine engine;
     if (!std::filesystem::is_regular_file(options.file)) {
         throw Error(options.file.string() + ": no such file");
     }

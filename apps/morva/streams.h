@@ -1,14 +1,10 @@
-// The tool's standard streams, kept apart from what the engine prints.
+// The tool's standard streams, and what the engine says beside its results: nothing of that reaches
+// standard output, so that a CSV or JSON there stays clean. With `verbose` it goes to standard
+// error, otherwise only to the EngineTalk of the thread whose call it was.
 //
-// The engine writes diagnostics on the process's standard output and error. So that a CSV or JSON
-// on standard output stays clean, the process's descriptor 1 is pointed at a file in memory for the
-// whole run and the tool writes to copies of the original descriptors. With `verbose` the engine's
-// lines go to standard error instead.
-//
-// Threads: out and err may be called from any thread; EngineTalk sections exclude each other.
+// Threads: out and err may be called from any thread. One Streams at a time.
 #pragma once
 
-#include <mutex>
 #include <string>
 #include <string_view>
 
@@ -33,20 +29,16 @@ public:
     bool verbose() const { return verbose_; }
 
 private:
-    friend class EngineTalk;
-
     bool verbose_;
     Descriptor out_;
     Descriptor err_;
-    Descriptor heard_;  // what the engine printed, in memory
-    std::mutex talking_;
 };
 
-// While alive, the engine's standard error is recorded too. reason() is what it has said, cut down
-// to the sentence that explains the failure.
+// While alive, keeps what the engine says to this thread; one at a time per thread. reason() is
+// that, cut down to the sentence that explains the failure.
 class EngineTalk {
 public:
-    explicit EngineTalk(Streams& streams);
+    EngineTalk();
     ~EngineTalk();
     EngineTalk(EngineTalk const&) = delete;
     EngineTalk& operator=(EngineTalk const&) = delete;
@@ -54,13 +46,7 @@ public:
     std::string reason() const;
 
 private:
-    Streams& streams_;
-    std::unique_lock<std::mutex> lock_;
-    long from_ = 0;
+    std::string heard_;
 };
-
-// The explaining sentence of an engine diagnostic: the message of an exception text, otherwise the
-// last line that says something. Public for the tests.
-std::string explain(std::string_view diagnostics);
 
 }  // namespace morva::cli

@@ -26,7 +26,6 @@ int engineRateFor(std::string const& sound, int rateHz) {
 
 Workbench::Workbench(EngineOptions const& options)
     : streams(options.verbose),
-      engine(streams),
       models(engine, options.models),
       model(modelFiles(options.model)),
       frameMs(options.frameMs),

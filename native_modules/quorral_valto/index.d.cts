@@ -1,4 +1,5 @@
 /// <reference lib="esnext.disposable" />
+import type { Transform } from 'node:stream';
 
 /** Sampling rates in hertz that sessions take. */
 export type SampleRate = 8000 | 12000 | 16000 | 24000 | 32000 | 44100 | 48000 | 88200 | 96000;
@@ -50,12 +51,25 @@ export declare class ValtoError extends Error {
   readonly nativeCode?: number;
 }
 
+export interface InitializeOptions {
+  /**
+   * Gets what engine and module have to say, from whatever thread of the process: registered models,
+   * parameters that are out of range, refused calls. `stream` is where it would be printed, `text`
+   * may have several lines. Called on a later turn of the event loop, for which it does not keep the
+   * process waiting, and before the process exits. Left out: as before, at first nobody. `null`:
+   * nobody any more.
+   */
+  onDiagnostic?: ((text: string, stream: 'stdout' | 'stderr') => void) | null;
+}
+
 /**
  * Starts the engine and registers the shipped models. Succeeds when the engine is already running in
- * this process, whoever started it. Blocks for some milliseconds while the weights are read.
+ * this process, whoever started it. Blocks for some milliseconds while the weights are read. From
+ * then on nothing is printed in this process, by the raw functions and the native entry points
+ * either: see `onDiagnostic`.
  * @throws {ValtoError}
  */
-export declare function initialize(): void;
+export declare function initialize(options?: InitializeOptions): void;
 
 /** Names of the noise-cancellation models, in the order of their sampling rates. */
 export declare function getNcModels(): Promise<string[]>;
@@ -97,25 +111,84 @@ declare class Session {
   [Symbol.dispose](): void;
 }
 
+/** Samples over the whole 16-bit range, or floating point in -1..1. */
+export type Samples = Int16Array | Float32Array;
+
+export interface NoiseCancellerOptions extends SessionOptions {
+  /** See `NoiseCanceller.attenuationLimit`; `Infinity` when left out. */
+  attenuationLimit?: number;
+  /** See `NoiseCanceller.bypass`; off when left out. */
+  bypass?: boolean;
+  /** Whether a voice-activity model listens, the chosen one or the one of that name. Off by default. */
+  voice?: boolean | string;
+}
+
 /**
- * Removes background noise from one stream of 16-bit mono audio, frame by frame. A multi-channel
- * stream takes one session per channel.
+ * Removes background noise from one stream of mono audio: frame by frame with `process`, or in blocks
+ * of any length with `push` and `flush`. A multi-channel stream takes one session per channel.
  */
 export declare class NoiseCanceller extends Session {
   /** @throws {ValtoError} */
-  constructor(options: SessionOptions);
-  /** How many samples the output runs behind the input; constant for the session's life. */
+  constructor(options: NoiseCancellerOptions);
+  /** How many samples the output of `process` runs behind the input; constant. */
   readonly latency: number;
+  /**
+   * No part of the sound in the model's band is lowered by more, in decibels: 0 lets everything
+   * through, `Infinity` is no limit. May be set between any two frames; a change fades in.
+   */
+  attenuationLimit: number;
+  /** Lets the sound through at the same latency; the change cross-fades over a frame. */
+  bypass: boolean;
+  /** Voice score of the last frame, 0 to 1; NaN unless the option `voice` is on, and at first. */
+  readonly voiceScore: number;
+  /**
+   * Level of what was removed from the last frame, in decibels re one squared unit of the 16-bit
+   * scale: -60 for silence, about 90 for full scale.
+   */
+  readonly noiseLevel: number;
   /**
    * Cleans one frame into `output`, by default into the frame itself, and returns what it wrote to.
    * Allocates nothing.
    * @throws {ValtoError}
    */
-  process(frame: Int16Array): Int16Array;
+  process<Frame extends Samples>(frame: Frame): Frame;
   process<Output extends Int16Array>(frame: Int16Array, output: Output): Output;
+  process<Output extends Float32Array>(frame: Float32Array, output: Output): Output;
+  /**
+   * Takes a block of any length and returns the cleaned samples that are ready, without the latency:
+   * `push` and `flush` together give as many samples as went in, in their place. All blocks of a
+   * sound are of one kind. Not to be mixed with `process`.
+   * @throws {ValtoError}
+   */
+  push(block: Int16Array): Int16Array;
+  push(block: Float32Array): Float32Array;
+  /** Returns the rest. The next sound needs a new session. */
+  flush(): Samples;
 }
 
-/** Tells frame by frame how likely one stream of 16-bit mono audio holds voice. */
+export interface NoiseCancellerStreamOptions extends Omit<NoiseCancellerOptions, 'frameMs'> {
+  /** Interleaved channels, 1 to 16; 1 when left out. */
+  channels?: number;
+  /** `s16le` (16-bit integers, the default) or `f32le` (floating point in -1..1). */
+  format?: 's16le' | 'f32le';
+  /** 10 when left out. */
+  frameMs?: FrameDuration;
+  /** As for every stream, in bytes. */
+  highWaterMark?: number;
+}
+
+/**
+ * A noise canceller for pipelines: bytes of raw samples in, in chunks of any size, as many bytes out,
+ * without the latency. A sample that is cut at the end is dropped.
+ */
+export declare class NoiseCancellerStream extends Transform {
+  /** @throws {ValtoError} */
+  constructor(options: NoiseCancellerStreamOptions);
+  /** One per channel, for limit, bypass and meters. Closed when the stream is destroyed or ends. */
+  readonly cancellers: readonly NoiseCanceller[];
+}
+
+/** Tells frame by frame how likely one stream of mono audio holds voice. */
 export declare class VoiceActivityDetector extends Session {
   /** @throws {ValtoError} */
   constructor(options: SessionOptions);
@@ -123,7 +196,7 @@ export declare class VoiceActivityDetector extends Session {
    * The voice score of one frame, 0 to 1; 0.5 is the model's best threshold.
    * @throws {ValtoError}
    */
-  process(frame: Int16Array): number;
+  process(frame: Samples): number;
 }
 
 /** The native module's own functions, unchanged. */

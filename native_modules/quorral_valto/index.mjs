@@ -10,6 +10,7 @@ export const {
   setVadModel,
   NoiseCanceller,
   VoiceActivityDetector,
+  NoiseCancellerStream,
   ValtoError,
   SAMPLE_RATES,
   FRAME_DURATIONS,

@@ -5,6 +5,7 @@ from __future__ import annotations
 import atexit
 import functools
 import json
+import logging
 import os
 import threading
 from dataclasses import dataclass
@@ -14,6 +15,12 @@ from typing import Any
 from . import _library
 
 RATES = (8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000)
+
+
+_HIGHEST_RATE = 384000
+
+_log = logging.getLogger("morva")
+_log.addHandler(logging.NullHandler())
 
 
 class EngineError(RuntimeError):
@@ -42,8 +49,15 @@ def failure(what: str) -> EngineError:
 
 def check_rate(rate: int) -> int:
     if rate not in RATES:
-        raise ValueError(f"a rate of {rate} Hz is not supported; the engine takes {RATES}: resample first")
+        raise ValueError(f"frames of {rate} Hz are not supported; the engine takes {RATES}")
     return int(rate)
+
+
+def engine_rate(rate: int) -> int:
+    """The rate at which sound of `rate` goes through the engine: its own, else the next higher one."""
+    if rate != int(rate) or not 0 < rate <= _HIGHEST_RATE:
+        raise ValueError(f"a rate of {rate} Hz is not supported; it is a whole number up to {_HIGHEST_RATE}")
+    return next((taken for taken in RATES if taken >= rate), RATES[-1])
 
 
 @functools.cache
@@ -65,8 +79,15 @@ def _model_file(name: str) -> Path:
     return file
 
 
+@_library.Diagnostic
+def _note(_stream: int, text: bytes) -> None:
+    _log.debug("%s", text.decode(errors="replace"))
+
+
 @functools.cache
 def _start() -> None:
+    _library.library().MorvaExt_SetDiagnostics(_note)
+    atexit.register(_library.library().MorvaExt_SetDiagnostics, _library.Diagnostic())
     if _library.library().Morva_SDK_GlobalInit(None, 1) != 0:
         raise failure("the engine cannot start")
     atexit.register(_library.library().Morva_SDK_GlobalDestroy)

@@ -18,6 +18,21 @@ from ._streams import Denoiser
 
 _BLOCK_SECONDS = 1.0
 
+# Sample types that lose nothing of others, the tightest first. What is not listed becomes 16 bits or Vorbis.
+_TYPES_HOLDING = {
+    **dict.fromkeys(("PCM_U8", "PCM_S8"), ("PCM_U8", "PCM_S8", "PCM_16")),
+    **dict.fromkeys(("PCM_32", "FLOAT", "DOUBLE"), ("FLOAT", "PCM_24")),
+}
+
+
+def _sample_type(kind: str, reader: soundfile.SoundFile) -> str:
+    """The source's sample type where the container `kind` has it, else one that holds it."""
+    own = reader.subtype
+    plain = own.startswith(("PCM_", "FLOAT", "DOUBLE", "ULAW", "ALAW"))
+    choices = ((own,) if plain or kind == reader.format else ()) + _TYPES_HOLDING.get(own, ("PCM_16", "VORBIS"))
+    fitting = (choice for choice in choices if soundfile.check_format(kind, choice))
+    return next(fitting, soundfile.default_subtype(kind))
+
 
 @contextmanager
 def _complete_or_absent(target: Path) -> Iterator[Path]:
@@ -42,7 +57,7 @@ def denoise_file(
     attenuation_limit_db: float = math.inf,
     progress: bool = False,
 ) -> None:
-    """Cleans a sound file (WAV, FLAC, Ogg) into another of the same length, channels and sample type.
+    """Cleans a sound file of any kind into a WAV, FLAC or Ogg of the same length, channels and sample type.
 
     The target appears only when it is complete and may be no link to the source. `progress` draws a bar on
     standard error.
@@ -70,8 +85,8 @@ def clean_file(
             raise ValueError(f"{target} is the input as well; choose another output")
         streams = [stack.enter_context(Denoiser(reader.samplerate, **options)) for _ in range(reader.channels)]
         unfinished = stack.enter_context(_complete_or_absent(target))
-        kind = target.suffix[1:].upper()
-        subtype = reader.subtype if soundfile.check_format(kind, reader.subtype) else None
+        kind = target.suffix[1:].upper().replace("OGA", "OGG")
+        subtype = _sample_type(kind, reader)
         writer = stack.enter_context(
             soundfile.SoundFile(unfinished, "w", reader.samplerate, reader.channels, subtype, format=kind)
         )

@@ -24,6 +24,8 @@ class ModelInfo(ctypes.Structure):
     ]
 
 
+Diagnostic = ctypes.CFUNCTYPE(None, c_int, c_char_p)  # stream, text; Diagnostic() is none
+
 _FRAME = [c_void_p, c_void_p, c_uint]  # session, samples, how many
 _FUNCTIONS = {
     "Morva_SDK_GlobalInit": (c_int, [c_wchar_p, c_uint]),
@@ -43,6 +45,7 @@ _FUNCTIONS = {
     "MorvaExt_NC_SetAttenuationLimit": (c_int, [c_void_p, c_float]),
     "MorvaExt_NC_SetBypass": (c_int, [c_void_p, c_int]),
     "MorvaExt_ListModels": (c_int, [POINTER(ModelInfo), c_int]),
+    "MorvaExt_SetDiagnostics": (None, [Diagnostic]),
     "MorvaExt_Version": (c_char_p, []),
     "MorvaExt_LastError": (c_char_p, []),
 }

@@ -5,13 +5,17 @@ from __future__ import annotations
 import ctypes
 import math
 import weakref
-from typing import Any
+from typing import TYPE_CHECKING, Any
 
 import numpy as np
 import numpy.typing as npt
+import soxr
 
 from . import _engine
 from ._library import library
+
+if TYPE_CHECKING:
+    from typing_extensions import Self
 
 Sound = npt.NDArray[Any]
 
@@ -28,11 +32,29 @@ def as_float(samples: Sound) -> npt.NDArray[np.float32]:
     return samples / np.float32(32768) if samples.dtype == np.int16 else samples.astype(np.float32, copy=False)
 
 
+def as_type(samples: Sound, kind: np.dtype[Any]) -> Sound:
+    """From floating point to the type of a sound."""
+    if kind == np.int16:
+        return np.rint(samples * 32768).clip(-32768, 32767).astype(np.int16)
+    return samples.astype(kind, copy=False)
+
+
+class _RateConverter:
+    """From one rate to another, block by block; the output stands in time where the input stood."""
+
+    def __init__(self, from_rate: int, to_rate: int) -> None:
+        self._stream = soxr.ResampleStream(from_rate, to_rate, 1, dtype="float32", quality="VHQ")
+
+    def convert(self, sound: Sound, *, last: bool) -> Sound:
+        finite = np.nan_to_num(as_float(sound), nan=0.0, posinf=0.0, neginf=0.0)  # as the engine takes them
+        return self._stream.resample_chunk(finite, last=last)
+
+
 class _Session:
     """A session of the engine, closed with its owner; frames of `frame_size` samples."""
 
     def __init__(self, kind: str, rate: int, frame_ms: int, model: str | None) -> None:
-        self.rate = _engine.check_rate(rate)
+        self.rate = rate
         model = model or _engine.shipped_model(kind, rate)
         if frame_ms not in (10, 20, 30, 40):
             raise ValueError(f"frames have 10, 20, 30 or 40 ms, not {frame_ms}")
@@ -63,19 +85,22 @@ class _Session:
             raise ValueError(f"a frame has {self.frame_size} samples, not shape {given.shape}")
         return given
 
-    def __enter__(self):
+    def __enter__(self) -> Self:
         return self
 
     def __exit__(self, *_: object) -> None:
         self.close()
 
+    def __reduce__(self) -> str:
+        raise TypeError(f"a {type(self).__name__} cannot be pickled or copied: open one where it is used")
+
 
 class Denoiser(_Session):
     """Removes background noise from one channel.
 
-    `frame()` is the live call: a frame in, a frame out, `latency` samples late. `push()` and `flush()`
-    take blocks of any length and remove the latency: together they give back exactly as many samples as
-    went in, in their place. All blocks of a sound have one type.
+    `frame()` is the live call: a frame in, a frame out, `latency` samples late; the rate must be one of
+    RATES. `push()` and `flush()` take blocks of any length at any rate and remove the latency: together
+    they give back exactly as many samples as went in, in their place. All blocks of a sound have one type.
     """
 
     def __init__(
@@ -86,10 +111,18 @@ class Denoiser(_Session):
         model: str | None = None,
         attenuation_limit_db: float = math.inf,
     ) -> None:
-        super().__init__("NC", rate, frame_ms, model)
-        self.latency: int = library().MorvaExt_SessionLatencySamples(self._handle)
-        self._skip = self.latency
-        self._taken = self._given = 0
+        engine_rate = _engine.engine_rate(rate)
+        super().__init__("NC", engine_rate, frame_ms, model)
+        self.rate = int(rate)
+        self._skip: int = library().MorvaExt_SessionLatencySamples(self._handle)  # still to be left out
+        self.latency = round(self._skip * rate / engine_rate)
+        self._to_engine = self._from_engine = None
+        if rate != engine_rate:
+            self._to_engine = _RateConverter(rate, engine_rate)
+            self._from_engine = _RateConverter(engine_rate, rate)
+        self._taken = self._given = 0  # samples at the caller's rate
+        self._fed = self._released = 0  # at the engine's
+        self._kind: np.dtype[Any] = np.dtype(np.float32)
         self._waiting: Sound | None = None
         self._flushed = False
         self.set_attenuation_limit(attenuation_limit_db)
@@ -105,14 +138,17 @@ class Denoiser(_Session):
 
     def frame(self, frame: npt.ArrayLike) -> Sound:
         """Cleans one frame of `frame_size` samples, int16 or float."""
-        checked = self._checked(frame)
-        pcm = checked.dtype == np.int16
+        _engine.check_rate(self.rate)
+        return self._clean(self._checked(frame))
+
+    def _clean(self, frame: Sound) -> Sound:
+        pcm = frame.dtype == np.int16
         clean = library().Morva_NC_CleanAmbientNoiseInt16 if pcm else library().Morva_NC_CleanAmbientNoiseFloat
-        given = np.ascontiguousarray(checked, np.int16 if pcm else np.float32)
+        given = np.ascontiguousarray(frame, np.int16 if pcm else np.float32)
         out = np.empty_like(given)
         if clean(self._live(), given.ctypes.data, given.size, out.ctypes.data, out.size) != 0:
             raise _engine.failure("the engine refused a frame")
-        return out.astype(checked.dtype, copy=False)
+        return out.astype(frame.dtype, copy=False)
 
     def push(self, block: npt.ArrayLike) -> Sound:
         """Takes a block of any length and returns the cleaned samples that are ready."""
@@ -120,43 +156,56 @@ class Denoiser(_Session):
         if self._flushed:
             raise ValueError("the sound has been flushed; the next one needs a new object")
         if given.ndim != 1:
-            raise ValueError("one channel at a time")
-        if self._waiting is None:
-            self._waiting = given[:0]
-        if given.dtype != self._waiting.dtype:
-            raise TypeError(f"the sound began as {self._waiting.dtype}, this block is {given.dtype}")
+            raise ValueError(f"one channel at a time, not shape {given.shape}")
+        if self._taken == 0:
+            self._kind = given.dtype
+        if given.dtype != self._kind:
+            raise TypeError(f"the sound began as {self._kind}, this block is {given.dtype}")
         self._taken += len(given)
-        sound = np.concatenate([self._waiting, given])
-        whole = len(sound) // self.frame_size * self.frame_size
-        self._waiting = sound[whole:]
-        return self._release(sound[:whole])
+        return self._run(given, last=False)
 
     def flush(self) -> Sound:
         """Returns the rest; after it the object can only be closed."""
         self._flushed = True
-        waiting = np.empty(0, np.float32) if self._waiting is None else self._waiting
-        rest = self._taken - self._given
-        self._waiting = waiting[:0]
-        frames = -(-(rest + self._skip) // self.frame_size) if rest else 0
-        padded = np.zeros(frames * self.frame_size, waiting.dtype)
-        padded[: len(waiting)] = waiting
-        return self._release(padded)
+        rest = self._run(np.empty(0, self._kind), last=True) if self._taken > self._given else np.empty(0, self._kind)
+        self._given = self._taken
+        return rest
 
-    def _release(self, sound: Sound) -> Sound:
-        frames = [self.frame(frame) for frame in sound.reshape(-1, self.frame_size)]
+    def _run(self, sound: Sound, *, last: bool) -> Sound:
+        if self._to_engine is not None:
+            sound = self._to_engine.convert(sound, last=last)
+        self._fed += len(sound)
+        if self._waiting is not None:
+            sound = np.concatenate([self._waiting, sound])
+        if last:  # silence pushes the rest out
+            due = -(-(self._fed - self._released + self._skip) // self.frame_size) * self.frame_size
+            sound = np.concatenate([sound, np.zeros(due - len(sound), sound.dtype)])
+        whole = len(sound) // self.frame_size * self.frame_size
+        self._waiting = sound[whole:]
+        frames = [self._clean(frame) for frame in sound[:whole].reshape(-1, self.frame_size)]
         cleaned = np.concatenate([sound[:0], *frames])
         skipped = min(self._skip, len(cleaned))
         self._skip -= skipped
-        ready = cleaned[skipped : skipped + self._taken - self._given]
+        ready = cleaned[skipped : skipped + self._fed - self._released]
+        self._released += len(ready)
+        return self._out(ready, last=last)
+
+    def _out(self, ready: Sound, *, last: bool) -> Sound:
+        if self._from_engine is not None:
+            ready = self._from_engine.convert(ready, last=last)
+        due = self._taken - self._given
+        if last:  # the converters may differ from the exact length by a sample
+            ready = np.concatenate([ready, np.zeros(max(due - len(ready), 0), ready.dtype)])
+        ready = ready[:due]
         self._given += len(ready)
-        return ready
+        return ready if ready.dtype == self._kind else as_type(ready, self._kind)
 
 
 class VoiceDetector(_Session):
     """Tells per frame how likely it holds voice."""
 
     def __init__(self, rate: int, *, frame_ms: int = 10, model: str | None = None) -> None:
-        super().__init__("VAD", rate, frame_ms, model)
+        super().__init__("VAD", _engine.check_rate(rate), frame_ms, model)
 
     def frame(self, frame: npt.ArrayLike) -> float:
         """Voice score of one frame, 0..1."""
@@ -171,7 +220,7 @@ class NoiseLevelMeter(_Session):
     """Measures the background noise."""
 
     def __init__(self, rate: int, *, frame_ms: int = 10, model: str | None = None) -> None:
-        super().__init__("NoiseDB", rate, frame_ms, model)
+        super().__init__("NoiseDB", _engine.check_rate(rate), frame_ms, model)
 
     def frame(self, frame: npt.ArrayLike) -> float:
         """Noise level after one frame, in decibels re one squared unit of the 16-bit scale."""

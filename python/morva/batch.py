@@ -27,7 +27,8 @@ from tqdm import tqdm
 from ._files import clean_file
 
 JOURNAL = "morva-batch.jsonl"
-ENDINGS = (".wav", ".flac", ".ogg")
+KEPT = (".wav", ".flac", ".ogg", ".oga")
+ENDINGS = (*KEPT, ".opus", ".mp3", ".aiff", ".aif", ".aifc", ".au", ".caf", ".w64", ".rf64")  # become .wav
 
 
 @dataclass(frozen=True)
@@ -56,6 +57,8 @@ def plan(inputs: Iterable[Path], output: Path, settings: dict[str, Any]) -> list
             if source.suffix.lower() not in ENDINGS or not source.is_file():
                 continue
             target = output / source.relative_to(base)
+            if target.suffix.lower() not in KEPT:
+                target = target.with_suffix(".wav")
             if target in jobs:
                 raise ValueError(f"{source} and {jobs[target].source} would both become {target}")
             if target.resolve() == source.resolve():

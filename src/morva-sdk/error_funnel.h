@@ -4,11 +4,11 @@
 #pragma once
 
 #include <exception>
-#include <iostream>
 #include <string>
 
 #include "kernels/float_control.h"
 #include "morva-sdk/last_error.h"
+#include "utils/diagnostics.h"
 #include "utils/exception.h"
 
 namespace MORVA::MORVA_SDK {
@@ -27,10 +27,7 @@ inline constexpr FailureCodes<void*> kHandleFailures{nullptr, nullptr, nullptr};
 
 inline void printError(char const* text) noexcept {
     rememberError(text);
-    try {
-        std::cerr << text << std::endl;
-    } catch (...) {  // a stream that throws is set up by the host; there is nobody left to tell
-    }
+    UTILS::say(UTILS::Channel::error, text);
 }
 
 template <class Result, class Body>

@@ -2,8 +2,8 @@
 
 #include <algorithm>
 #include <atomic>
-#include <iostream>
 
+#include "utils/diagnostics.h"
 #include "utils/exception.h"
 
 namespace MORVA::MORVA_SDK {
@@ -99,7 +99,7 @@ MorvaSessionType MorvaInstanceT::getSessionType(MorvaSessionT* session) const {
 bool MorvaInstanceT::destroySession(MorvaSessionT* session) {
     std::lock_guard const lock(mutexForInputs_);
     if (remove(session)) return true;
-    std::cout << "WARNING SESSION ISN'T FOUND" << std::endl;
+    UTILS::say(UTILS::Channel::output, "WARNING SESSION ISN'T FOUND");
     return false;
 }
 

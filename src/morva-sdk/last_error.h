@@ -1,4 +1,4 @@
-// The last diagnostic that the C interface printed on standard error, per thread. [any thread]
+// The last failure that the C interface told, per thread. [any thread]
 #pragma once
 
 namespace MORVA::MORVA_SDK {

@@ -10,6 +10,7 @@
 #include "morva-sdk/instance.h"
 #include "morva-sdk/last_error.h"
 #include "morva-sdk/model_facts.h"
+#include "utils/diagnostics.h"
 
 namespace {
 
@@ -149,6 +150,10 @@ char const* MorvaExt_Version(void) {
 
 char const* MorvaExt_ProcessorFeatures(void) {
     return processorFeatures();
+}
+
+void MorvaExt_SetDiagnostics(MorvaExtDiagnostic take) {
+    MORVA::UTILS::takeDiagnostics(take);
 }
 
 char const* MorvaExt_LastError(void) {

@@ -85,8 +85,20 @@ MORVA_API char const* MorvaExt_Version(void);
  * avx512f". */
 MORVA_API char const* MorvaExt_ProcessorFeatures(void);
 
-/* [any thread] Text of the last failure that a call on this thread printed on standard error; empty
- * when there was none. Valid until the thread's next failure. */
+/* One diagnostic: `stream` 1 or 2, where it would be printed (standard output, standard error), and
+ * its text without the last line break; a text may have several lines. */
+typedef void (*MorvaExtDiagnostic)(int stream, char const* text);
+
+/* [any thread, with or without an engine] Hands everything that the engine would print in this
+ * process to `take`; null prints again, which is the default. `take` runs on the thread whose call
+ * has something to say, several at a time: control threads hold the engine's lock meanwhile, and an
+ * audio thread comes with a refused frame. So it calls nothing of this interface but
+ * MorvaExt_LastError, does not wait, throws nothing, and stays callable, since another thread may
+ * still be inside when this returns. A frame that succeeds says nothing. */
+MORVA_API void MorvaExt_SetDiagnostics(MorvaExtDiagnostic take);
+
+/* [any thread] Text of the last failure that a call on this thread told (on standard error, unless
+ * somebody takes it); empty when there was none. Valid until the thread's next failure. */
 MORVA_API char const* MorvaExt_LastError(void);
 
 #ifdef __cplusplus

@@ -2,15 +2,14 @@
 
 #include <algorithm>
 #include <cstdio>
-#include <iostream>
 #include <mutex>
+#include <sstream>
 
 #include "kernels/math_setup.h"
 #include "morva-sdk/cpu_support.h"
 #include "morva-sdk/error_funnel.h"
 #include "morva-sdk/handles.h"
 #include "morva-sdk/instance.h"
-#include "morva-sdk/last_error.h"
 #include "morva-sdk/vocabulary.h"
 
 namespace {
@@ -24,7 +23,7 @@ template <class Register>
 int registerModel(bool hasInput, char const* nullWarning, Register&& add) {
     return funnel(kIntFailures, [&] {
         if (!hasInput) {
-            std::cout << nullWarning << std::endl;
+            MORVA::UTILS::say(MORVA::UTILS::Channel::output, nullWarning);
             return 2;
         }
         auto& instance = engine();
@@ -78,7 +77,9 @@ float frameValue(void* handle, MorvaSessionType type, Range range, Frame&& frame
         if (auto* const session = liveSession(handle, type)) {
             float const value = frame(*session);
             if (range == Range::any || (value >= 0.0f && value <= 1.0f)) return value;
-            std::cerr << "THE CLEANING ERROR OUTPUT result " << value << std::endl;
+            std::ostringstream text;
+            text << "THE CLEANING ERROR OUTPUT result " << value;
+            MORVA::UTILS::say(MORVA::UTILS::Channel::error, text.str());
         }
         printError(kWrongSession);
         return -4.0f;
@@ -95,9 +96,7 @@ int Morva_SDK_GlobalInit(wchar_t const* workingPath, unsigned int threads) {
         char text[128];
         std::snprintf(text, sizeof text,
                       "The processor does not support %s, which this engine needs", missing);
-        rememberError(text);
-        std::fprintf(stderr, "%s\n", text);
-        std::fflush(stderr);
+        printError(text);
         return kIntFailures.engine;
     }
     return funnel(kIntFailures, [&] {

@@ -1,7 +1,8 @@
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
 
-#include <iostream>
 #include <utility>
+
+#include "utils/diagnostics.h"
 
 namespace MORVA::NOISE_CANCELLER {
 
@@ -19,7 +20,9 @@ bool NoiseCleaner_v0_0_6::mainCleaner(float const* in, std::vector<float>& out) 
 
 bool NoiseCleaner_v0_0_6::background_speaker_fix_switch(bool on) {
     model_.switchBackgroundSpeaker(on);
-    std::cout << "Parameter env_enable_background_speaker_fix set to: " << on << std::endl;
+    UTILS::say(UTILS::Channel::output,
+               on ? "Parameter env_enable_background_speaker_fix set to: 1"
+                  : "Parameter env_enable_background_speaker_fix set to: 0");
     return true;
 }
 

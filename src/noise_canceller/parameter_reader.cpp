@@ -4,8 +4,9 @@
 #include <stdlib.h>
 
 #include <algorithm>
-#include <iostream>
 #include <limits>
+
+#include "utils/diagnostics.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {
@@ -77,7 +78,7 @@ bool ParameterReader::isOn(char const* name, bool byDefault) const {
 
 float checkedOrDefault(float value, bool inRange, char const* warning, float byDefault) {
     if (inRange) return value;
-    std::cout << warning << std::endl;
+    UTILS::say(UTILS::Channel::output, warning);
     return byDefault;
 }
 

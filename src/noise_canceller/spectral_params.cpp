@@ -1,8 +1,8 @@
 #include "noise_canceller/spectral_params.h"
 
-#include <iostream>
 #include <string>
 
+#include "utils/diagnostics.h"
 #include "utils/exception.h"
 #include "weights/weight.h"
 
@@ -80,7 +80,8 @@ void SpectralParams::readTunables(ParameterReader const& reader, Generation cons
     volumeUp = reader.isOn("VOLUME_UP", false);
     if (volumeUp) {
         enableClipFix = true;
-        std::cout << "WARNING: Enabled Clip fix, because VolumeUp is Enabled" << std::endl;
+        UTILS::say(UTILS::Channel::output,
+                   "WARNING: Enabled Clip fix, because VolumeUp is Enabled");
     }
     enableThreshCut = reader.isOn("ENABLE_THRESH_CUT", false);
     volumeUpPercent = reader.real("VOLUME_UP_PERCENT", 0.0f);

@@ -2,10 +2,10 @@
 
 #include <algorithm>
 #include <cmath>
-#include <iostream>
 #include <utility>
 
 #include "kernels/vector_math.h"
+#include "utils/diagnostics.h"
 
 namespace MORVA::NOISE_CANCELLER {
 namespace {
@@ -24,7 +24,7 @@ VadCleaner_v0_0_1::VadCleaner_v0_0_1(ModelEnvironment model, std::size_t frameMs
       spectrum_(params_.bins),
       powers_(params_.bins) {
     if (std::ranges::find(kFrameDurationsMs, frameMs) == std::end(kFrameDurationsMs)) {
-        std::cout << "ERROR FRAMEDURATIONS\n" << std::flush;
+        UTILS::say(UTILS::Channel::output, "ERROR FRAMEDURATIONS");
     }
     resetSession();
 }

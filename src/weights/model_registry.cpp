@@ -1,8 +1,8 @@
 #include "weights/model_registry.h"
 
-#include <iostream>
 #include <tuple>
 
+#include "utils/diagnostics.h"
 #include "utils/exception.h"
 #include "weights/control_file.h"
 
@@ -14,6 +14,12 @@ ModelRegistry const* existing = nullptr;
 
 // Identifiers shorter than this are not entered.
 constexpr std::size_t kShortestIdentifier = 2;
+
+// All that is said here goes to standard output.
+template <class Text>
+void say(Text const& text, char const* end = "\n") {
+    UTILS::say(UTILS::Channel::output, text, end);
+}
 
 std::string multibyte(UTILS::Path const& path) {
     return path.convertWString2MBString(path.str());
@@ -54,7 +60,7 @@ UTILS::Path ModelRegistry::resolve(wchar_t const* path) const {
 bool ModelRegistry::isFreeName(char const* modelName) const {
     bool const named = modelName != nullptr && *modelName != '\0';
     if (named && !names_.contains(modelName)) return true;
-    std::cout << "WARNING model name exists or empty, please insert different name" << std::flush;
+    say("WARNING model name exists or empty, please insert different name", "");
     return false;
 }
 
@@ -67,7 +73,7 @@ std::string ModelRegistry::mvwUniqueIdGenerator(std::shared_ptr<Weight> const& w
     auto const stamp = values.find<std::string>("TimeStamp");
     // A rate below 1 kHz would make the divisor 0 or negative.
     if (!version || !rate || !length || !model || !stamp || *rate < 1000) {
-        std::cout << "ERROR INVALID WEIGHT" << std::endl;
+        say("ERROR INVALID WEIGHT");
         return {};
     }
     int const kilohertz = *rate / 1000;
@@ -79,7 +85,7 @@ ModelRegistry::WeightAndIdentifier ModelRegistry::checkWeight(
     std::shared_ptr<Weight> weight) const {
     auto identifier = mvwUniqueIdGenerator(weight);
     if (identifier.size() < kShortestIdentifier) {
-        std::cout << "ERROR WEIGHT NAME ISNT LONG ENOUGHT\n" << std::flush;
+        say("ERROR WEIGHT NAME ISNT LONG ENOUGHT");
         return {std::move(weight), ""};
     }
     if (auto const known = identities_.find(identifier); known != identities_.end()) {
@@ -92,7 +98,7 @@ ModelRegistry::WeightAndIdentifier ModelRegistry::readAndCheckWeight(
     UTILS::Path const& path) const {
     auto weight = std::make_shared<Weight>();
     if (!weight->read(path)) {
-        std::cout << "WARNING weight isn't loaded \n weigth file: " << multibyte(path) << std::endl;
+        say("WARNING weight isn't loaded \n weigth file: " + multibyte(path));
         return {nullptr, ""};
     }
     return checkWeight(std::move(weight));
@@ -102,7 +108,7 @@ ModelRegistry::WeightAndIdentifier ModelRegistry::readAndCheckWeight(char const*
                                                                      std::size_t size) const {
     auto weight = std::make_shared<Weight>();
     if (!weight->read(data, size)) {
-        std::cout << "WARNING weight isn't loaded \n" << std::flush;
+        say("WARNING weight isn't loaded ");
         return {nullptr, ""};
     }
     return checkWeight(std::move(weight));
@@ -110,7 +116,7 @@ ModelRegistry::WeightAndIdentifier ModelRegistry::readAndCheckWeight(char const*
 
 bool ModelRegistry::addModelEnvironment(ModelEnvironment const& environment, char const* key,
                                         char const* value) {
-    std::cout << "ENVIRONMENT KEY-\"" << key << "\" VALUE-\"" << value << "\"" << std::endl;
+    say(std::string("ENVIRONMENT KEY-\"") + key + "\" VALUE-\"" + value + "\"");
     auto const added =
         environment->second.insert<std::string>(key, value, CONTAINERS::InsertMode::replace);
     return added != nullptr;
@@ -123,14 +129,13 @@ bool ModelRegistry::applyControlFile(UTILS::Path const& path, ModelEnvironment c
     if (!UTILS::readControlFile(entries, path)) return true;  // nothing is loaded
     for (auto const& [key, value] : entries) {
         if (key == "CONTROLFILE") {
-            std::cout << "WARNING there are CONTROLFILE parameter inside of controlFile, skipped"
-                      << std::endl;
+            say("WARNING there are CONTROLFILE parameter inside of controlFile, skipped");
         } else if (key == "WEIGHT") {
             if (environment->first) {
-                std::cout << "WARNING multiple weight including, weight exists." << std::endl;
+                say("WARNING multiple weight including, weight exists.");
                 continue;
             }
-            std::cout << "WEIGHT " << value << std::endl;
+            say("WEIGHT " + value);
             auto const weightPath = resolve(path.convertMBString2WString(value).c_str());
             std::tie(environment->first, identifier) = readAndCheckWeight(weightPath);
         } else if (!addModelEnvironment(environment, key.c_str(), value.c_str())) {
@@ -143,8 +148,7 @@ bool ModelRegistry::applyControlFile(UTILS::Path const& path, ModelEnvironment c
 bool ModelRegistry::enterModel(ModelEnvironment const& environment, std::string const& identifier,
                                char const* modelName) {
     if (!environment->first) {
-        std::cout << "Warning Weight name isn't included or weight has beeen included before \n"
-                  << std::flush;
+        say("Warning Weight name isn't included or weight has beeen included before ");
         return false;
     }
     // Nodes are made before the registry changes, so that a failed allocation leaves it as it was.
@@ -167,7 +171,7 @@ bool ModelRegistry::addWeightWithControlFile(wchar_t const* path, char const* mo
     if (extension == L"cfg") {
         if (!applyControlFile(fullPath, environment, identifier)) return false;
     } else if (extension == L"mvw") {
-        std::cout << "WEIGHT " << multibyte(fullPath) << std::endl;
+        say("WEIGHT " + multibyte(fullPath));
         std::tie(environment->first, identifier) = readAndCheckWeight(fullPath);
     }
     return enterModel(environment, identifier, modelName);

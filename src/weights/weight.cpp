@@ -3,8 +3,8 @@
 #include <algorithm>
 #include <array>
 #include <cstdint>
-#include <iostream>
 
+#include "utils/diagnostics.h"
 #include "utils/exception.h"
 #include "weights/value_decoder.h"
 
@@ -60,7 +60,9 @@ bool Weight::readRecords(Serializer& source) {
         // the bytes that follow are taken as the next record.
         if (reader.readNumber(typeCode)) read_value(name, typeCode, source);
     }
-    if (values_.empty()) std::cout << "Warning Nothing added from weight" << std::endl;
+    if (values_.empty()) {
+        UTILS::say(UTILS::Channel::output, "Warning Nothing added from weight");
+    }
     message_.clear();
     return true;
 }

@@ -185,3 +185,20 @@ TEST(ExtensionTexts, OfTheLastErrorTheVersionAndTheProcessor) {
     EXPECT_THAT(MorvaExt_Version(), ::testing::MatchesRegex("[0-9]+\\.[0-9]+\\.[0-9]+"));
     EXPECT_THAT(MorvaExt_ProcessorFeatures(), ::testing::HasSubstr("avx2"));
 }
+
+namespace {
+std::vector<std::string> taken;
+}
+
+TEST(ExtensionTexts, GoToWhoTakesThemAndArePrintedAgainAfterwards) {
+    auto const talk = [] {
+        return Morva_SDK_SetModel(nullptr, "m") + Morva_NC_CloseSession(&taken);
+    };
+    MorvaExt_SetDiagnostics([](int stream, char const* text) {
+        taken.push_back(std::to_string(stream) + text + "\n");
+    });
+    EXPECT_THAT(observe(talk), gives(2 - 3));
+    MorvaExt_SetDiagnostics(nullptr);
+    auto const printed = observe(talk);
+    EXPECT_THAT(taken, ::testing::ElementsAre("1" + printed.out, "2" + printed.err));
+}

@@ -1,10 +1,14 @@
 """Arrays, streams, files and folders give what the command line gives."""
 
+import copy
 import json
 import os
 import signal
 import time
+import pickle
+import re
 from functools import partial
+from importlib.resources import files
 
 import numpy as np
 import pytest
@@ -96,7 +100,7 @@ def test_files(command, speech, write, tmp_path):
     np.testing.assert_allclose(ours.read(), wanted.read(), atol=2**-22)
 
     before = {file: file.stat().st_mtime_ns for file in tmp_path.iterdir()}
-    for odd in (write("odd.wav", speech[:1000], 22050), tmp_path / "missing.wav"):
+    for odd in (write("odd.wav", speech[:1000], 400000), tmp_path / "missing.wav"):
         with pytest.raises((soundfile.LibsndfileError, ValueError)):
             morva.denoise_file(odd, tmp_path / "ours.flac")
     (tmp_path / "odd.wav").unlink()
@@ -108,11 +112,74 @@ def test_files(command, speech, write, tmp_path):
     assert {file: file.stat().st_mtime_ns for file in tmp_path.iterdir()} == before, "what fails leaves nothing"
 
 
+@pytest.mark.parametrize("rate", [4000, 11025, 22050, 192000])
+def test_rates_that_the_engine_does_not_take(command, speech, write, tmp_path, rate):
+    sound = np.convolve(speech[: 3 * rate : 2], np.ones(9) / 9, "same")  # little above half the band
+    path = write("in.wav", sound, rate)
+    clean = morva.denoise(sound, rate)
+    if rate <= 96000:
+        command("denoise", "-q", path, tmp_path / "out.wav")
+        wanted, _ = soundfile.read(tmp_path / "out.wav", dtype="float32")
+        assert np.corrcoef(clean, wanted)[0, 1] > 0.98, "the converters differ a little"
+    morva.denoise_file(path, tmp_path / "ours.wav")
+    np.testing.assert_allclose(soundfile.read(tmp_path / "ours.wav", dtype="float32")[0], clean, atol=1e-6)
+    for given, tolerance in ((sound, 1e-6), (np.rint(sound * 32768).astype(np.int16), 1e-3)):  # which rounds it
+        with morva.Denoiser(rate) as stream:
+            out = np.concatenate([*map(stream.push, np.array_split(given, 77)), stream.flush()])
+            assert out.dtype == given.dtype
+            np.testing.assert_allclose(out / (32768 if out.dtype == np.int16 else 1), clean, atol=tolerance)
+            with pytest.raises(ValueError, match=str(rate)):
+                stream.frame(np.zeros(stream.frame_size))
+    for measure in (morva.voice, morva.noise_level):
+        assert len(measure(sound, rate)) == pytest.approx(len(sound) / rate * 100, abs=1)
+
+
+def test_mp3_in_wav_out_and_types_that_hold_the_source(speech, write, tmp_path):
+    soundfile.write(tmp_path / "in.mp3", speech[:96000], 48000, format="MP3")
+    for source, target, subtype in (
+        ("in.mp3", "out.wav", "PCM_16"),
+        (write("in.wav", speech[:4800], 48000, "FLOAT"), "out.flac", "PCM_24"),
+        (write("u8.wav", speech[:4800], 48000, "PCM_U8"), "out.ogg", "VORBIS"),
+    ):
+        morva.denoise_file(tmp_path / source, tmp_path / target)
+        assert soundfile.info(tmp_path / target).subtype == subtype
+    assert run(tmp_path / "in.mp3", "-o", tmp_path / "folder") == 0
+    assert soundfile.info(tmp_path / "folder/in.wav").frames == soundfile.info(tmp_path / "in.mp3").frames
+
+
+def test_shapes_that_are_no_sound():
+    for shape in ((2, 480), (480, 17), (480, 0), (4, 4, 4), ()):
+        for call in (morva.denoise, morva.voice, morva.noise_level):
+            with pytest.raises(ValueError, match=re.escape(f"{shape}")):
+                call(np.zeros(shape), 16000)
+    assert morva.denoise(np.zeros((0, 2)), 16000).shape == (0, 2)
+
+
+def test_what_the_engine_says_goes_to_the_log_alone(capfd, caplog, tmp_path):
+    (tmp_path / "bad.mvw").write_bytes(b"no weight")
+    with caplog.at_level("DEBUG", "morva"), pytest.raises(morva.EngineError):
+        morva.Denoiser(16000, model=str(tmp_path / "bad.mvw"))
+    assert "Warning Nothing added from weight" in caplog.text and "no Weight version" in caplog.text
+    assert capfd.readouterr() == ("", "")
+
+
+def test_sessions_are_neither_pickled_nor_copied():
+    for refuse in (pickle.dumps, copy.copy, copy.deepcopy):
+        with morva.VoiceDetector(16000) as stream, pytest.raises(TypeError, match="VoiceDetector cannot be pickled"):
+            refuse(stream)
+
+
+def test_the_licences_go_along():
+    folder = files("morva") / "_bundled/licenses"
+    assert {"LICENSE", "LICENSE.onemkl"} <= {each.name for each in folder.iterdir()}
+
+
 def test_errors_say_why(tmp_path):
     bad = tmp_path / "bad.mvw"
     bad.write_bytes(b"no weight")
     for error, text, options in (
-        (ValueError, "22050", {"rate": 22050}),
+        (ValueError, "400000", {"rate": 400000}),
+        (ValueError, "16000.5", {"rate": 16000.5}),
         (ValueError, "15", {"rate": 16000, "frame_ms": 15}),
         (FileNotFoundError, "nothing.mvw", {"rate": 16000, "model": "nothing.mvw"}),
         (morva.EngineError, "bad.mvw", {"rate": 16000, "model": str(bad)}),

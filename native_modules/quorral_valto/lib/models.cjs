@@ -3,6 +3,7 @@
 
 const fs = require('node:fs');
 const path = require('node:path');
+const { createDiagnostics } = require('./diagnostics.cjs');
 const { ValtoError } = require('./errors.cjs');
 
 // Start-up codes from here down name the weight file that could not be registered.
@@ -44,8 +45,16 @@ function createModelFunctions({ raw, sessions, directory }) {
     }
   };
 
+  const takeDiagnostics = createDiagnostics(sessions);
+  let silenced = false;
+
   return {
-    initialize() {
+    initialize({ onDiagnostic } = {}) {
+      if (onDiagnostic != null && typeof onDiagnostic !== 'function') {
+        throw new ValtoError('ERR_VALTO_ARGUMENT', 'onDiagnostic must be a function or null');
+      }
+      if (!silenced || onDiagnostic !== undefined) takeDiagnostics(onDiagnostic ?? null);
+      silenced = true;
       const code = sessions.initialize();
       if (code !== 0) throw startupError(code, directory, sessions.weightFiles);
     },

@@ -2,6 +2,7 @@
 // Sessions for audio that is already in script. Everything is checked here, so that a frame call
 // reaches the engine only with what it takes; the engine would print a line for anything else.
 
+const { Blocks } = require('./blocks.cjs');
 const { ValtoError } = require('./errors.cjs');
 
 const SAMPLE_RATES = Object.freeze([8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000]);
@@ -30,7 +31,17 @@ function checkOptions(options) {
   return { sampleRate, frameMs, model };
 }
 
-function openError(status, { sampleRate, frameMs, model }) {
+function checkVoice(voice) {
+  if (typeof voice === 'boolean' || typeof voice === 'string') return voice;
+  throw new ValtoError('ERR_VALTO_ARGUMENT', 'voice must be a boolean or the name of a model');
+}
+
+function checkLimit(limitDb) {
+  if (typeof limitDb === 'number' && limitDb >= 0) return limitDb;
+  throw new ValtoError('ERR_VALTO_ARGUMENT', 'attenuationLimit is 0 or more decibels, or Infinity');
+}
+
+function openError(status, { sampleRate, frameMs, model }, reason) {
   if (status === 1) {
     return new ValtoError(
       'ERR_VALTO_NOT_INITIALIZED',
@@ -38,20 +49,27 @@ function openError(status, { sampleRate, frameMs, model }) {
     );
   }
   if (status === 2) {
-    return new ValtoError('ERR_VALTO_MODEL', `No such model: ${JSON.stringify(model)}`);
+    const text = model === null ? 'There is no model' : `No such model: ${JSON.stringify(model)}`;
+    return new ValtoError('ERR_VALTO_MODEL', text);
   }
   return new ValtoError(
     'ERR_VALTO_SESSION',
     `The engine refuses a session at ${sampleRate} Hz, ${frameMs} ms` +
-      (model === null ? ' with the chosen model' : ` with the model ${JSON.stringify(model)}`),
+      (model === null ? ' with the chosen model' : ` with the model ${JSON.stringify(model)}`) +
+      `: ${reason}`,
   );
 }
 
+// By tag, not by instanceof: arrays may come from another realm.
+const kindOf = (samples) => samples?.[Symbol.toStringTag];
+
+function checkSamples(samples, what) {
+  if (kindOf(samples) === 'Int16Array' || kindOf(samples) === 'Float32Array') return;
+  throw new ValtoError('ERR_VALTO_ARGUMENT', `The ${what} must be an Int16Array or a Float32Array`);
+}
+
 function checkFrame(frame, frameSize, what) {
-  // By tag, not by instanceof: frames may come from another realm.
-  if (frame?.[Symbol.toStringTag] !== 'Int16Array') {
-    throw new ValtoError('ERR_VALTO_ARGUMENT', `The ${what} must be an Int16Array`);
-  }
+  checkSamples(frame, what);
   if (frame.length !== frameSize) {
     throw new ValtoError(
       'ERR_VALTO_FRAME_SIZE',
@@ -71,7 +89,7 @@ function createSessionClasses(native) {
     constructor(open, options) {
       const checked = checkOptions(options);
       const opened = open(checked.sampleRate, checked.frameMs, checked.model);
-      if (typeof opened === 'number') throw openError(opened, checked);
+      if (typeof opened === 'number') throw openError(opened, checked, native.lastError());
       this.#handle = opened;
       this.sampleRate = checked.sampleRate;
       this.frameMs = checked.frameMs;
@@ -106,19 +124,98 @@ function createSessionClasses(native) {
     });
 
   class NoiseCanceller extends Session {
+    #limit = Infinity;
+    #bypass = false;
+    #blocks = null;
+    #flushed = false;
+
     constructor(options) {
       super(native.openNc, options);
       this.latency = native.latency(handleOf(this));
+      try {
+        const { attenuationLimit = Infinity, bypass = false, voice = false } = options;
+        this.attenuationLimit = attenuationLimit;
+        this.bypass = bypass;
+        this.#hearVoice(checkVoice(voice));
+      } catch (error) {
+        this.close();
+        throw error;
+      }
       Object.freeze(this);
+    }
+
+    #hearVoice(voice) {
+      if (voice === false) return;
+      const model = voice === true ? null : voice;
+      const status = native.enableVoice(handleOf(this), model);
+      if (status !== 0) throw openError(status, { ...this, model }, native.lastError());
+    }
+
+    get attenuationLimit() {
+      return this.#limit;
+    }
+
+    set attenuationLimit(limitDb) {
+      native.setAttenuationLimit(handleOf(this), checkLimit(limitDb));
+      this.#limit = limitDb;
+    }
+
+    get bypass() {
+      return this.#bypass;
+    }
+
+    set bypass(on) {
+      native.setBypass(handleOf(this), Boolean(on));
+      this.#bypass = Boolean(on);
+    }
+
+    get voiceScore() {
+      return native.voiceScore(handleOf(this));
+    }
+
+    get noiseLevel() {
+      return native.noiseLevel(handleOf(this));
     }
 
     process(frame, output = frame) {
       const handle = handleOf(this);
       checkFrame(frame, this.frameSize, 'frame');
-      if (output !== frame) checkFrame(output, this.frameSize, 'output');
+      if (output !== frame) {
+        checkFrame(output, this.frameSize, 'output');
+        if (kindOf(output) !== kindOf(frame)) {
+          throw new ValtoError('ERR_VALTO_ARGUMENT', 'Frame and output must be of one kind');
+        }
+      }
       const code = native.processNc(handle, frame, output);
       if (code !== 0) throw failed(code);
       return output;
+    }
+
+    push(block) {
+      handleOf(this);
+      checkSamples(block, 'block');
+      if (this.#flushed) {
+        throw new ValtoError('ERR_VALTO_CLOSED', 'The sound was flushed; the next needs a session');
+      }
+      this.#blocks ??= new Blocks(
+        kindOf(block) === 'Int16Array'
+          ? new Int16Array(this.frameSize)
+          : new Float32Array(this.frameSize),
+        this.latency,
+        (frame) => this.process(frame),
+      );
+      if (!this.#blocks.takes(block)) {
+        throw new ValtoError('ERR_VALTO_ARGUMENT', 'The blocks of a sound must be of one kind');
+      }
+      return this.#blocks.push(block);
+    }
+
+    flush() {
+      handleOf(this);
+      this.#flushed = true;
+      const blocks = this.#blocks;
+      this.#blocks = null;
+      return blocks?.flush() ?? new Int16Array(0);
     }
   }
 

@@ -106,7 +106,17 @@ if (checksSources) {
   say('publint');
   run(bin('publint'), ['run', '--strict', tarball]);
   say('types');
-  const lib = ['--target', 'es2022', '--lib', 'es2022,dom', '--types', ''];
+  const roots = path.join(root, 'node_modules/@types');
+  const lib = [
+    '--target',
+    'es2022',
+    '--lib',
+    'es2022,dom',
+    '--typeRoots',
+    roots,
+    '--types',
+    'node',
+  ];
   const strict = ['--strict', '--noUncheckedIndexedAccess', '--exactOptionalPropertyTypes'];
   const options = ['--noEmit', '--module', 'node16', ...lib, ...strict];
   run(bin('tsc'), [...options, path.join(app, MODULE, 'test/types/usage.mts')]);

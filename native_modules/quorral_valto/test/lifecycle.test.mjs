@@ -39,7 +39,12 @@ for (const [name, [script, stdout]] of Object.entries(endings)) {
 
 test('a process ends while audio threads run', async () => {
   const ends = [0, 5, 40, 150].map((wait) => `setTimeout(() => process.exit(0), ${wait});`);
-  for (const end of [...ends, 'setTimeout(() => {}, 30);']) {
+  const listening = 'require(PACKAGE).initialize({ onDiagnostic: () => {} });';
+  for (const end of [
+    ...ends,
+    'setTimeout(() => {}, 30);',
+    ...ends.map((each) => listening + each),
+  ]) {
     const { stderr } = await run(`
       loadRaw()._initialize(); const probe = loadProbe();
       probe.runForever(BINARY); probe.runForever(BINARY); ${end}`);
@@ -50,7 +55,7 @@ test('a process ends while audio threads run', async () => {
 const BUSY_WORKER = `
   const valto = require(PACKAGE);
   const probe = loadProbe();
-  valto.initialize();
+  valto.initialize({ onDiagnostic: () => {} });
   const canceller = new valto.NoiseCanceller({ sampleRate: 16000, frameMs: 10 });
   const frame = new Int16Array(160).fill(1000);
   probe.keep(() => {});

@@ -56,7 +56,7 @@ async function reports(folders, use, prelude = '') {
 test('start-up: install paths, weight files that cannot be read or used', async (t) => {
   const within = (folder, file = '') => path.join(folder, 'prebuilds/linux-x64', file);
   const failed = (code) => `Failed to setup Valto module, error code: ${code}`;
-  const cases = []; // [folder, printed lines, what initialize() throws, models]
+  const cases = []; // [folder, lines told, what initialize() throws, models]
   const fine = ['with space', 'J\u00fcrgen \u4f60\u597d', 'a%20b#c?d'];
   for (const name of [...fine, Array(3).fill('d'.repeat(200)).join('/')]) {
     cases.push([copyPackage(t, name), [], null, NC_MODELS]);
@@ -75,15 +75,22 @@ test('start-up: install paths, weight files that cannot be read or used', async 
   }
   fails(copyPackage(t, '\u{1f680}'), 'ERR_VALTO_PATH', 0);
   const use = `async ({ initialize, getNcModels, raw }) => {
-    const attempt = (start) => { try { start(); return null; } catch (error) { return error; } };
-    const [first, second, third] = [initialize, initialize, raw._initialize].map(attempt);
+    const told = [];
+    const onDiagnostic = (text, stream) => stream === 'stdout' && told.push(text);
+    const attempt = (start) => {
+      try { start({ onDiagnostic }); return null; } catch (error) { return error; }
+    };
+    const start = () => raw._initialize();
+    const [first, second, third] = [initialize, initialize, start].map(attempt);
+    const models = await getNcModels();
+    await sleep(0);
     if (first?.message !== second?.message) throw new Error('a second attempt names another cause');
-    return [first?.code, first?.nativeCode, third.message, await getNcModels()];
+    return [first?.code, first?.nativeCode, third.message, models, told.filter((line) => /^Fail/.test(line))];
   }`;
-  const expected = cases.flatMap(([, lines, error, models]) => {
+  const expected = cases.map(([, printed, error, models]) => {
     const { code = null, nativeCode = null } = error ?? {};
-    const said = [code, nativeCode, failed(-4), models];
-    return [...lines, 'Faild to initialize Morva SDK', JSON.stringify(said)];
+    const lines = [...printed, 'Faild to initialize Morva SDK'];
+    return JSON.stringify([code, nativeCode, failed(-4), models, lines]);
   });
   const folders = cases.map(([folder]) => folder);
   assert.deepEqual(await reports(folders, use), expected);

@@ -1,8 +1,9 @@
 // Sessions for audio in script: sizes, errors, choice of model, memory.
 import assert from 'node:assert/strict';
+import { Readable } from 'node:stream';
 import { test } from 'node:test';
 import vm from 'node:vm';
-import { noise } from './support/audio.mjs';
+import { noise, randomSource } from './support/audio.mjs';
 import { NC_MODELS, require, run, underSanitizer } from './support/package.mjs';
 
 const valto = require('quorral_valto');
@@ -32,6 +33,12 @@ test('options that are none', () => {
     ERR_VALTO_MODEL: each('model', ['no such']),
   };
   refuse(wrong, ...openings);
+  const limits = each('attenuationLimit', [-1, NaN, '6']);
+  const wrongHere = {
+    ERR_VALTO_ARGUMENT: [...limits, ...each('voice', [1])],
+    ERR_VALTO_MODEL: each('voice', ['no such', NC_MODELS[0]]),
+  };
+  refuse(wrongHere, openings[0]);
   for (const Session of KINDS) assert.throws(() => Session(OPTIONS), TypeError);
 });
 
@@ -72,7 +79,7 @@ test('frames that are none', () => {
   const detached = new Int16Array(160);
   structuredClone(detached.buffer, { transfer: [detached.buffer] });
   const liar = { [Symbol.toStringTag]: 'Int16Array', length: 160 };
-  const others = [null, 5, [], new Float32Array(160), new DataView(frame.buffer), { length: 160 }];
+  const others = [null, 5, [], new Float64Array(160), new DataView(frame.buffer), { length: 160 }];
   const wrong = {
     ERR_VALTO_FRAME_SIZE: [...[0, 159, 161, 480].map((size) => new Int16Array(size)), detached],
     ERR_VALTO_ARGUMENT: others,
@@ -81,7 +88,87 @@ test('frames that are none', () => {
   };
   const each = [canceller, detector].map((session) => (other) => session.process(other));
   refuse(wrong, (other) => canceller.process(frame, other), ...each);
+  const mixed = { ERR_VALTO_ARGUMENT: [new Float32Array(160)] };
+  refuse(mixed, (other) => canceller.process(frame, other));
   assert.equal(canceller.process(frame), frame, 'none of this has disturbed the session');
+});
+
+const floats = (samples) => Float32Array.from(samples, (sample) => sample / 32768);
+const near = (a, b, steps) => {
+  assert.equal(a.length, b.length);
+  a.forEach((sample, i) => {
+    assert.ok(Math.abs(sample - b[i]) <= steps / 32768, `${sample} for ${b[i]} at ${i}`);
+  });
+};
+
+/** What a session makes of a sound, in its place and as long. */
+function cleaned(sound, options) {
+  const session = new NoiseCanceller({ ...OPTIONS, ...options });
+  const padded = new sound.constructor(
+    Math.ceil((sound.length + session.latency) / session.frameSize) * session.frameSize,
+  );
+  padded.set(sound);
+  for (let at = 0; at < padded.length; at += session.frameSize) {
+    session.process(padded.subarray(at, at + session.frameSize));
+  }
+  return padded.subarray(session.latency, session.latency + sound.length);
+}
+
+test('floating point, limit, bypass and meters', () => {
+  const sound = noise(16000, 5);
+  near(cleaned(floats(sound)), floats(cleaned(sound)), 1);
+  for (const open of [{ attenuationLimit: 0 }, { bypass: true }]) {
+    near(cleaned(sound, open).subarray(320), sound.subarray(320), 32768);
+  }
+  const session = new NoiseCanceller({ ...OPTIONS, voice: true });
+  assert.deepEqual(
+    [session.voiceScore, session.attenuationLimit, session.bypass],
+    [NaN, Infinity, false],
+  );
+  session.attenuationLimit = 0; // later than the constructor
+  session.bypass = true;
+  for (let at = 0; at < sound.length; at += 160) session.process(sound.slice(at, at + 160));
+  const detector = new VoiceActivityDetector(OPTIONS);
+  const scores = [sound, floats(sound)].map((kind) => detector.process(kind.slice(0, 160)));
+  for (const score of [session.voiceScore, ...scores])
+    assert.ok(score >= 0 && score <= 1, `${score}`);
+  assert.ok(session.noiseLevel < 20, 'at that limit nothing is removed');
+});
+
+test('blocks of any length, and streams of any chunks, give what frames give', async () => {
+  const random = randomSource(3);
+  const pieces = (samples, longest) => {
+    const all = [];
+    for (let at = 0; at < samples.length; ) {
+      const end = at + Math.floor(random() * (longest + 1));
+      all.push(samples.subarray(at, end));
+      at = end;
+    }
+    return all;
+  };
+  const left = noise(7777, 8);
+  const right = noise(7777, 9, 30000);
+  for (const sampleRate of [16000, 44100]) {
+    const wanted = [left, right].map((sound) => cleaned(sound, { sampleRate }));
+    for (const sound of [left, floats(left), left.subarray(0, 1), left.subarray(0, 0)]) {
+      const session = new NoiseCanceller({ sampleRate, frameMs: 10 });
+      const parts = [...pieces(sound, 900).map((block) => session.push(block)), session.flush()];
+      const got = new sound.constructor(parts.flatMap((part) => Array.from(part)));
+      const whole = cleaned(sound, { sampleRate });
+      same(got, whole);
+      assert.throws(() => session.push(sound), coded('ERR_VALTO_CLOSED'));
+    }
+    const stereo = new Int16Array(2 * 7777).map((_, i) => [left, right][i % 2][i >> 1]);
+    const bytes = new Uint8Array(stereo.buffer);
+    const through = new valto.NoiseCancellerStream({ sampleRate, channels: 2 });
+    const out = Buffer.concat(await Readable.from(pieces(bytes, 999)).pipe(through).toArray());
+    const both = new Int16Array(new Uint8Array(out).buffer);
+    same(
+      both,
+      stereo.map((_, i) => wanted[i % 2][i >> 1]),
+    );
+    assert.ok(through.cancellers.every((session) => session.closed));
+  }
 });
 
 test('a closed session', () => {
@@ -100,7 +187,7 @@ test('the model option is for one session, in its thread, and leaves the choice 
   const each = 60;
   const { stdout } = await run(`
     const { initialize, raw, NoiseCanceller } = require(PACKAGE);
-    initialize();
+    initialize({ onDiagnostic: (text) => console.log(text) });
     const open = (model) => {
       try { new NoiseCanceller({ sampleRate: 48000, frameMs: 10, model }).close(); } catch {}
     };

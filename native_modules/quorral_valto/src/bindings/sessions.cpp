@@ -3,6 +3,7 @@
 
 #include <array>
 #include <cstdint>
+#include <limits>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -11,6 +12,7 @@
 
 #include "morva-sdk/morva-ext.h"
 #include "native/node_api/optional.h"
+#include "native_modules/quorral_valto/src/bindings/diagnostics.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
@@ -18,7 +20,8 @@
 namespace quorral {
 namespace {
 
-// Codes of the engine for a handle that is none.
+// Codes of the engine for a frame and for a handle that is none.
+constexpr int kRefusedFrame = 1;
 constexpr int kNoNcSession = 2;
 constexpr double kNoVadSession = -4.0;
 
@@ -104,12 +107,19 @@ Session* SessionOf(napi_env env, napi_value value) {
     return static_cast<Session*>(data);
 }
 
+// The samples of a frame. No data for what is neither kind of array; a detached one has none
+// either.
 struct Samples {
-    std::int16_t* data = nullptr;
+    napi_typedarray_type type = napi_int16_array;
+    void* data = nullptr;
     unsigned count = 0;
+
+    template <class Sample>
+    Sample* As() const {
+        return static_cast<Sample*>(data);
+    }
 };
 
-// Empty for anything but an Int16Array; a detached one has no samples either.
 Samples SamplesOf(napi_env env, napi_value value) {
     bool isTyped = false;
     napi_typedarray_type type{};
@@ -117,10 +127,10 @@ Samples SamplesOf(napi_env env, napi_value value) {
     void* data = nullptr;
     if (napi_is_typedarray(env, value, &isTyped) != napi_ok || !isTyped ||
         napi_get_typedarray_info(env, value, &type, &length, &data, nullptr, nullptr) != napi_ok ||
-        type != napi_int16_array) {
+        (type != napi_int16_array && type != napi_float32_array)) {
         return {};
     }
-    return {.data = static_cast<std::int16_t*>(data), .count = static_cast<unsigned>(length)};
+    return {.type = type, .data = data, .count = static_cast<unsigned>(length)};
 }
 
 napi_value Number(napi_env env, double number) {
@@ -188,7 +198,13 @@ napi_value ProcessNc(napi_env env, napi_callback_info info) {
     if (session == nullptr || !session->Is(ValtoNCReset)) return Code(env, kNoNcSession);
     const Samples from = SamplesOf(env, input);
     const Samples to = SamplesOf(env, output);
-    return Code(env, ValtoNCProcess(session->handle, from.data, from.count, to.data, to.count));
+    if (from.type != to.type) return Code(env, kRefusedFrame);
+    if (from.type == napi_float32_array) {
+        return Code(env, Morva_NC_CleanAmbientNoiseFloat(session->handle, from.As<float>(),
+                                                         from.count, to.As<float>(), to.count));
+    }
+    return Code(env, ValtoNCProcess(session->handle, from.As<short>(), from.count, to.As<short>(),
+                                    to.count));
 }
 
 napi_value ProcessVad(napi_env env, napi_callback_info info) {
@@ -196,14 +212,64 @@ napi_value ProcessVad(napi_env env, napi_callback_info info) {
     const Session* const session = SessionOf(env, handle);
     if (session == nullptr || !session->Is(ValtoVADReset)) return Number(env, kNoVadSession);
     const Samples from = SamplesOf(env, input);
-    return Number(env,
-                  static_cast<double>(ValtoVADProcess(session->handle, from.data, from.count)));
+    const float score = from.type == napi_float32_array
+                            ? Morva_VAD_FrameFloat(session->handle, from.As<float>(), from.count)
+                            : ValtoVADProcess(session->handle, from.As<short>(), from.count);
+    return Number(env, static_cast<double>(score));
+}
+
+// The handle of an open noise-cancellation session, or null, which the engine refuses.
+void* NcHandleOf(napi_env env, napi_value value) {
+    const Session* const session = SessionOf(env, value);
+    return session != nullptr && session->Is(ValtoNCReset) ? session->handle : nullptr;
 }
 
 napi_value Latency(napi_env env, napi_callback_info info) {
-    const Session* const session = SessionOf(env, ArgumentsOf<1>(env, info)[0]);
-    if (session == nullptr || !session->Is(ValtoNCReset)) return Code(env, 0);
-    return Code(env, MorvaExt_SessionLatencySamples(session->handle));
+    return Code(env, MorvaExt_SessionLatencySamples(NcHandleOf(env, ArgumentsOf<1>(env, info)[0])));
+}
+
+napi_value SetAttenuationLimit(napi_env env, napi_callback_info info) {
+    const auto [handle, limit] = ArgumentsOf<2>(env, info);
+    double limitDb = -1.0;
+    napi_get_value_double(env, limit, &limitDb);
+    return Code(
+        env, MorvaExt_NC_SetAttenuationLimit(NcHandleOf(env, handle), static_cast<float>(limitDb)));
+}
+
+napi_value SetBypass(napi_env env, napi_callback_info info) {
+    const auto [handle, on] = ArgumentsOf<2>(env, info);
+    bool isOn = false;
+    napi_get_value_bool(env, on, &isOn);
+    return Code(env, MorvaExt_NC_SetBypass(NcHandleOf(env, handle), isOn ? 1 : 0));
+}
+
+napi_value EnableVoiceMeter(napi_env env, napi_callback_info info) {
+    const auto [handle, model] = ArgumentsOf<2>(env, info);
+    try {
+        return Code(env,
+                    static_cast<int>(EnableVoice(NcHandleOf(env, handle), TextOf(env, model))));
+    } catch (const std::exception& failure) {
+        napi_throw_error(env, nullptr, failure.what());
+        return nullptr;
+    }
+}
+
+napi_value VoiceScore(napi_env env, napi_callback_info info) {
+    float score = std::numeric_limits<float>::quiet_NaN();
+    MorvaExt_NC_FrameMeters(NcHandleOf(env, ArgumentsOf<1>(env, info)[0]), &score, nullptr);
+    return Number(env, static_cast<double>(score));
+}
+
+napi_value NoiseLevel(napi_env env, napi_callback_info info) {
+    float levelDb = std::numeric_limits<float>::quiet_NaN();
+    MorvaExt_NC_FrameMeters(NcHandleOf(env, ArgumentsOf<1>(env, info)[0]), nullptr, &levelDb);
+    return Number(env, static_cast<double>(levelDb));
+}
+
+napi_value LastError(napi_env env, napi_callback_info /*info*/) {
+    napi_value text = nullptr;
+    napi_create_string_utf8(env, MorvaExt_LastError(), NAPI_AUTO_LENGTH, &text);
+    return text;
 }
 
 napi_value Close(napi_env env, napi_callback_info info) {
@@ -268,6 +334,14 @@ void InstallSessions(napi_env env, napi_value target) {
         method("processNc", ProcessNc),
         method("processVad", ProcessVad),
         method("latency", Latency),
+        method("setAttenuationLimit", SetAttenuationLimit),
+        method("setBypass", SetBypass),
+        method("enableVoice", EnableVoiceMeter),
+        method("voiceScore", VoiceScore),
+        method("noiseLevel", NoiseLevel),
+        method("lastError", LastError),
+        method("takeDiagnostics", TakeDiagnosticsForScript),
+        method("diagnostics", FetchDiagnostics),
         method("close", Close),
     };
     if (napi_define_properties(env, target, methods.size(), methods.data()) != napi_ok ||

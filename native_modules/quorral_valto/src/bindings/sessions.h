@@ -8,9 +8,18 @@
 //   openNc(rateHz, frameMs, model | null)       a session, or 1 (not initialised), 2 (unknown
 //                                               model), 3 (refused by the engine)
 //   openVad(rateHz, frameMs, model | null)      the same
-//   processNc(session, input, output): number   the engine's code; Int16Array in and out
+//   processNc(session, input, output): number   the engine's code; two Int16Array or Float32Array
 //   processVad(session, input): number          the voice score, negative on failure
-//   latency(session): number                    delay of a noise-cancellation session, in samples
+// of a noise-cancellation session:
+//   latency(session): number                    delay in samples
+//   setAttenuationLimit(session, dB): number    the engine's code
+//   setBypass(session, on): number              the same
+//   enableVoice(session, model | null): number  0, or 2 and 3 as above
+//   voiceScore(session): number                 of the last frame; NaN unless enabled
+//   noiseLevel(session): number                 likewise, in decibels
+// and:
+//   lastError(): string                         of this thread, as the engine told it
+//   takeDiagnostics(wake | null), diagnostics() what is said, see diagnostics.h
 //   close(session): undefined                   repeated calls do nothing
 //   weightFiles: string[]                       in the order of the start-up codes from -5 down
 // These are for the package's own loader, which checks arguments and words the errors.

@@ -5,11 +5,11 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
-#include <cstdio>
 #include <mutex>
 #include <string>
 
 #include "morva-sdk/morva-sdk.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/diagnostics.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
 
 namespace quorral {
@@ -23,8 +23,8 @@ constexpr int kDefaultDurationMs = 10;
 
 MorvaSamplingRate AcceptRate(int rateHz) {
     if (std::ranges::count(kRatesHz, rateHz) == 0) {
-        std::printf("The input sampling rate %zu is not supported; using default: %d\n",
-                    static_cast<std::size_t>(rateHz), kDefaultRateHz);
+        Say("The input sampling rate " + std::to_string(static_cast<std::size_t>(rateHz)) +
+            " is not supported; using default: " + std::to_string(kDefaultRateHz));
         rateHz = kDefaultRateHz;
     }
     return static_cast<MorvaSamplingRate>(rateHz);
@@ -32,19 +32,11 @@ MorvaSamplingRate AcceptRate(int rateHz) {
 
 MorvaFrameDuration AcceptDuration(int durationMs) {
     if (std::ranges::count(kDurationsMs, durationMs) == 0) {
-        std::printf("The input frame duration %zu is not supported; using default: %d\n",
-                    static_cast<std::size_t>(durationMs), kDefaultDurationMs);
+        Say("The input frame duration " + std::to_string(static_cast<std::size_t>(durationMs)) +
+            " is not supported; using default: " + std::to_string(kDefaultDurationMs));
         durationMs = kDefaultDurationMs;
     }
     return static_cast<MorvaFrameDuration>(durationMs);
-}
-
-// The model for a caller's raw rate, or an empty name when none covers it.
-std::string ModelFor(int rateHz) {
-    if (!gNcModel.empty()) return gNcModel;
-    const auto model = std::ranges::find_if(
-        gNcModels, [&](const NcModel& candidate) { return candidate.maxSampleRate >= rateHz; });
-    return model == gNcModels.end() ? std::string() : model->name;
 }
 
 }  // namespace
@@ -52,12 +44,11 @@ std::string ModelFor(int rateHz) {
 
 void* ValtoNCSetup(int samplingRate, int frameDurationMs) {
     const std::lock_guard guard(quorral::ModelsLock());
-    const std::string model = quorral::ModelFor(samplingRate);
+    const std::string model = quorral::NcModelFor(samplingRate);
     if (model.empty()) return nullptr;
-    std::printf("Setting Valto model: %s\n", model.c_str());
+    quorral::Say("Setting Valto model: " + model);
     const MorvaSamplingRate rate = quorral::AcceptRate(samplingRate);
     const MorvaFrameDuration duration = quorral::AcceptDuration(frameDurationMs);
-    std::fflush(stdout);
     return Morva_NC_CreateSession(rate, rate, duration, model.c_str());
 }
 
@@ -74,7 +65,6 @@ void* ValtoVADSetup(int samplingRate, int frameDurationMs) {
     const std::lock_guard guard(quorral::ModelsLock());
     const MorvaSamplingRate rate = quorral::AcceptRate(samplingRate);
     const MorvaFrameDuration duration = quorral::AcceptDuration(frameDurationMs);
-    std::fflush(stdout);
     return Morva_VAD_CreateSession(rate, duration, quorral::gVadModel.c_str());
 }
 

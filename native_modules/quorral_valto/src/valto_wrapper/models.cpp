@@ -5,6 +5,7 @@
 #include <memory>
 #include <utility>
 
+#include "morva-sdk/morva-ext.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/entry_points.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
 
@@ -81,6 +82,14 @@ std::vector<std::string> VadModelNames() {
     return gVadModels;
 }
 
+std::string NcModelFor(int rateHz) {
+    const std::lock_guard guard(ModelsLock());
+    if (!gNcModel.empty()) return gNcModel;
+    const auto model = std::ranges::find_if(
+        gNcModels, [&](const NcModel& candidate) { return candidate.maxSampleRate >= rateHz; });
+    return model == gNcModels.end() ? std::string() : model->name;
+}
+
 bool ChooseNcModel(const std::string& name) {
     const std::lock_guard guard(ModelsLock());
     if (!IsNcModel(name)) return false;
@@ -101,11 +110,22 @@ void ChooseNcModelByRate() {
 }
 
 OpenResult OpenNcSession(int rateHz, int frameMs, const Optional<std::string>& model) {
+    if (InitializeResult() && !model && NcModelFor(rateHz).empty()) {
+        return {.status = OpenStatus::kUnknownModel};
+    }
     return Open(ValtoNCSetup, rateHz, frameMs, gNcModel, model, IsNcModel);
 }
 
 OpenResult OpenVadSession(int rateHz, int frameMs, const Optional<std::string>& model) {
     return Open(ValtoVADSetup, rateHz, frameMs, gVadModel, model, IsVadModel);
+}
+
+OpenStatus EnableVoice(void* ncSession, const Optional<std::string>& model) {
+    const std::lock_guard guard(ModelsLock());
+    if (model && !IsVadModel(*model)) return OpenStatus::kUnknownModel;
+    const std::string name = model.value_or(gVadModel);
+    return MorvaExt_NC_EnableVoice(ncSession, name.c_str()) == 0 ? OpenStatus::kOpen
+                                                                 : OpenStatus::kRefused;
 }
 
 }  // namespace quorral

@@ -32,6 +32,9 @@ std::recursive_mutex& ModelsLock();
 std::vector<std::string> NcModelNames();
 std::vector<std::string> VadModelNames();
 
+// The script's choice, else the first model that covers the rate; empty when none does.
+std::string NcModelFor(int rateHz);
+
 // False, and nothing changed, when no registered model has that name.
 bool ChooseNcModel(const std::string& name);
 bool ChooseVadModel(const std::string& name);
@@ -48,5 +51,8 @@ struct OpenResult {
 // the script's choice when none is given.
 OpenResult OpenNcSession(int rateHz, int frameMs, const Optional<std::string>& model);
 OpenResult OpenVadSession(int rateHz, int frameMs, const Optional<std::string>& model);
+
+// Lets a voice-activity model hear what a noise-cancellation session cleans.
+OpenStatus EnableVoice(void* ncSession, const Optional<std::string>& model);
 
 }  // namespace quorral

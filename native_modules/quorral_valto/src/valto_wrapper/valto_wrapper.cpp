@@ -1,13 +1,13 @@
 // Start-up in the order of the printed codes: processor, engine, weight files.
 #include "native_modules/quorral_valto/src/valto_wrapper/valto_wrapper.h"
 
-#include <cstdio>
 #include <exception>
 #include <mutex>
 #include <new>
 #include <string>
 
 #include "morva-sdk/morva-sdk.h"
+#include "native_modules/quorral_valto/src/valto_wrapper/diagnostics.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/models.h"
 #include "native_modules/quorral_valto/src/valto_wrapper/util.h"
 
@@ -24,17 +24,11 @@ constexpr unsigned kEngineThreads = 1;
 
 Optional<int> gInitializeResult;
 
-void PrintLine(const char* line) {
-    std::puts(line);
-    std::fflush(stdout);
-}
-
 bool RegisterWeight(const std::wstring& file, const std::string& name,
                     const std::string& directory) {
     if (Morva_SDK_SetModel(file.c_str(), name.c_str()) == 0) return true;
-    std::printf("Failed to load Morva weight file: %s with working directory: %s\n",
-                util::ToUTF8(file).c_str(), directory.c_str());
-    std::fflush(stdout);
+    Say("Failed to load Morva weight file: " + util::ToUTF8(file) +
+        " with working directory: " + directory);
     return false;
 }
 
@@ -87,16 +81,16 @@ int ValtoInitialize(CpuFeatureQuery query) {
     const std::lock_guard guard(ModelsLock());
     const CpuFeatures features = query();
     if (!features.sse41) {
-        PrintLine("Failed to initialize Morva SDK: CPU does not support SSE 4.1");
+        Say("Failed to initialize Morva SDK: CPU does not support SSE 4.1");
         return kNoSse41;
     }
     if (!features.avx2) {
-        PrintLine("Failed to initialize Morva SDK: CPU does not support AVX2");
+        Say("Failed to initialize Morva SDK: CPU does not support AVX2");
         return kNoAvx2;
     }
     std::string directory;
     if (!CreateEngine(directory)) {
-        PrintLine("Faild to initialize Morva SDK");
+        Say("Faild to initialize Morva SDK");
         return kNoEngine;
     }
     gInitializeResult = RegisterShippedModels(directory);
