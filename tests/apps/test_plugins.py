@@ -1,10 +1,10 @@
-"""The LADSPA plugin through its library file, as hosts load it, and in a real host."""
+"""The LADSPA and LV2 plugins through their library files, as hosts load them, and all plugins in real hosts."""
 
 import ctypes
 import os
-import shutil
+import pathlib
 import subprocess
-from ctypes import CFUNCTYPE, POINTER, c_char_p, c_int, c_ulong, c_void_p
+from ctypes import CFUNCTYPE, POINTER, c_char_p, c_double, c_int, c_uint32, c_ulong, c_void_p
 
 import numpy as np
 import pytest
@@ -14,9 +14,11 @@ from conftest import BUILD, SOURCE
 
 RATES = [8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000]
 os.environ["MORVA_MODELS"] = str(SOURCE / "models")
+CONTROLS = ["limit", "bypass", "latency", "voice", "level"]
 
 
-class Descriptor(ctypes.Structure):
+class Ladspa(ctypes.Structure):
+    FILE, FUNCTION, MORE, CONTROLS = "libmorva_ladspa.so", "ladspa_descriptor", (), CONTROLS[:3]
     _fields_ = [
         *[("UniqueID", c_ulong), ("Label", c_char_p), ("Properties", c_int)],
         *[("Name", c_char_p), ("Maker", c_char_p), ("Copyright", c_char_p)],
@@ -28,72 +30,82 @@ class Descriptor(ctypes.Structure):
     ]
 
 
-@pytest.fixture(scope="module")
-def plugins():
-    """The mono and the stereo plugin; the process uses the engine library itself too."""
+class Lv2(ctypes.Structure):
+    FILE, FUNCTION, MORE, CONTROLS = "lv2/morva.lv2/morva.so", "lv2_descriptor", (b"", None), CONTROLS
+    _fields_ = [
+        *[("URI", c_char_p), ("instantiate", CFUNCTYPE(c_void_p, c_void_p, c_double, c_char_p, c_void_p))],
+        *[("connect", CFUNCTYPE(None, c_void_p, c_uint32, c_void_p)), ("activate", CFUNCTYPE(None, c_void_p))],
+        *[("run", CFUNCTYPE(None, c_void_p, c_uint32)), ("deactivate", c_void_p)],
+        *[("cleanup", CFUNCTYPE(None, c_void_p)), ("extension_data", c_void_p)],
+    ]
+
+
+@pytest.fixture(scope="module", autouse=True)
+def engine():
+    """The process uses the engine library itself too."""
     engine = ctypes.CDLL(BUILD / "libmorva.so", ctypes.RTLD_GLOBAL)
-    function = ctypes.CDLL(BUILD / "libmorva_ladspa.so", ctypes.RTLD_GLOBAL).ladspa_descriptor
-    function.restype = POINTER(Descriptor)
-    assert not function(2)
-    yield [function(i).contents for i in range(2)]
-    assert engine.MorvaExt_ListModels(None, 0) < 0  # the plugin's engine was never the library's
+    yield
+    assert engine.MorvaExt_ListModels(None, 0) < 0  # the plugins' engines were never the library's
 
 
 class Instance:
-    """A host's side of one instance; control ports are found by name, as hosts do."""
+    """A host's side of one instance."""
 
-    def __init__(self, plugin, rate):
-        self.plugin, self.handle = plugin, plugin.instantiate(ctypes.byref(plugin), rate)
+    def __init__(self, kind, channels, rate):
+        function = getattr(ctypes.CDLL(BUILD / kind.FILE, ctypes.RTLD_GLOBAL), kind.FUNCTION)
+        function.restype = POINTER(kind)
+        assert not function(2)
+        self.plugin = function(channels - 1).contents
+        self.handle = self.plugin.instantiate(ctypes.byref(self.plugin), rate, *kind.MORE)
         if self.handle:
-            names = [plugin.names[port].decode() for port in range(plugin.ports)]
-            self.controls = {name: np.zeros(1, "f4") for name in names[-3:]}
-            for port, control in enumerate(self.controls.values(), plugin.ports - 3):
-                plugin.connect(self.handle, port, control.ctypes.data)
-            self.controls["Attenuation limit (dB)"][0] = 100
-            plugin.activate(self.handle)
+            self.controls = {name: np.zeros(1, "f4") for name in kind.CONTROLS}
+            for port, control in enumerate(self.controls.values(), 2 * channels):
+                self.plugin.connect(self.handle, port, control.ctypes.data)
+            self.controls["limit"][0] = 100
+            self.plugin.activate(self.handle)
 
     def __del__(self):
         if self.handle:
             self.plugin.cleanup(self.handle)
 
     def clean(self, sound, longest):
-        """Cleans a row per channel in place, in blocks of up to `longest` samples."""
+        """Cleans a row per channel in blocks of up to `longest` samples, each into the memory of the other one."""
         sound, rng, at = np.array(sound, "f4", ndmin=2), np.random.default_rng(longest), 0
         while at < sound.shape[1]:
             n = min(rng.integers(longest + 1), sound.shape[1] - at)
-            for port in range(2 * len(sound)):
-                self.plugin.connect(self.handle, port, sound[port % len(sound), at:].ctypes.data)
+            for port, row in enumerate([*sound, *sound[::-1]]):
+                self.plugin.connect(self.handle, port, row[at:].ctypes.data)
             self.plugin.run(self.handle, n)
             at += n
-        return sound.squeeze()
+        return sound[::-1].squeeze()
 
 
 def noise(samples, seed):
     return np.clip(0.1 * np.random.default_rng(seed).standard_normal(samples), -0.9, 0.9).astype("f4")
 
 
-@pytest.mark.parametrize("rate", RATES)
-def test_sound_is_the_command_lines_and_bypass_as_late(plugins, morva, recording, tmp_path, rate):
+@pytest.mark.parametrize(("kind", "rate"), [*((Ladspa, rate) for rate in RATES), (Lv2, 44100)])
+def test_sound_is_the_command_lines_and_bypass_as_late(kind, rate, morva, recording, tmp_path):
     sound = np.array([noise(rate // 2, seed) for seed in (1, 2)])
     morva("denoise", recording(sound.T, rate, subtype="FLOAT"), tmp_path / "out.wav")
     wanted = soundfile.read(tmp_path / "out.wav", dtype="f4")[0].T
-    instance = Instance(plugins[1], rate)
+    instance = Instance(kind, 2, rate)
     for longest in (1, 64, 5000):  # samples of a host's block
-        plugins[1].activate(instance.handle)  # forgets what it heard
+        instance.plugin.activate(instance.handle)  # forgets what it heard
         out = instance.clean(sound, longest)
         late = int(instance.controls["latency"][0])
         assert rate / 100 < late < rate / 10 and np.all(out[:, : rate // 100] == 0)
         assert np.array_equal(out[:, late:], wanted[:, :-late])
-    instance.controls["Bypass"][0] = 1
+    instance.controls["bypass"][0] = 1
     out = instance.clean(sound, 256)[:, late + rate // 50 :]  # behind the cross-fade
     assert np.abs(out - sound[:, rate // 50 : -late]).max() < 1e-6
 
 
-def test_limit_is_followed_and_nonsense_is_survived(plugins):
-    sound, instance = noise(16000, 3), Instance(plugins[0], 16000)
+def test_limit_is_followed_and_nonsense_is_survived():
+    sound, instance = noise(16000, 3), Instance(Ladspa, 1, 16000)
 
     def lowered(limit):
-        instance.controls["Attenuation limit (dB)"][0] = limit
+        instance.controls["limit"][0] = limit
         return -10 * np.log10(np.mean(np.square(instance.clean(sound, 512)[8000:], dtype=float)))
 
     everything = lowered(0)
@@ -102,19 +114,52 @@ def test_limit_is_followed_and_nonsense_is_survived(plugins):
     assert [lowered(limit) for limit in (-5, -np.inf, np.nan)] == pytest.approx([everything] * 3, abs=0.01)
 
 
-@pytest.mark.parametrize("rate", [0, 11025, 22050, 47999, 192000])
-def test_other_rates_are_refused_on_standard_error(plugins, capfd, rate):
-    assert not Instance(plugins[0], rate).handle
-    out, err = capfd.readouterr()
-    assert "morva_ladspa: " in err and not out
+def test_meters_are_those_of_the_loudest_channel():
+    voice, rate = soundfile.read(SOURCE / "examples/audio/clean.flac", dtype="f4")
+    instance, scores = Instance(Lv2, 2, rate), []
+    for block in np.split(voice[: 3 * rate], 300):
+        instance.clean([np.zeros_like(block), block], len(block))
+        scores.append(instance.controls["voice"][0])
+    assert min(scores) < 0.1 and 0.9 < max(scores) <= 1
+    instance.clean([noise(rate, 1), np.zeros(rate)], 512)  # of an RMS of 0.1; the model's band is two thirds of it
+    assert instance.controls["voice"][0] < 0.5
+    assert instance.controls["level"][0] == pytest.approx(20 * np.log10(0.1 * 32768 * np.sqrt(2 / 3)), abs=1)
 
 
-@pytest.mark.skipif(not shutil.which("sox"), reason="sox is not installed")
-def test_in_a_real_host(morva, tmp_path):
-    library, noisy = BUILD / "libmorva_ladspa.so", SOURCE / "examples/audio/noisy.flac"
-    morva("denoise", noisy, tmp_path / "wanted.wav")
-    wanted = soundfile.read(tmp_path / "wanted.wav", dtype="i2")[0].astype(int)
-    command = f"sox -D {noisy} {tmp_path}/out.wav remix 1 1 ladspa -l {library} morva_stereo 100 0"
-    subprocess.run(command.split(), check=True)  # -l takes the latency out
-    out = soundfile.read(tmp_path / "out.wav", dtype="i2")[0]
-    assert np.abs(out.T - wanted)[:, 4800:-4800].max() <= 1
+@pytest.mark.parametrize("kind", [Ladspa, Lv2])
+def test_other_rates_are_refused_on_standard_error(kind, capfd):
+    for rate in [0, 11025, 47999, 192000]:
+        assert not Instance(kind, 1, rate).handle
+        out, err = capfd.readouterr()
+        assert f"no session at {rate} Hz" in err and not out
+
+
+HOSTS = {  # each with the samples by which its sound is late, and how far it may differ
+    "sox -D in.wav out.wav ladspa -l libmorva_ladspa morva_stereo 100 0": (0, 2**-15),  # -l takes the latency out
+    "lv2apply -i in.wav -o out.wav urn:morva:stereo": (1041, 0),
+    "gst-launch-1.0 -q filesrc location=in.f32 ! rawaudioparse use-sink-caps=false format=pcm pcm-format=f32le "
+    "sample-rate=48000 num-channels=2 ! morvadenoise ! filesink location=out.f32": (0, 0),
+}
+
+
+@pytest.mark.parametrize("host", HOSTS, ids=lambda host: host.split()[0])
+def test_in_real_hosts(host, morva, recording, tmp_path):
+    sound, rate = soundfile.read(SOURCE / "examples/audio/noisy.flac", dtype="f4", frames=100001)
+    sound = np.stack([sound, sound[::-1]], 1)
+    morva("denoise", recording(sound, rate, subtype="FLOAT"), tmp_path / "wanted.wav")
+    wanted = soundfile.read(tmp_path / "wanted.wav", dtype="f4")[0]
+    sound.tofile(tmp_path / "in.f32")
+    places = {"LADSPA_PATH": str(BUILD), "LV2_PATH": f"{BUILD}/lv2", "GST_PLUGIN_PATH": f"{BUILD}/gstreamer-1.0",
+              "GST_REGISTRY": str(tmp_path / "registry")}
+    subprocess.run(host.split(), check=True, cwd=tmp_path, env=os.environ | places)
+    if (raw := tmp_path / "out.f32").exists():
+        out = np.fromfile(raw, "f4").reshape(-1, 2)
+    else:
+        out = soundfile.read(tmp_path / "out.wav", dtype="f4")[0]
+    late, difference = HOSTS[host]
+    assert len(out) == len(wanted) and np.abs(out[late:] - wanted[: len(wanted) - late]).max() <= difference
+
+
+def test_lv2_description_is_valid():
+    files = [str(file) for folder in (BUILD / "lv2", "/usr/lib/lv2") for file in pathlib.Path(folder).rglob("*.ttl")]
+    subprocess.run(["sord_validate", *files], check=True)
