@@ -5,7 +5,6 @@
 #include <algorithm>
 #include <cmath>
 #include <numeric>
-#include <string>
 #include <vector>
 
 #include "stream_adapter.h"
@@ -121,28 +120,25 @@ TEST_F(Element, FollowsTheLimitAndTellsVoiceAndLevel) {
     set("limit", 0.0F);
     push(noise_, kRate);
     auto out = take();
-    out.erase(out.begin(), out.begin() + kRate);
-    EXPECT_GT(power(out), 100 * cleaned);
+    EXPECT_GT(power({out.begin() + kRate, out.end()}), 100 * cleaned);
 
-    std::vector<GstClockTime> times;
-    std::vector<double> levels;
+    std::vector<double> times;
+    double level = -1.0;
+    double loud = -1.0;
     while (auto* const message = gst_bus_pop_filtered(bus_, GST_MESSAGE_ELEMENT)) {
-        auto const* const values = gst_message_get_structure(message);
         double voice = -1.0;
-        double level = -1.0;
         GstClockTime time = 0;
-        EXPECT_TRUE(gst_structure_get(values, "running-time", G_TYPE_UINT64, &time, "voice",
-                                      G_TYPE_DOUBLE, &voice, "level", G_TYPE_DOUBLE, &level,
-                                      nullptr));
+        gst_structure_get(gst_message_get_structure(message), "running-time", G_TYPE_UINT64, &time,
+                          "voice", G_TYPE_DOUBLE, &voice, "level", G_TYPE_DOUBLE, &level, nullptr);
         EXPECT_TRUE(voice >= 0.0 && voice < 0.5) << voice;
-        times.push_back(time);
-        levels.push_back(level);
+        if (times.size() == 9) loud = level;
+        times.push_back(static_cast<double>(time) / GST_MSECOND);
         gst_message_unref(message);
     }
     ASSERT_EQ(times.size(), 20U);
-    EXPECT_NEAR(levels[9], 68.5, 1.0);  // two thirds of an RMS of 0.1
-    // Of the newest frame; a rounded time may lie a nanosecond early.
-    EXPECT_NEAR(static_cast<double>(times[3]), 390.0 * GST_MSECOND, 1.0);
+    EXPECT_NEAR(times[3], 390.0, 1e-3);  // of the newest frame, that of 10 ms
+    EXPECT_NEAR(loud, 68.5, 1.0);        // two thirds of an RMS of 0.1
+    EXPECT_LT(level, 0.0);               // nothing is removed any more
 }
 
 TEST_F(Element, TakesTheModelThatIsNamed) {
@@ -153,17 +149,11 @@ TEST_F(Element, TakesTheModelThatIsNamed) {
     EXPECT_EQ(gst_bus_pop_filtered(bus_, GST_MESSAGE_ELEMENT), nullptr);
 }
 
-TEST_F(Element, SaysWhichModelIsMissing) {
+TEST_F(Element, RefusesAModelThatIsMissing) {
     set("model", "/nowhere/no.mvw");
     begin();
     EXPECT_EQ(push(noise_, 0), GST_FLOW_NOT_NEGOTIATED);
-    auto* const message = gst_bus_pop_filtered(bus_, GST_MESSAGE_ERROR);
-    ASSERT_NE(message, nullptr);
-    gchar* why = nullptr;
-    gst_message_parse_error(message, nullptr, &why);
-    EXPECT_NE(std::string(why).find("/nowhere/no.mvw"), std::string::npos) << why;
-    g_free(why);
-    gst_message_unref(message);
+    EXPECT_NE(gst_bus_pop_filtered(bus_, GST_MESSAGE_ERROR), nullptr);
 }
 
 }  // namespace

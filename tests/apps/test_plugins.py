@@ -149,8 +149,12 @@ def test_in_real_hosts(host, morva, recording, tmp_path):
     morva("denoise", recording(sound, rate, subtype="FLOAT"), tmp_path / "wanted.wav")
     wanted = soundfile.read(tmp_path / "wanted.wav", dtype="f4")[0]
     sound.tofile(tmp_path / "in.f32")
-    places = {"LADSPA_PATH": str(BUILD), "LV2_PATH": f"{BUILD}/lv2", "GST_PLUGIN_PATH": f"{BUILD}/gstreamer-1.0",
-              "GST_REGISTRY": str(tmp_path / "registry")}
+    places = {
+        "LADSPA_PATH": str(BUILD),
+        "LV2_PATH": f"{BUILD}/lv2",
+        "GST_PLUGIN_PATH": f"{BUILD}/gstreamer-1.0",
+        "GST_REGISTRY": str(tmp_path / "registry"),
+    }
     subprocess.run(host.split(), check=True, cwd=tmp_path, env=os.environ | places)
     if (raw := tmp_path / "out.f32").exists():
         out = np.fromfile(raw, "f4").reshape(-1, 2)
