@@ -46,7 +46,7 @@ fs::path findShipped(std::string const& file) {
     auto folder = chosen != nullptr ? fs::path(chosen) : pluginFolder();
     if (fs::exists(folder / file)) return folder / file;
     for (; chosen == nullptr && folder.has_relative_path(); folder = folder.parent_path()) {
-        auto const installed = folder / "share/morva/models" / file;
+        auto installed = folder / "share/morva/models" / file;
         if (fs::exists(installed)) return installed;
     }
     throw std::runtime_error("the model " + file +
