@@ -127,13 +127,9 @@ GstFlowReturn Denoiser::drain() {
     return GST_FLOW_OK;
 }
 
+// What the sessions hold comes out first, and is cut.
 void Denoiser::flush() {
     if (!adapter_) return;
-    try {
-        adapter_->restart();
-    } catch (std::exception const& failure) {  // the old sessions go on
-        GST_ELEMENT_WARNING(&element_, LIBRARY, FAILED, (nullptr), ("%s", failure.what()));
-    }
     heard_ = 0;
     toCut_ = adapter_->latency();
 }
