@@ -20,7 +20,7 @@ chroot "$bare" sh -euc '
     test -s /tmp/clean.wav
     morva vad /tmp/noisy.flac
     ldconfig -p | grep -q libmorva.so.1
-    test -e /usr/lib/ladspa/libmorva_ladspa.so
+    ls /usr/lib/ladspa/libmorva_ladspa.so /usr/lib/lv2/morva.lv2/morva.so /usr/lib/*/gstreamer-1.0/libgstmorva.so
     apt-get purge -y -qq morva >/dev/null'
 left=$(find "$bare/usr" -name '*morva*')
 [ -z "$left" ] || { echo "left behind: $left" >&2 && exit 1; }

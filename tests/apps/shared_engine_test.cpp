@@ -34,10 +34,10 @@ char const* MorvaExt_LastError() {
 
 // The last user in one thread goes while the first in another comes.
 TEST(SharedEngine, EndsBeforeItBeginsAnew) {
-    auto last = std::make_unique<morva::ladspa::SharedEngine>();
+    auto last = std::make_unique<morva::plugins::SharedEngine>();
     std::jthread const next([] {
         ending.wait(false);
-        EXPECT_NO_THROW(morva::ladspa::SharedEngine());
+        EXPECT_NO_THROW(morva::plugins::SharedEngine());
     });
     last.reset();
 }

@@ -5,20 +5,21 @@
 #include <array>
 #include <cstdio>
 #include <exception>
+#include <memory>
 
-#include "plugin.h"
+#include "port_plugin.h"
 
-namespace morva::ladspa {
+namespace morva::plugins {
 namespace {
 
-Plugin& plugin(LADSPA_Handle handle) {
-    return *static_cast<Plugin*>(handle);
+PortPlugin& plugin(LADSPA_Handle handle) {
+    return *static_cast<PortPlugin*>(handle);
 }
 
 template <std::size_t channels>
 LADSPA_Handle instantiate(LADSPA_Descriptor const*, unsigned long rateHz) {
     try {
-        return std::make_unique<Plugin>(channels, rateHz).release();
+        return std::make_unique<PortPlugin>(channels, static_cast<int>(rateHz), false).release();
     } catch (std::exception const& failure) {
         std::fprintf(stderr, "morva_ladspa: %s\n", failure.what());
         return nullptr;
@@ -42,7 +43,7 @@ void run(LADSPA_Handle handle, unsigned long samples) {
 }
 
 void cleanup(LADSPA_Handle handle) {
-    std::unique_ptr<Plugin> const owned(&plugin(handle));
+    std::unique_ptr<PortPlugin> const owned(&plugin(handle));
 }
 
 struct Port {
@@ -56,7 +57,7 @@ constexpr auto kAudioOut = LADSPA_PORT_AUDIO | LADSPA_PORT_OUTPUT;
 constexpr auto kControlIn = LADSPA_PORT_CONTROL | LADSPA_PORT_INPUT;
 constexpr auto kControlOut = LADSPA_PORT_CONTROL | LADSPA_PORT_OUTPUT;
 
-// In the order of Control.
+// In the order of Control; LADSPA's hosts have no use for the meters behind these.
 constexpr std::array kControls{
     Port{kControlIn,
          "Attenuation limit (dB)",
@@ -66,7 +67,7 @@ constexpr std::array kControls{
     // Hosts know this port by its name.
     Port{kControlOut, "latency", {0, 0.0F, 0.0F}},
 };
-static_assert(kControls.size() == static_cast<std::size_t>(Control::count));
+static_assert(kControls.size() == static_cast<std::size_t>(Control::latency) + 1);
 
 template <std::size_t channels>
 class Descriptor {
@@ -99,7 +100,7 @@ public:
     LADSPA_Descriptor const* get() const { return &descriptor_; }
 
 private:
-    static constexpr std::size_t kPorts = portCount(channels);
+    static constexpr std::size_t kPorts = 2 * channels + kControls.size();
 
     void put(std::size_t at, Port const& port) {
         kinds_[at] = port.kind;
@@ -114,11 +115,11 @@ private:
 };
 
 }  // namespace
-}  // namespace morva::ladspa
+}  // namespace morva::plugins
 
 extern "C" __attribute__((visibility("default"))) LADSPA_Descriptor const* ladspa_descriptor(
     unsigned long index) {
-    using morva::ladspa::Descriptor;
+    using morva::plugins::Descriptor;
     static Descriptor<1> const mono(5068353, "morva_mono", "Morva noise suppression (mono)",
                                     {"Input", "Output"});
     static Descriptor<2> const stereo(
