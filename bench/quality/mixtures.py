@@ -27,11 +27,11 @@ from scipy.signal import fftconvolve
 import tree  # noqa: F401
 from morva_training.corpus import UNSEEN, Clip, Corpus
 from morva_training.measures import active_level
+from morva_training.rooms import EARLY_SECONDS
 
 SNRS_DB = (-5, 0, 5, 10, 15, 20)
 FAINT_DB = 40
 LEVELS_DB = (-36.0, -16.0)  # of the talker, below full scale
-EARLY = 0.05  # seconds of a room's response that belong to the voice
 BABBLERS = 6
 WORD = 1.5  # recordings shorter than so many seconds are words, and follow each other closely
 
@@ -104,7 +104,7 @@ class Draw:
     def in_room(self, samples: np.ndarray) -> tuple[np.ndarray, np.ndarray]:
         """With the whole room, and with its early reflections only."""
         room = self.rooms[self.rng.integers(len(self.rooms))]
-        early = room[: np.argmax(np.abs(room)) + int(EARLY * self.rate)]
+        early = room[: np.argmax(np.abs(room)) + int(EARLY_SECONDS * self.rate)]
         return tuple(fftconvolve(samples, r)[: self.count].astype(np.float32) for r in (room, early))
 
     def hiss(self) -> np.ndarray:
