@@ -232,8 +232,8 @@ def main() -> None:
         clean = args.folder / "clean"
         tasks = [Task(text, f, clean / f.name, args.rate, args.dnsmos, f.stem in faint) for f in files]
         results[name] = rows_of(tasks, args.jobs, name)
-    if args.json:
-        args.json.write_text(json.dumps(results, indent=1))
+        if args.json:
+            args.json.write_text(json.dumps(results, indent=1))
     add_comparison(results)
     shown = [table(results, columns) for columns in TABLES if any(counted(results, c) for c in columns)]
     print("\n\n".join([*shown, *omissions(results), *(tables_by(results, field, pairs) for field in args.by)]))
