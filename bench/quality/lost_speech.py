@@ -14,6 +14,7 @@ from scipy.signal import stft
 QUIET = 1e-10
 OCTAVES_HZ = (125, 250, 500, 1000, 2000, 4000, 8000, 16000)
 HISS_HZ = 4000  # consonants: frames whose power above this is within 10 dB of the rest
+WIDE_HZ = 8000  # up to which all systems hear: consonants and onsets count below, the treble above
 WORD_PAUSE = 0.2  # seconds of pause before a word
 ONSET = 0.03  # seconds
 
@@ -62,12 +63,12 @@ def losses(reference: np.ndarray, result: np.ndarray, rate: int) -> Losses:
             audible[:, bins] = power[:, bins] > loud * 1e-3
         octaves[low] = np.broadcast_to(bins, power.shape)
 
-    high = hertz >= HISS_HZ
+    high, wide = hertz >= HISS_HZ, hertz < WIDE_HZ
     hiss = power[:, high].sum(axis=1) > 0.1 * power[:, ~high].sum(axis=1)
     return Losses(
-        consonants=_loss_db(speech, cleaned, audible & (hiss & talking)[:, None] & high),
-        onsets=_loss_db(speech, cleaned, audible & _onset_frames(talking)[:, None]),
-        treble=_loss_db(speech, cleaned, audible & (hertz >= 8000)),
+        consonants=_loss_db(speech, cleaned, audible & (hiss & talking)[:, None] & high & wide),
+        onsets=_loss_db(speech, cleaned, audible & _onset_frames(talking)[:, None] & wide),
+        treble=_loss_db(speech, cleaned, audible & ~wide),
         octaves={low: _loss_db(speech, cleaned, audible & bins) for low, bins in octaves.items()},
     )
 

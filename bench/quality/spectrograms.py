@@ -95,7 +95,7 @@ class Material:
             clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 2 * BASE_RATE]
             chosen = self.rng.choice(len(clips), 6, replace=False)
             voices = [self.fitted(self.corpus.read(clips[i])) for i in chosen]
-            return np.sum([mixtures.scaled(v, 1.0) for v in voices], axis=0)
+            return np.sum([mixtures.scaled(v, 1.0, BASE_RATE) for v in voices], axis=0)
         clips = [c for c in self.corpus.groups("noise", "heldout")[category] if recording in c.path]
         return self.fitted(self.corpus.read(max(clips, key=lambda c: c.length)))
 
@@ -104,11 +104,11 @@ def mixture(material: Material, example: Example) -> tuple[np.ndarray, np.ndarra
     """Noisy and clean, -1..1."""
     voice = {"": material.talk, "whisper": material.whisper, "shout": material.shout}[example.voice](example.talker)
     level = 10 ** ((-14 if example.voice == "shout" else -24) / 20)
-    voice = mixtures.scaled(voice, level)
+    voice = mixtures.scaled(voice, level, BASE_RATE)
     if not example.noise:
         return voice, voice
     noise = material.disturbance(example.noise, example.recording)
-    noise = mixtures.scaled(noise, level * 10 ** (-example.snr_db / 20))
+    noise = mixtures.scaled(noise, level * 10 ** (-example.snr_db / 20), BASE_RATE)
     return np.clip(voice + noise, -1, 1).astype(np.float32), voice
 
 
@@ -127,7 +127,7 @@ def main() -> None:
         if example.name not in wanted:
             continue
         noisy, clean = mixture(Material(args.store, args.seed + number), example)
-        result = process(noisy, BASE_RATE)
+        result = process(noisy, BASE_RATE, example.name)
         before, after = si_sdr(clean, noisy), si_sdr(clean, result)
         quality = [metrics.pesq_score(clean, x, BASE_RATE) for x in (noisy, result)]
         pause = metrics.pause_attenuation(clean, noisy, result, BASE_RATE)

@@ -1,8 +1,9 @@
-"""What can be scored: weight files, other programs, and doing nothing.
+"""What can be scored: weight files, other programs, what they have made before, and doing nothing.
 
 A system is named on the command line:
     none                 the input as it is
     NAME=model.mvw       a noise model, run by the engine
+    NAME=folder          recordings that a system has made before, with the names of the noisy ones
     NAME=command         any program called as `command in.wav out.wav`
 """
 
@@ -22,30 +23,36 @@ from metrics import at_rate
 
 import morva
 
-Process = Callable[[np.ndarray, int], np.ndarray]
+Process = Callable[[np.ndarray, int, str], np.ndarray]  # samples, rate, the recording's name
 
 
 def from_weight(path: Path) -> Process:
-    return lambda samples, rate: morva.denoise(samples, rate, model=str(path.resolve()))
+    return lambda samples, rate, _name: morva.denoise(samples, rate, model=str(path.resolve()))
+
+
+def read(path: Path, rate: int) -> np.ndarray:
+    samples, file_rate = soundfile.read(path, dtype="float32", always_2d=True)
+    return at_rate(samples[:, 0], file_rate, rate)
 
 
 def from_command(command: str) -> Process:
-    def process(samples: np.ndarray, rate: int) -> np.ndarray:
+    def process(samples: np.ndarray, rate: int, _name: str) -> np.ndarray:
         with tempfile.TemporaryDirectory() as folder:
             source, target = Path(folder) / "in.wav", Path(folder) / "out.wav"
             soundfile.write(source, samples, rate, "PCM_16")
             subprocess.run([*shlex.split(command), source, target], check=True, stdout=subprocess.DEVNULL)
-            result, result_rate = soundfile.read(target, dtype="float32", always_2d=True)
-        return at_rate(result[:, 0], result_rate, rate)
+            return read(target, rate)
 
     return process
 
 
 def parse(text: str) -> tuple[str, Process]:
     if text == "none":
-        return "none", lambda samples, _rate: samples
+        return "none", lambda samples, _rate, _name: samples
     name, _, rest = text.partition("=")
     if not rest:
-        raise SystemExit(f"{text!r} is neither none nor NAME=model.mvw nor NAME=command")
-    is_weight = rest.endswith(".mvw") and Path(rest).is_file()  # a command may end in a weight file, too
-    return name, from_weight(Path(rest)) if is_weight else from_command(rest)
+        raise SystemExit(f"{text!r} is neither none nor NAME=model.mvw nor NAME=folder nor NAME=command")
+    path = Path(rest)  # a command may end in a weight file, too
+    if path.is_dir():
+        return name, lambda _samples, rate, recording: read(path / f"{recording}.wav", rate)
+    return name, from_weight(path) if path.suffix == ".mvw" and path.is_file() else from_command(rest)

@@ -3,13 +3,14 @@
     python bench/quality/voice.py FOLDER --store STORE ours=models/VAD_weight.mvw "peer=some-program --flag"
 
 FOLDER holds pairs, `noisy/` and `clean/` (as mixtures.py makes them): labels come from the clean
-speech at 8 kHz, frames that are neither voice nor silence are left out. Or it holds recordings and
+speech at 8 kHz, after people's way of marking (measures.py); frames that are neither voice nor silence are left out. Or it holds recordings and
 labels of your own, `audio/NAME.wav` and `labels/NAME.txt`: a line per stretch of voice, its start
 and end in seconds (Audacity's label tracks).
 
 A peer is called as `program in.wav` and prints what `morva vad --format csv` prints: a line with
-names, then rows that begin with a frame's start in seconds and its score. Its score holds for all
-blocks that its frame covers, so a peer with longer frames may look ahead to their ends.
+names, then rows that begin with a frame's start in seconds and its score. One rule for all: what counts at the end of a
+block of 10 ms is the last score that a system has given by then, and a frame's score is there when the frame is over,
+not earlier. Nobody may look ahead, and long frames pay for being long.
 
 First, for each frame length: the area under the ROC curve over all frames and over those further
 than 50 ms from where a voice starts or ends, the best F1, the F1 at score 0.5 (both over all).
@@ -37,7 +38,7 @@ import soundfile
 import metrics
 import mixtures
 import tree  # noqa: F401
-from morva_training.corpus import BASE_RATE, Corpus
+from morva_training.corpus import UNSEEN, Corpus
 from morva_training.measures import best_f1, block_labels, frame_labels, roc_auc
 
 import morva
@@ -75,6 +76,13 @@ def from_weight(path: Path) -> Scorer:
     return remembered(scores)
 
 
+def at_block_ends(starts: np.ndarray, scores: np.ndarray, blocks: int) -> np.ndarray:
+    """The last score that is there at the end of every block: of the last frame that is over, 0 before the first."""
+    over = np.append(starts[1:], 2 * starts[-1] - starts[-2] if len(starts) > 1 else np.inf)
+    ends = np.arange(1, blocks + 1) * 0.01 + 1e-6
+    return np.append(0.0, scores)[np.searchsorted(over, ends, side="right")]
+
+
 def from_command(command: str) -> Scorer:
     def of_blocks(samples: np.ndarray, rate: int, _blocks: int) -> np.ndarray:
         with tempfile.TemporaryDirectory() as folder:
@@ -82,8 +90,7 @@ def from_command(command: str) -> Scorer:
             soundfile.write(source, samples, rate, "PCM_16")
             printed = subprocess.run([*shlex.split(command), source], check=True, capture_output=True, text=True).stdout
         rows = np.array([line.split(",")[:2] for line in printed.splitlines()[1:]], float)
-        middles = np.arange(len(samples) * 100 // rate) * 0.01 + 0.005
-        return rows[np.maximum(np.searchsorted(rows[:, 0], middles) - 1, 0), 1]
+        return at_block_ends(rows[:, 0], rows[:, 1], len(samples) * 100 // rate)
 
     once = remembered(of_blocks)
     return lambda samples, rate, blocks: frame_labels(once(samples, rate, 1), blocks)
@@ -224,25 +231,22 @@ def snr_table(systems_: dict[str, Scorer], recordings: list[Recording]) -> str:
     return "\n".join(lines)
 
 
-def without_speech(store: Path, split: str) -> dict[str, list[np.ndarray]]:
-    """Sounds at the store's base rate, by kind; babble is six talkers at once."""
-    corpus = Corpus(store)
-    noises = corpus.groups("noise", split)
-    sounds = {name: [corpus.read(c) for c in noises.get(name, [])] for name in FOOLING}
-    voices = mixtures.talkers(corpus, split)
-    rng = np.random.default_rng(1)
-    if len(voices) >= mixtures.BABBLERS:
-        sounds["babble"] = [mixtures.babble_of(rng, corpus, voices) * BABBLE_RMS for _ in range(5)]
-    return {name: parts for name, parts in sounds.items() if parts}
+def without_speech(store: Path, split: str) -> tuple[dict[str, list[np.ndarray]], int]:
+    """Sounds -1..1, by kind, and their rate; babble is six talkers at once."""
+    draw = mixtures.Draw(Corpus(store), split, seconds=8.0, seed=1)
+    sounds = {name: [draw.corpus.read(c) / 32768 for c in draw.noises.get(name, [])] for name in FOOLING}
+    if len(draw.voices) > mixtures.BABBLERS:
+        sounds["babble"] = [draw.babble(draw.voices) * BABBLE_RMS / 32768 for _ in range(5)]
+    return {name: parts for name, parts in sounds.items() if parts}, draw.rate
 
 
-def false_alarms(sounds: dict[str, list[np.ndarray]], systems_: dict[str, Scorer]) -> str:
+def false_alarms(sounds: dict[str, list[np.ndarray]], rate: int, systems_: dict[str, Scorer]) -> str:
     lines = ["| sound without speech | recordings | frames above 0.5: " + " | ".join(systems_) + " |"]
     lines.append("|---|---|" + "---|" * len(systems_))
     for name, parts in sounds.items():
         shares = []
         for scorer in systems_.values():
-            scores = np.concatenate([scorer(part / 32768, BASE_RATE, 1) for part in parts])
+            scores = np.concatenate([scorer(part, rate, 1) for part in parts])
             shares.append(f"{np.mean(scores > 0.5):.1%}")
         lines.append(f"| {name} | {len(parts)} | " + " | ".join(shares) + " |")
     return "\n".join(lines)
@@ -253,14 +257,14 @@ def main() -> None:
     parser.add_argument("folder", type=Path, help="noisy/ and clean/, or audio/ and labels/")
     parser.add_argument("systems", nargs="+", help="NAME=model.mvw or NAME=command")
     parser.add_argument("--store", type=Path, help="decoded audio, for the sounds without speech")
-    parser.add_argument("--split", default="heldout")
+    parser.add_argument("--split", default="heldout", choices=(UNSEEN, "heldout", "dev"))
     parser.add_argument("--limit", type=int, default=0)
     args = parser.parse_args()
     chosen = dict(parse(text) for text in args.systems)
     recordings = read_recordings(args.folder, args.limit)
     print(frame_table(chosen, recordings) + "\n\n" + snr_table(chosen, recordings))
     if args.store:
-        print("\n" + false_alarms(without_speech(args.store, args.split), chosen))
+        print("\n" + false_alarms(*without_speech(args.store, args.split), chosen))
 
 
 if __name__ == "__main__":

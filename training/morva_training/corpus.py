@@ -3,12 +3,12 @@
 Decoding compressed speech costs more than training on it, so it is done once. A store is a folder
 with an `index.json`, which lists every recording, and the files that it names: mono samples, all
 recordings one after the other, named by kind, rate and content, and the room responses. Lower rates
-are made on demand from the 32 kHz file; their names carry that file's content, so that a copy of
-other recordings is never taken for theirs. The index is replaced last: a store is whole or the old one.
+are made on demand from the file of the store's own rate; their names carry that file's content, so that a
+copy of other recordings is never taken for theirs. The index is replaced last: a store is whole or the old one.
 
 `Corpus` reads a store, and is the one place that knows what may be heard where: the split, the share
 of the training split that is kept back for validation, what is one recording, and whose speech ends
-at 8 kHz.
+at 8 kHz. Whole collections that only the bench may hear are of the split "unseen", in a store of their own.
 
 Units: samples are int16; rates in hertz; positions and lengths in samples of the corpus's rate.
 """
@@ -34,7 +34,8 @@ import numpy as np
 from scipy.signal import resample_poly
 from tqdm import tqdm
 
-BASE_RATE = 32000
+BASE_RATE = 32000  # of a store, unless it is made for another one
+UNSEEN = "unseen"
 EXCLUDED_SPEAKERS = ("p232", "p257")  # the customary test speakers of VCTK: never trained on
 AUDIO_SUFFIXES = {".opus", ".wav", ".flac", ".ogg"}
 KINDS = ("speech", "noise")
@@ -103,14 +104,14 @@ def _new_file(folder: Path, name: Callable[[], str]) -> Iterator[BinaryIO]:
         raise
 
 
-def _decode(rows: list[Row], root: Path, out: Path, kind: str) -> dict[str, Any]:
+def _decode(rows: list[Row], root: Path, out: Path, kind: str, rate: int) -> dict[str, Any]:
     """Every row's recording below `root` in one file of `out`; its entry in the index."""
     digest = hashlib.sha256()
     entry: dict[str, Any] = {"clips": []}
     position = 0
-    with _new_file(out, lambda: _samples_file(kind, BASE_RATE, digest.hexdigest()[:12])) as file:
+    with _new_file(out, lambda: _samples_file(kind, rate, digest.hexdigest()[:12])) as file:
         for row in tqdm(rows, desc=f"decoding {kind}", mininterval=2.0):
-            samples = to_int16(read_audio(root / row["path"], BASE_RATE))
+            samples = to_int16(read_audio(root / row["path"], rate))
             file.write(samples.tobytes())
             digest.update(samples.tobytes())
             entry["clips"].append(
@@ -132,14 +133,14 @@ def _samples_file(kind: str, rate: int, content: str) -> str:
     return f"{kind}-{rate}-{content}.i16"
 
 
-def _rooms(rows: list[Row], root: Path, out: Path) -> str:
+def _rooms(rows: list[Row], root: Path, out: Path, rate: int) -> str:
     """Room responses, scaled to unit energy of the direct sound and cut at 0.8 s; the file's name."""
     rooms: dict[str, np.ndarray] = {}
     for number, row in enumerate(rows):
-        response = read_audio(root / row["path"], BASE_RATE)[: int(0.8 * BASE_RATE)]
-        peak = int(np.argmax(np.abs(response)))
-        direct = response[max(0, peak - 80) : peak + 80]
-        response = response[max(0, peak - 80) :] / (np.sqrt(np.sum(direct**2)) + 1e-9)
+        response = read_audio(root / row["path"], rate)[: int(0.8 * rate)]
+        peak, margin = int(np.argmax(np.abs(response))), rate // 400
+        direct = response[max(0, peak - margin) : peak + margin]
+        response = response[max(0, peak - margin) :] / (np.sqrt(np.sum(direct**2)) + 1e-9)
         rooms[f"{row.get('split') or 'train'}-{number:04d}"] = response.astype(np.float32)
     digest = hashlib.sha256(b"".join(name.encode() + room.tobytes() for name, room in rooms.items()))
     name = f"rooms-{digest.hexdigest()[:12]}.npz"
@@ -148,11 +149,13 @@ def _rooms(rows: list[Row], root: Path, out: Path) -> str:
     return name
 
 
-def build(tables: dict[str, list[Row]], root: Path, out: Path) -> None:
+def build(tables: dict[str, list[Row]], root: Path, out: Path, rate: int = BASE_RATE) -> None:
     """Writes the store of the recordings below `root` that the tables "speech", "noise" and "rir" name."""
+    if len({row.get("split") == UNSEEN for rows in tables.values() for row in rows}) > 1:
+        raise ValueError("unseen recordings belong in a store of their own, where no training looks")
     out.mkdir(parents=True, exist_ok=True)
-    index: dict[str, Any] = {kind: _decode(tables[kind], root, out, kind) for kind in KINDS}
-    index["rooms"] = _rooms(tables.get("rir", []), root, out)
+    index: dict[str, Any] = {kind: _decode(tables[kind], root, out, kind, rate) for kind in KINDS}
+    index |= {"rate": rate, "rooms": _rooms(tables.get("rir", []), root, out, rate)}
     with _new_file(out, lambda: "index.json") as file:
         file.write(json.dumps(index).encode())
     contents = {index[kind]["content"] for kind in KINDS}
@@ -204,32 +207,36 @@ def _identity(clip: dict[str, Any], kind: str) -> str:
 
 
 class Corpus:
-    """A store at one rate. Splits are "train", "dev" (kept back from it for validation) and "heldout"."""
+    """A store at one rate, its own if none is named.
 
-    def __init__(self, folder: Path, rate: int = BASE_RATE) -> None:
-        if BASE_RATE % rate:
-            raise ValueError(f"{rate} Hz does not divide {BASE_RATE} Hz")
+    Splits are "train", "dev" (kept back from it for validation) and "heldout", or "unseen".
+    """
+
+    def __init__(self, folder: Path, rate: int | None = None) -> None:
         if not (folder / "index.json").exists():
             raise FileNotFoundError(f"{folder} holds no index.json: make the store with morva_training.corpus")
-        self.rate = rate
         self._folder = folder
         self._index = json.loads((folder / "index.json").read_text())
+        self._base_rate = self._index.get("rate", BASE_RATE)
+        self.rate = rate or self._base_rate
+        if self._base_rate % self.rate:
+            raise ValueError(f"{rate} Hz does not divide the store's {self._base_rate} Hz")
         self._samples = {kind: self._at_rate(kind) for kind in KINDS}
         self._clips = {kind: self._by_split(kind) for kind in KINDS}
 
     def _at_rate(self, kind: str) -> np.ndarray:
-        entry, ratio = self._index[kind], BASE_RATE // self.rate
+        entry, ratio = self._index[kind], self._base_rate // self.rate
         target = self._folder / _samples_file(kind, self.rate, entry["content"])
         if not target.exists():
-            base = _mapped(self._folder / _samples_file(kind, BASE_RATE, entry["content"]))
+            base = _mapped(self._folder / _samples_file(kind, self._base_rate, entry["content"]))
             low = _decimated(base, entry["clips"], ratio)
             with _new_file(self._folder, lambda: target.name) as file:
                 low.tofile(file)
         return _mapped(target)
 
     def _by_split(self, kind: str) -> dict[str, list[Clip]]:
-        splits: dict[str, list[Clip]] = {"train": [], "dev": [], "heldout": []}
-        ratio, listed = BASE_RATE // self.rate, self._index[kind]["clips"]
+        splits: dict[str, list[Clip]] = {"train": [], "dev": [], "heldout": [], UNSEEN: []}
+        ratio, listed = self._base_rate // self.rate, self._index[kind]["clips"]
         kept = _kept_back(listed, kind)
         for c in listed:
             clip = Clip(kind, c["path"], _scaled_start(c["start"], ratio), c["length"] // ratio, c["group"], c["band"])
@@ -240,7 +247,10 @@ class Corpus:
         return splits
 
     def clips(self, kind: str, split: str) -> list[Clip]:
-        return self._clips[kind][split]
+        splits = self._clips[kind]
+        if splits[UNSEEN] and split != UNSEEN:
+            raise ValueError(f"{self._folder} holds unseen collections: for the bench, not for training")
+        return splits[split]
 
     def of_all_splits(self, kind: str) -> list[Clip]:
         return [clip for clips in self._clips[kind].values() for clip in clips]
@@ -264,10 +274,10 @@ class Corpus:
 
     def rooms(self, split: str) -> list[np.ndarray]:
         """Room responses; validation hears the training split's."""
-        prefix = "heldout-" if split == "heldout" else "train-"
+        prefix = "train-" if split == "dev" else f"{split}-"
         with np.load(self._folder / self._index["rooms"]) as archive:
             rooms = [archive[name] for name in sorted(archive.files) if name.startswith(prefix)]
-        return [resample_poly(room, 1, BASE_RATE // self.rate).astype(np.float32) for room in rooms]
+        return [resample_poly(room, 1, self._base_rate // self.rate).astype(np.float32) for room in rooms]
 
 
 def _mapped(file: Path) -> np.ndarray:
@@ -293,6 +303,7 @@ def main() -> None:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
     parser.add_argument("--data", type=Path, required=True, help="folder with speech.tsv, noise.tsv, rir.tsv")
     parser.add_argument("--store", type=Path, required=True, help="folder to write the decoded store to")
+    parser.add_argument("--rate", type=int, default=BASE_RATE, help="of the samples; 48000 for the bench's full band")
     args = parser.parse_args()
     tables = {}
     for kind in (*KINDS, "rir"):
@@ -301,7 +312,7 @@ def main() -> None:
         tables[kind] = (
             rows_of_folder(args.data / kind, kind) if bare else read_manifest(table) if table.exists() else []
         )
-    build(tables, args.data, args.store)
+    build(tables, args.data, args.store, args.rate)
 
 
 if __name__ == "__main__":

@@ -14,6 +14,8 @@ PAUSE_SCORE = 0.5  # where only a voice score is known, nobody speaks below it
 PAUSE_SETTLE, PAUSE_EDGE = 0.35, 0.03  # seconds after and before speech that are no pause either
 FEWEST_PAUSES, LEAST_NOISE_DB, LEAST_LEFT_DB = 30, -75.0, -100.0  # blocks; levels, re full scale
 VOICE_DB, DOUBT_DB = -30.0, -42.0
+ABOVE_FLOOR_DB = 6.0  # at which an ending has faded out
+GAP, ISLAND = 20, 3  # blocks of 10 ms: shorter gaps are voice, shorter islands none
 LOWEST_VOICE_HZ = 80.0
 
 
@@ -91,9 +93,10 @@ def relative_power(samples: np.ndarray, block: int) -> np.ndarray:
 def block_labels(speech: np.ndarray, block: int) -> tuple[np.ndarray, np.ndarray]:
     """Voice (bool) and weight per block of 10 ms of clean speech.
 
-    A block is voice when its power is within 30 dB of the speaker's loud blocks, and so is its power
-    above 80 Hz (what lies below is the rumble of desks and traffic); gaps below 80 ms are closed, islands
-    below 30 ms dropped, edges stay where they are. Blocks between 30 and 42 dB are neither: weight 0.
+    As people mark it: voice begins where the power, and that above 80 Hz (what lies below is the rumble of
+    desks and traffic), comes within 30 dB of the speaker's loud blocks; it ends where the level has fallen to the
+    recording's floor, or 45 dB below the loud blocks; a gap of less than 200 ms is voice, an island below 30 ms none.
+    What else lies between 30 and 42 dB is neither: weight 0.
     """
     count = len(speech) // block
     if count == 0:
@@ -102,13 +105,22 @@ def block_labels(speech: np.ndarray, block: int) -> tuple[np.ndarray, np.ndarray
     high_pass = butter(4, LOWEST_VOICE_HZ, "highpass", fs=100 * block, output="sos")
     voiced = sosfiltfilt(high_pass, samples, padlen=min(len(samples) - 1, 10 * block))
     # Both: the filter rings ahead of a start, and rumble is loud without it.
-    power = np.minimum(relative_power(samples, block), relative_power(voiced, block))
-    padded = np.pad(power > 10 ** (VOICE_DB / 10), 8)
-    voice = binary_opening(binary_closing(padded, np.ones(8)), np.ones(3))[8:-8]
-    weight = np.where(~voice & (power > 10 ** (DOUBT_DB / 10)), 0.0, 1.0)
+    power = 10 * np.log10(np.minimum(relative_power(samples, block), relative_power(voiced, block)) + 1e-10)
+    voice = _with_endings(binary_opening(power > VOICE_DB, np.ones(ISLAND)), power)
+    voice = binary_closing(np.pad(voice, GAP), np.ones(GAP))[GAP:-GAP]
+    weight = np.where(~voice & (power > DOUBT_DB), 0.0, 1.0)
     for start in np.flatnonzero(np.diff(voice.astype(int)) == 1) + 1:
         weight[start : start + 5] = 2.0
     return voice, weight.astype(np.float32)
+
+
+def _with_endings(voice: np.ndarray, power_db: np.ndarray) -> np.ndarray:
+    """Each stretch of voice goes on until its level is at the floor: the tenth percentile of what is not silence."""
+    floor = np.percentile(power_db[power_db > -90], 10) if (power_db > -90).any() else VOICE_DB
+    heard = voice | (power_db > np.clip(floor + ABOVE_FLOOR_DB, PAUSE_DB, VOICE_DB))
+    stretch = np.cumsum(np.diff(heard, prepend=False))  # odd within a stretch that is heard
+    begun = {int(s): i for i, s in reversed(list(enumerate(stretch))) if voice[i]}
+    return heard & np.array([i >= begun.get(int(s), len(voice)) for i, s in enumerate(stretch)])
 
 
 def frame_labels(values: np.ndarray, blocks: int) -> np.ndarray:

@@ -61,6 +61,19 @@ def test_validation_has_both_bands_and_no_recording_of_the_training(store: Path)
         assert all(numbers) and sum(map(len, numbers)) == len(set.union(*numbers)), "no recording in two splits"
 
 
+def test_unseen_collections_are_no_training_material(tmp_path: Path) -> None:
+    soundfile.write(tmp_path / "a.wav", np.full(48000, 0.1), 48000)
+    unseen = {"path": "a.wav", "split": corpus.UNSEEN}
+    with pytest.raises(ValueError, match="a store of their own"):
+        corpus.build({"speech": [unseen], "noise": [{"path": "a.wav"}]}, tmp_path, tmp_path / "store")
+    corpus.build({"speech": [unseen], "noise": [unseen]}, tmp_path, tmp_path / "store", 48000)
+    heard = Corpus(tmp_path / "store")
+    assert len(heard.read(*heard.clips("speech", corpus.UNSEEN))) == 48000
+    for split in ("train", "dev", "heldout"):
+        with pytest.raises(ValueError, match="unseen collections"):
+            Corpus(tmp_path / "store", 16000).groups("noise", split)
+
+
 def test_clips_of_one_recording_are_known() -> None:
     row = {"path": "a/rain_02.opus"}
     for author in ("x http://freesound.org/people/x/sounds/123/", "x fs123"):
