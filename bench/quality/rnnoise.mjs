@@ -17,8 +17,8 @@ const place = rnnoise._malloc(4 * FRAME);
 const bytes = readFileSync(0);
 const samples = new Float32Array(bytes.buffer.slice(bytes.byteOffset, bytes.byteOffset + bytes.byteLength));
 for (let start = 0; start + FRAME <= samples.length; start += FRAME) {
-    rnnoise.HEAPF32.set(samples.subarray(start, start + FRAME), place / 4);
-    rnnoise._rnnoise_process_frame(state, place, place);
-    samples.set(rnnoise.HEAPF32.subarray(place / 4, place / 4 + FRAME), start);
+  rnnoise.HEAPF32.set(samples.subarray(start, start + FRAME), place / 4);
+  rnnoise._rnnoise_process_frame(state, place, place);
+  samples.set(rnnoise.HEAPF32.subarray(place / 4, place / 4 + FRAME), start);
 }
 writeFileSync(1, new Uint8Array(samples.buffer));
