@@ -27,12 +27,10 @@ install(FILES packaging/morva.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
 install(FILES packaging/morva.bash RENAME morva
         DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
 install(FILES LICENSE CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
-# The math library is linked in; its licence goes with it.
-cmake_path(GET MORVA_MKL_INCLUDE PARENT_PATH mkl_root)
-foreach(licence ${mkl_root}/LICENSE.txt ${mkl_root}/licensing/license.txt)
-    if(EXISTS ${licence})
-        install(FILES ${licence} RENAME LICENSE.oneMKL.txt DESTINATION ${CMAKE_INSTALL_DOCDIR})
-        break()
+# What is compiled or linked in comes with its licence.
+foreach(part Highway oneMKL)
+    if(MORVA_LICENSE_${part})
+        install(FILES ${MORVA_LICENSE_${part}} RENAME LICENSE.${part}.txt DESTINATION ${CMAKE_INSTALL_DOCDIR})
     endif()
 endforeach()
 

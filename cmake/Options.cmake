@@ -1,6 +1,5 @@
-# Compiler settings shared by every target of this project.
-#   morva_options   warnings, language, sanitizers; baseline x86-64
-#   morva_simd      in addition AVX2/FMA code; only for what runs behind the processor check
+# Compiler settings shared by every target of this project: the target morva_options.
+# Everything is compiled for the baseline of its processor family; src/kernels asks for more itself.
 option(MORVA_FUZZ "Build the fuzzers (clang)" OFF)
 set(MORVA_SANITIZE "" CACHE STRING "Sanitizers, as for -fsanitize=")
 
@@ -32,7 +31,3 @@ endif()
 if(MORVA_FUZZ)
     target_compile_options(morva_options INTERFACE -fsanitize=fuzzer-no-link)
 endif()
-
-add_library(morva_simd INTERFACE)
-target_link_libraries(morva_simd INTERFACE morva_options)
-target_compile_options(morva_simd INTERFACE -march=x86-64-v3)

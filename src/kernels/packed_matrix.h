@@ -13,6 +13,7 @@
 #include <vector>
 
 #include "kernels/matrix.h"
+#include "kernels/panel_product.h"
 
 namespace MORVA::CONTAINERS {
 
@@ -43,6 +44,7 @@ private:
 
     std::size_t rows_;
     std::size_t cols_;
+    PanelProduct product_;
     std::vector<std::uint16_t, CacheLineAllocator<std::uint16_t>> half_;
     std::vector<float, CacheLineAllocator<float>> single_;
 };

@@ -4,6 +4,9 @@
 #include <cstdint>
 #include <limits>
 
+#include "kernels/vector_layer.h"
+
+HWY_BEFORE_NAMESPACE();
 namespace MORVA::UTILS {
 namespace {
 
@@ -47,3 +50,4 @@ void pcm16ScaleToUnit(std::span<float const> in, std::span<float> out) {
 }
 
 }  // namespace MORVA::UTILS
+HWY_AFTER_NAMESPACE();

@@ -1,34 +1,17 @@
-// Element-wise products and sums over raw arrays. No state; any thread.
+// Products and sums over raw arrays. No state; any thread.
 #pragma once
 
-#include <array>
 #include <cstddef>
 #include <span>
 #include <vector>
 
 namespace MORVA::UTILS {
 
-// The sum of square(x) over the samples, in double and in a fixed order of eight interleaved
-// partial sums: the same value from run to run, and two vector registers wide. `square` maps a
-// sample to its square as a double.
-template <class Square>
-double sumOver(std::span<float const> samples, Square square) {
-    constexpr std::size_t kLanes = 8;
-    std::array<double, kLanes> partial{};
-    std::size_t const whole = samples.size() - samples.size() % kLanes;
-    for (std::size_t i = 0; i < whole; i += kLanes) {
-        for (std::size_t lane = 0; lane < kLanes; ++lane)
-            partial[lane] += square(samples[i + lane]);
-    }
-    for (std::size_t i = whole; i < samples.size(); ++i) partial[i - whole] += square(samples[i]);
-    return ((partial[0] + partial[4]) + (partial[1] + partial[5])) +
-           ((partial[2] + partial[6]) + (partial[3] + partial[7]));
-}
+// Energy of a block: products in double, summed in double in a fixed order.
+double sumOfSquares(std::span<float const> samples);
 
-// Energy of a block: products in double.
-inline double sumOfSquares(std::span<float const> samples) {
-    return sumOver(samples, [](float x) { return static_cast<double>(x) * x; });
-}
+// The sum of a_i b_i for i < n, a multiple of 8, in single precision and in a fixed order.
+float dotProduct(float const* a, float const* b, std::size_t n);
 
 }  // namespace MORVA::UTILS
 

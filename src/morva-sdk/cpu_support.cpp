@@ -1,5 +1,6 @@
 #include "morva-sdk/cpu_support.h"
 
+#ifdef __x86_64__
 #include <cpuid.h>
 
 #include <cstring>
@@ -15,8 +16,8 @@ struct Feature {
     Register where;
     unsigned bit;
 };
-// What -march=x86-64-v3 lets a compiler use, beyond the baseline. The two that hosts ask for come
-// first.
+// The level x86-64-v3 beyond the baseline: what the vector kernels are compiled for, and what was
+// always asked for. The two that hosts ask for come first.
 constexpr Feature kNeeded[] = {
     {"SSE 4.1", 1, ecx, 19}, {"AVX2", 7, ebx, 5},           {"AVX", 1, ecx, 28},
     {"FMA", 1, ecx, 12},     {"BMI2", 7, ebx, 8},           {"BMI1", 7, ebx, 3},
@@ -62,3 +63,18 @@ char const* processorFeatures() {
 }
 
 }  // namespace MORVA::MORVA_SDK
+
+#else  // what the kernels use is part of every processor of the family
+
+namespace MORVA::MORVA_SDK {
+
+char const* missingProcessorFeature() {
+    return nullptr;
+}
+
+char const* processorFeatures() {
+    return "";
+}
+
+}  // namespace MORVA::MORVA_SDK
+#endif

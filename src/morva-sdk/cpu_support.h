@@ -1,4 +1,4 @@
-// The processor check of the C interface. Runs on any x86-64. [any thread]
+// The processor check of the C interface. Runs on any processor of the family. [any thread]
 #pragma once
 
 namespace MORVA::MORVA_SDK {

@@ -1,11 +1,10 @@
 #include "noise_canceller/networks.h"
 
-#include <mkl_vml.h>
-
 #include <algorithm>
 #include <array>
 #include <numeric>
 
+#include "kernels/elementary.h"
 #include "kernels/mat_mul.h"
 #include "kernels/vector_math.h"
 
@@ -122,7 +121,7 @@ void sigmoid(std::vector<float>& values) {
         std::size_t const count = std::min(exponential.size(), values.size() - first);
         float* const block = values.data() + first;
         for (std::size_t i = 0; i < count; ++i) exponential[i] = -static_cast<double>(block[i]);
-        vdExp(static_cast<MKL_INT>(count), exponential.data(), exponential.data());
+        UTILS::exponentials({exponential.data(), count});
         for (std::size_t i = 0; i < count; ++i) {
             block[i] = static_cast<float>(1.0 / (1.0 + exponential[i]));
         }

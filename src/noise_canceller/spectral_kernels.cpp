@@ -3,6 +3,7 @@
 #include <algorithm>
 #include <cmath>
 
+#include "kernels/elementary.h"
 #include "noise_canceller/spectral_params.h"
 
 namespace MORVA::NOISE_CANCELLER::NOISE_CLEANER_FUNCTIONS {
@@ -26,7 +27,8 @@ void calcFeatures(std::vector<std::complex<float>> const& spectrum, std::vector<
     constexpr float kFeatureOffset = 1000.0f;  // keeps the logarithm of silent bands finite
     calcRescaleAbsAndFiltr(spectrum, out, gain, params);
     params.bands.compress(out);
-    for (float& value : out) value = std::log(value + kFeatureOffset);
+    for (float& value : out) value += kFeatureOffset;
+    UTILS::logarithms(out);
 }
 
 void applyClipFix(std::vector<float>& frame, SpectralParams const& params) {

@@ -1,9 +1,9 @@
 #include "noise_canceller/vad_cleaner_v0_0_1.h"
 
 #include <algorithm>
-#include <cmath>
 #include <utility>
 
+#include "kernels/elementary.h"
 #include "kernels/vector_math.h"
 #include "utils/diagnostics.h"
 
@@ -70,8 +70,10 @@ float VadCleaner_v0_0_1::probabilityCalc(float const* window, std::size_t n) {
         return bin.real() * bin.real() + bin.imag() * bin.imag();
     });
     poolBands(powers_);
+    for (float& power : powers_) power += 1.0f;
+    UTILS::logarithms(powers_);
     for (std::size_t k = 0; k < powers_.size(); ++k) {
-        powers_[k] = params_.standardise(std::log(powers_[k] + 1.0f), k);
+        powers_[k] = params_.standardise(powers_[k], k);
     }
     features_.start += powers_.size();
     features_.push_back(powers_.data(), powers_.size());

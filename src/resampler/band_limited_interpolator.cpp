@@ -1,9 +1,8 @@
 #include "resampler/band_limited_interpolator.h"
 
-#include <immintrin.h>
-
 #include <algorithm>
-#include <cmath>
+
+#include "kernels/vector_math.h"
 
 namespace MORVA::UTILS {
 namespace {
@@ -11,23 +10,6 @@ namespace {
 constexpr std::size_t kUsualCapacity = 4096;
 constexpr std::size_t kVectorLanes = 8;
 constexpr double kNoDrift = 1e-15;
-
-// `taps` is a multiple of eight. Two sums hide the latency of the fused product.
-float dot(float const* x, float const* row, std::size_t taps) {
-    __m256 even = _mm256_setzero_ps();
-    __m256 odd = _mm256_setzero_ps();
-    std::size_t i = 0;
-    for (; i + 2 * kVectorLanes <= taps; i += 2 * kVectorLanes) {
-        even = _mm256_fmadd_ps(_mm256_loadu_ps(x + i), _mm256_loadu_ps(row + i), even);
-        odd = _mm256_fmadd_ps(_mm256_loadu_ps(x + i + kVectorLanes),
-                              _mm256_loadu_ps(row + i + kVectorLanes), odd);
-    }
-    if (i < taps) even = _mm256_fmadd_ps(_mm256_loadu_ps(x + i), _mm256_loadu_ps(row + i), even);
-    __m256 const sum = _mm256_add_ps(even, odd);
-    __m128 const four = _mm_add_ps(_mm256_castps256_ps128(sum), _mm256_extractf128_ps(sum, 1));
-    __m128 const two = _mm_add_ps(four, _mm_movehl_ps(four, four));
-    return _mm_cvtss_f32(_mm_add_ss(two, _mm_movehdup_ps(two)));
-}
 
 }  // namespace
 
@@ -92,13 +74,13 @@ void BandLimitedInterpolator::forget(double passed) {
 // One output sample; moves the clock on.
 float BandLimitedInterpolator::interpolate() {
     double const fraction = filter_->fraction(phase_);
-    double const base = std::nearbyint(clock_ - fraction);
-    double const drift = (clock_ - base) - fraction;
+    auto const base = static_cast<std::ptrdiff_t>(clock_ - fraction + 0.5);
+    double const drift = (clock_ - static_cast<double>(base)) - fraction;
     auto const side = drift > kNoDrift    ? InterpolationFilter::Drift::ahead
                       : drift < -kNoDrift ? InterpolationFilter::Drift::behind
                                           : InterpolationFilter::Drift::none;
-    float const* const x = window_.data() + static_cast<std::ptrdiff_t>(base) + filter_->firstTap();
-    float const value = dot(x, filter_->row(phase_, side), filter_->taps());
+    float const* const x = window_.data() + base + filter_->firstTap();
+    float const value = dotProduct(x, filter_->row(phase_, side), filter_->taps());
     clock_ += step_;
     phase_ += phaseStep_;
     if (phase_ >= filter_->outStep()) phase_ -= filter_->outStep();

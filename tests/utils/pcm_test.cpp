@@ -69,7 +69,7 @@ TEST(Pcm, TakesAnyFloat) {
 TEST(FloatControl, HoldsForItsScopeOnly) {
     float volatile tiny = 1e-39f;
     auto const denormalSurvives = [&] { return tiny * 1.0f != 0.0f; };
-    unsigned const before = _mm_getcsr();
+    auto const before = floatControl();
     {
         ScopedFloatControl const outer(Denormals::asZero);
         EXPECT_FALSE(denormalSurvives());
@@ -79,5 +79,5 @@ TEST(FloatControl, HoldsForItsScopeOnly) {
         }
         EXPECT_FALSE(denormalSurvives());
     }
-    EXPECT_EQ(_mm_getcsr(), before);
+    EXPECT_EQ(floatControl(), before);
 }
