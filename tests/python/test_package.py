@@ -117,10 +117,9 @@ def test_rates_that_the_engine_does_not_take(command, speech, write, tmp_path, r
     sound = np.convolve(speech[: 3 * rate : 2], np.ones(9) / 9, "same")  # little above half the band
     path = write("in.wav", sound, rate)
     clean = morva.denoise(sound, rate)
-    if rate <= 96000:
-        command("denoise", "-q", path, tmp_path / "out.wav")
-        wanted, _ = soundfile.read(tmp_path / "out.wav", dtype="float32")
-        assert np.corrcoef(clean, wanted)[0, 1] > 0.98, "the converters differ a little"
+    command("denoise", "-q", path, tmp_path / "out.wav")
+    wanted, _ = soundfile.read(tmp_path / "out.wav", dtype="float32")
+    assert np.corrcoef(clean, wanted)[0, 1] > 0.98, "the converters differ a little"
     morva.denoise_file(path, tmp_path / "ours.wav")
     np.testing.assert_allclose(soundfile.read(tmp_path / "ours.wav", dtype="float32")[0], clean, atol=1e-6)
     for given, tolerance in ((sound, 1e-6), (np.rint(sound * 32768).astype(np.int16), 1e-3)):  # which rounds it
