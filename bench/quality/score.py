@@ -5,10 +5,11 @@
 FOLDER holds `noisy/` and `clean/` with files of the same names, as mixtures.py makes them. Means over the pairs:
 PESQ (wide band), STOI, SI-SDR and its gain in dB, attenuation of the noise in pauses in dB; where the clean file equals
 the noisy one, SI-SDR, PESQ and the change of level count instead; where the noise is faint, PESQ.
-A second table says what happens to the speech: the composite ratings CSIG, CBAK, COVL and the log-likelihood ratio of
-the envelopes, what is lost of consonants above 4 kHz, of the first 30 ms of words, above 8 kHz and of each octave in
-dB, and with `--dnsmos NETWORK` the ratings SIG, BAK and OVRL of that network. With `none` among the systems a third one
-says how many recordings are worse than their input, in per cent. `--by` tells the pairs apart by what pairs.json says.
+A second table holds ratings: the composite ones CSIG, CBAK, COVL, the log-likelihood ratio of the envelopes, and with
+`--dnsmos NETWORK` that network's SIG, BAK and OVRL. A third one says what of the speech itself is lost, in medians and
+dB: consonants above 4 kHz, the first 30 ms of words, what lies above 8 kHz, and each octave. With `none` among the
+systems a fourth one says how many recordings are worse than their input, in per cent. `--by` tells the pairs apart by
+what pairs.json says.
 
 A recording without a figure for one system (digital silence has no PESQ) counts for none of them; the last row of a
 table counts the recordings. `--json` keeps every figure, and `--with` takes systems from such a file into the tables
@@ -160,14 +161,15 @@ def counted(results: Results, column: str) -> set[str]:
     return set.intersection(*having)
 
 
-def means(results: Results) -> dict[str, dict[str, float]]:
-    """By system and column; NaN where no recording counts."""
+def middles(results: Results) -> dict[str, dict[str, float]]:
+    """By system and column the mean, or of losses the median: they have no limit. NaN where no recording counts."""
     names = {column: counted(results, column) for column in HEADS}
 
-    def mean(rows: list[Row], column: str) -> float:
-        return float(np.mean([r[column] for r in rows if r["name"] in names[column]] or [np.nan]))
+    def middle(rows: list[Row], column: str) -> float:
+        values = [r[column] for r in rows if r["name"] in names[column]] or [np.nan]
+        return float(np.median(values) if column in LOSSES else np.mean(values))
 
-    return {system: {column: mean(rows, column) for column in HEADS} for system, rows in results.items()}
+    return {system: {column: middle(rows, column) for column in HEADS} for system, rows in results.items()}
 
 
 def omissions(results: Results) -> list[str]:
@@ -195,7 +197,7 @@ def table(results: Results, columns: Iterable[str], part: str = "") -> str:
     first = f"| {part} " if part else ""
     lines = [f"| {'part | ' if part else ''}system | " + " | ".join(HEADS[c] for c in shown) + " |"]
     lines += ["|---" * (len(shown) + 1 + bool(part)) + "|"]
-    lines += [f"{first}| {system} | {cells(values, shown)} |" for system, values in means(results).items()]
+    lines += [f"{first}| {system} | {cells(values, shown)} |" for system, values in middles(results).items()]
     lines += [f"{first}| recordings | " + " | ".join(str(len(counted(results, c))) for c in shown) + " |"]
     return "\n".join(lines)
 

@@ -153,7 +153,7 @@ def test_systems_are_compared_over_the_same_recordings_digital_silence_or_not() 
         "good": [{"name": "a", "pesq": 2.0}, {"name": "b", "pesq": 4.0}],
         "bad": [{"name": "a", "pesq": 1.0}, {"name": "b", **silent}],
     }
-    assert [values["pesq"] for values in score.means(results).values()] == [2.0, 1.0]
+    assert [values["pesq"] for values in score.middles(results).values()] == [2.0, 1.0]
     assert "bad has no PESQ on 1 recordings: b" in score.omissions(results)
 
 
