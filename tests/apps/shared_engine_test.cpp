@@ -30,6 +30,7 @@ int Morva_SDK_SetModel_Blob(char const*, unsigned, char const*) {
 char const* MorvaExt_LastError() {
     return "two engines at a time";
 }
+void MorvaExt_SetDiagnostics(void (*)(int, char const*)) {}
 }
 
 // The last user in one thread goes while the first in another comes.

@@ -53,7 +53,9 @@ fs::path findShipped(std::string const& file) {
                              " was not found; MORVA_MODELS can name its folder");
 }
 
-// From memory: registering a file would print its name on the host's standard output.
+// The host's standard output is not ours; what matters is in the reasons of errors.
+void keepQuiet(int /*stream*/, char const* /*text*/) {}
+
 void registerModel(fs::path const& path, std::string const& name) {
     std::ifstream stream(path, std::ios::binary);
     std::string const bytes{std::istreambuf_iterator<char>(stream), {}};
@@ -75,6 +77,7 @@ char const* firstFor(ShippedKind kind, int rateHz) {
 
 SharedEngine::SharedEngine() {
     std::lock_guard const lock(changing);
+    MorvaExt_SetDiagnostics(keepQuiet);
     if (users == 0 && Morva_SDK_GlobalInit(nullptr, 1) != 0) {
         throw std::runtime_error(reason("the engine cannot start"));
     }
