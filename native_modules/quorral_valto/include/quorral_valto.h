@@ -6,8 +6,9 @@
  *
  * Threads: Setup and Reset take locks and may print, keep them off the audio path. Process takes no
  * lock, but for a moment to tell of a frame that it refuses. What is printed goes to script instead
- * once the package's initialize() has run. One session belongs to one thread at a time; different sessions may run on different
- * threads. They may go on while the process ends: nothing that they need is destroyed then.
+ * once the package's initialize() has run. One session belongs to one thread at a time; different
+ * sessions may run on different threads. They may go on while the process ends: nothing that they
+ * need is destroyed then.
  */
 #ifndef QUORRAL_VALTO_H
 #define QUORRAL_VALTO_H
