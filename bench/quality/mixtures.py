@@ -10,7 +10,7 @@ before the first word and pauses between the sentences, so that pauses can be sc
 A share of the talkers stands in rooms, and so does the noise, elsewhere in such a room. The clean recording then keeps
 the direct sound and the reflections of the first 50 ms, which make a voice louder and fuller; what comes later is no
 part of it, so that a system may lower it. `clean-*` pairs hold speech only (noisy = clean), `faint-*` pairs speech with
-the noise of a quiet room 40 dB below it. `pairs.json` says of each pair what it holds.
+the noise of a quiet room 50 dB below it. `pairs.json` says of each pair what it holds.
 """
 
 from __future__ import annotations
@@ -30,7 +30,7 @@ from morva_training.measures import active_level
 from morva_training.rooms import EARLY_SECONDS
 
 SNRS_DB = (-5, 0, 5, 10, 15, 20)
-FAINT_DB = 40
+FAINT_DB = 50
 LEVELS_DB = (-36.0, -16.0)  # of the talker, below full scale
 BABBLERS = 6
 WORD = 1.5  # recordings shorter than so many seconds are words, and follow each other closely
