@@ -150,9 +150,9 @@ def pairs_of(draw: Draw, count: int, clean_count: int, room_share: float) -> lis
     pairs = []
     for number in range(count):
         speaker, kind = people[number % len(people)], every[number % len(every)]
-        place = "room" if draw.rooms and (number * room_share) % 1 + room_share >= 1 else "dry"
         snr = SNRS_DB[(number + number // len(SNRS_DB)) % len(SNRS_DB)]
-        pairs.append(Pair(f"{kind}-{number:03d}", speaker, bands[speaker], kind, snr, place))
+        inside = draw.rooms and (number // 2 * room_share) % 1 + room_share >= 1  # by twos: SNRs come one by one
+        pairs.append(Pair(f"{kind}-{number:03d}", speaker, bands[speaker], kind, snr, "room" if inside else "dry"))
     for number in range(clean_count):
         speaker = people[-1 - number % len(people)]
         pairs.append(Pair(f"clean-{number:03d}", speaker, bands[speaker]))
