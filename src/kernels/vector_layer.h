@@ -13,6 +13,8 @@
 
 #ifdef __x86_64__
 #define HWY_BASELINE_TARGETS HWY_AVX2
+#else
+#define TOOLCHAIN_MISS_SYS_AUXV_H  // to Highway: nothing beyond the baseline is asked for
 #endif
 #define HWY_DISABLED_TARGETS (HWY_AVX3_DL | HWY_SVE | HWY_SVE2 | HWY_SVE_256 | HWY_SVE2_128)
 #ifdef HWY_TARGET_INCLUDE

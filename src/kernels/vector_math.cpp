@@ -41,8 +41,8 @@ void accumulate(float const* a, float const* b, Floats (&sums)[kParts]) {
 
 // (s0 + s4) + (s2 + s6), (s1 + s5) + (s3 + s7), and the sum of the two.
 float sumOfAll(Floats const (&sums)[kParts]) {
-    constexpr hn::CappedTag<float, kSums / 2> four;
 #if HWY_CAP_GE256
+    constexpr hn::CappedTag<float, kSums / 2> four;
     auto const pairs = hn::Add(hn::LowerHalf(four, sums[0]), hn::UpperHalf(four, sums[0]));
 #else
     auto const pairs = hn::Add(sums[0], sums[1]);
