@@ -74,7 +74,8 @@ void BandLimitedInterpolator::forget(double passed) {
 // One output sample; moves the clock on.
 float BandLimitedInterpolator::interpolate() {
     double const fraction = filter_->fraction(phase_);
-    auto const base = static_cast<std::ptrdiff_t>(clock_ - fraction + 0.5);
+    double const next = clock_ - fraction + 0.5;  // never below zero: cut off, the nearest
+    auto const base = static_cast<std::ptrdiff_t>(next);
     double const drift = (clock_ - static_cast<double>(base)) - fraction;
     auto const side = drift > kNoDrift    ? InterpolationFilter::Drift::ahead
                       : drift < -kNoDrift ? InterpolationFilter::Drift::behind
