@@ -32,7 +32,7 @@ def test_sounds_of_every_kind_are_the_command_lines(command, speech, write, tmp_
         if rate in (8000, 16000, 32000, 96000):  # elsewhere the command line takes out a part of a sample, too
             np.testing.assert_allclose(clean / scale, wanted, rtol=0, atol=tolerance / 32768)
         for ours, theirs in zip(clean.T, wanted.T):
-            assert np.corrcoef(ours, theirs)[0, 1] > 0.98
+            assert np.corrcoef(ours, theirs)[0, 1] > 0.95
     for measure in (morva.voice, morva.noise_level):
         as_float = measure(pcm / 32768, rate, frame_ms=ms)
         np.testing.assert_array_equal(measure(pcm, rate, frame_ms=ms), as_float)
