@@ -73,7 +73,11 @@ char const* missingProcessorFeature() {
 }
 
 char const* processorFeatures() {
+#ifdef __aarch64__
+    return "neon";
+#else
     return "";
+#endif
 }
 
 }  // namespace MORVA::MORVA_SDK

@@ -21,8 +21,8 @@
  *   modes and traps of the thread change no result.
  *
  * Processor
- *   The engine needs an x86-64 processor of level v3 (AVX2, FMA, F16C, BMI, LZCNT, MOVBE); on any
- *   other Morva_SDK_GlobalInit says so on standard error and returns -3, and nothing else can be
+ *   Of x86-64 processors the engine needs level v3 (AVX2, FMA, F16C, BMI, LZCNT, MOVBE); on any
+ *   lower Morva_SDK_GlobalInit says so on standard error and returns -3, and nothing else can be
  *   called with success.
  *
  * Errors
