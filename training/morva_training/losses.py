@@ -188,7 +188,7 @@ class Envelope:
         self.bins = min(layout.bins, int(TRUSTED_EDGE_HZ / width_hz))
         turns = np.outer(np.arange(self.bins) + 0.5, np.arange(PREDICTION_ORDER + 1)) * (np.pi / self.bins)
         self.cosines = torch.tensor(np.cos(turns), dtype=torch.float32, device=device)
-        lag = torch.arange(PREDICTION_ORDER, device=device)
+        lag = torch.arange(PREDICTION_ORDER + 1, device=device)
         self.toeplitz = (lag[:, None] - lag[None]).abs()
 
     def correlations(self, power: Tensor, floor: Tensor) -> Tensor:
@@ -199,7 +199,7 @@ class Envelope:
 
     def predictor(self, correlation: Tensor) -> Tensor:
         """Coefficients [n, order + 1] of the prediction error's filter."""
-        matrix, right = correlation[:, self.toeplitz], correlation[:, 1:]
+        matrix, right = correlation[:, self.toeplitz[1:, 1:]], correlation[:, 1:]
         taps = torch.cholesky_solve(right[..., None], torch.linalg.cholesky(matrix))[..., 0]
         return torch.cat([torch.ones_like(taps[:, :1]), -taps], 1)
 
@@ -210,8 +210,7 @@ class Envelope:
         wanted, got = (self.correlations(power[spoken], floor) for power in (speech, result))
         if not len(wanted):
             return speech.new_zeros(())
-        lags = torch.arange(PREDICTION_ORDER + 1, device=wanted.device)
-        matrix = wanted[:, (lags[:, None] - lags[None]).abs()]
+        matrix = wanted[:, self.toeplitz]
         best, other = self.predictor(wanted), self.predictor(got)
         errors = [torch.einsum("ni,nij,nj->n", a, matrix, a) for a in (best, other)]
         return torch.log(errors[1] / errors[0]).clamp(0.0, UNLIKELIEST).mean()
