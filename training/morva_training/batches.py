@@ -86,13 +86,5 @@ class MixtureBatches(IterableDataset):
         maker = MixtureMaker(self.store, seed, self.recipe, self.split)
         rng = np.random.default_rng(seed + 1)
         while True:
-            drawn = [maker.draw() for _ in range(self.size // self.reuse)]
-            items = [make_item(m, rng) for m in drawn]
-            sources = [m for m in drawn if m.noisy]
-            while len(items) < self.size:
-                base = drawn[len(items) % len(drawn)]
-                if base.noisy and base.has_speech:
-                    other = sources[rng.integers(len(sources))]
-                    base = base.remixed(other, self.recipe.snr(rng))
-                items.append(make_item(base, rng))
+            items = [make_item(waves, rng) for waves in maker.draws(self.size, self.reuse)]
             yield {name: torch.stack([item[name] for item in items]) for name in items[0]}

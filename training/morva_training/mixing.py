@@ -97,35 +97,37 @@ class Recipe:
         return float(rng.uniform(low, high))
 
 
-RECIPES = {
-    "plain": Recipe(),
-    "widened": Recipe(
-        snr_db=(-10.0, 25.0),
-        hard_share=0.55,
-        level_db=(-46.0, -12.0),
-        speed_share=0.4,
-        speed=(0.85, 1.2),
-        formant_share=0.2,
-        room_share=0.5,
-        simulated_room_share=0.75,
-        early_only=True,
-        synthetic_share=0.0,
-        babble_share=0.1,
-        talkers=(3, 25),
-        made_share=0.35,
-        texture_share=0.15,
-        noise_room_share=0.25,
-        start_stop_share=0.15,
-        microphone_share=0.4,
-        band_limit_share=0.5,
-        band_limit_hz=(3400.0, 14000.0),
-        converter_share=0.5,
-        gain_step_share=0.1,
-        gap_share=0.04,
-        overload_share=0.03,
-        codec_share=0.12,
-    ),
-}
+# What the recordings alone give, and step by step what widens it.
+PLAIN = Recipe()
+MORE_NOISE = replace(
+    PLAIN,
+    snr_db=(-10.0, 25.0),
+    hard_share=0.55,
+    synthetic_share=0.0,
+    babble_share=0.1,
+    talkers=(3, 25),
+    made_share=0.35,
+    texture_share=0.15,
+    noise_room_share=0.25,
+    start_stop_share=0.15,
+)
+MORE_ROOMS = replace(MORE_NOISE, room_share=0.5, simulated_room_share=0.75, early_only=True)
+WIDENED = replace(
+    MORE_ROOMS,
+    level_db=(-46.0, -12.0),
+    speed_share=0.4,
+    speed=(0.85, 1.2),
+    formant_share=0.2,
+    microphone_share=0.4,
+    band_limit_share=0.5,
+    band_limit_hz=(3400.0, 14000.0),
+    converter_share=0.5,
+    gain_step_share=0.1,
+    gap_share=0.04,
+    overload_share=0.03,
+    codec_share=0.12,
+)
+RECIPES = {"plain": PLAIN, "noise": MORE_NOISE, "rooms": MORE_ROOMS, "widened": WIDENED}
 
 
 @dataclass(frozen=True)
@@ -429,3 +431,14 @@ class MixtureMaker:
             late=speech[1] * scale if len(speech) > 1 else None,
             channel=self.channel(),
         )
+
+    def draws(self, count: int, reuse: int) -> list[Waves]:
+        """So many pieces; every draw is used `reuse` times, each time in another noise."""
+        pieces = [self.draw() for _ in range(max(1, count // reuse))]
+        drawn, sources = len(pieces), [waves for waves in pieces if waves.noisy]
+        while len(pieces) < count:
+            base = pieces[len(pieces) % drawn]
+            if base.noisy and base.has_speech:
+                base = base.remixed(sources[self.rng.integers(len(sources))], self.recipe.snr(self.rng))
+            pieces.append(base)
+        return pieces

@@ -151,16 +151,23 @@ class PlainGatedNetwork(nn.Module):
     def initial_state(self, batch: int) -> Tensor:
         return self.output.new_zeros(batch, self.hidden)
 
-    def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
+    def hidden_layers(self, x: Tensor, state: Tensor) -> Tuple[List[Tensor], Tensor]:
+        """What each layer before the output hands on [T, B, H], and the last state."""
         h = self.hidden
         first = (self.update, self.rectified[0], self.linear[0])
         biases = (self.update_bias, self.rectified_bias[0], self.linear_bias[0])
         inputs = _product(x.transpose(0, 1), torch.cat([w[h:] for w in first], 1), self.products) + torch.cat(biases)
         y, state = plain_recurrence(inputs, state, torch.cat([w[:h] for w in first], 1))
+        layers = [y]
         for i in range(1, self.layers - 1):
             both = _product(y, torch.cat([self.rectified[i], self.linear[i]], 1), self.products)
             y = torch.relu(both[..., :h] + self.rectified_bias[i]) + both[..., h:] + self.linear_bias[i]
-        return (y @ self.output + self.output_bias).transpose(0, 1), state
+            layers.append(y)
+        return layers, state
+
+    def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
+        layers, state = self.hidden_layers(x, state)
+        return (layers[-1] @ self.output + self.output_bias).transpose(0, 1), state
 
 
 class Both(nn.Module):

@@ -3,6 +3,7 @@
 from __future__ import annotations
 
 import torch
+from scipy.linalg import qr
 from torch import Tensor
 
 from .networks import Network, PlainGatedNetwork
@@ -43,6 +44,32 @@ def widened(network: Network, hidden: int, seed: int = 1) -> Network:
     with torch.no_grad():
         for (name, value), target in zip(network.named_parameters(), result.parameters()):
             target.copy_(grown(name, value))
+    return result
+
+
+def narrowed(network: PlainGatedNetwork, hidden: int, x: Tensor) -> PlainGatedNetwork:
+    """A network with fewer units per layer: those from which the others' values on inputs x [B, T, F] are best guessed.
+
+    Units are chosen by a pivoted QR decomposition of each layer's values; what read a unit that is gone reads its least
+    squares estimate from the units that are left.
+    """
+    if hidden > network.hidden:
+        raise ValueError(f"cannot make {hidden} units of {network.hidden}")
+    kept, guesses = [], []
+    with torch.no_grad():
+        for values in network.hidden_layers(x, network.initial_state(len(x)))[0]:
+            values = values.flatten(0, 1)
+            units = torch.from_numpy(qr(values.numpy(), mode="r", pivoting=True)[1][:hidden].astype("int64"))
+            kept.append(units)
+            guesses.append(torch.linalg.lstsq(values[:, units], values).solution)
+        result = _like(network, hidden, network.outputs)
+        for (name, value), target in zip(network.named_parameters(), result.parameters()):
+            layer = int(name[-1]) if name[-1].isdigit() else 0
+            less = value if name.startswith("output") else value[..., kept[layer]]
+            if value.dim() == 2:
+                known = guesses[-1 if name.startswith("output") else max(0, layer - 1)]
+                less = torch.cat([known @ less[: network.hidden], less[network.hidden :]])
+            target.copy_(less)
     return result
 
 

@@ -26,7 +26,7 @@ from .measures import best_f1, quick_threshold, roc_auc
 from .mixing import Recipe
 from .mvw import Weight
 from .networks import Network, PlainGatedNetwork
-from .reshape import deepened, widened, with_outputs
+from .reshape import deepened, narrowed, widened, with_outputs
 from .voice import CONTEXT, DEV_RECIPE, FEATURES, VOICE_RECIPE, VoiceBatches
 
 F1_SLACK = 0.003
@@ -38,7 +38,7 @@ class VoiceTask(trainer.Task):
     context, skipped = CONTEXT, 5
 
     def batches(self, seed: int) -> VoiceBatches:
-        return VoiceBatches(self.args.store, self.args.batch, seed)
+        return VoiceBatches(self.args.store, self.args.batch, seed, reuse=self.args.reuse)
 
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         return features.mean(0), features.var(0).clamp_min(1e-2)
@@ -49,7 +49,10 @@ class VoiceTask(trainer.Task):
     def network(self, start: Weight | None) -> Network:
         args = self.args
         if start:
-            network = deepened(widened(network_of(start), args.hidden), args.layers)
+            network = network_of(start)
+            if args.hidden < network.hidden:
+                network = narrowed(network, args.hidden, self.inputs(next(iter(self.batches(args.seed)))))
+            network = deepened(widened(network, args.hidden), args.layers)
         else:
             network = PlainGatedNetwork(CONTEXT * FEATURES, args.hidden, 1, args.layers, linear_output=True)
         network = with_outputs(network, 1 + FEATURES)
@@ -103,6 +106,7 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     trainer.add_options(parser, steps=2500, batch=48, rate=1.5e-3, seed=3)
     parser.add_argument("--hidden", type=int, default=288)
     parser.add_argument("--layers", type=int, default=4, help="matrices, the output's included")
+    parser.add_argument("--reuse", type=int, default=3, help="mixtures made of one draw of speech and noise")
     parser.add_argument(
         "--bfloat16", action="store_true", help="less exact and quicker where the CPU has such products"
     )

@@ -66,8 +66,11 @@ class Task(ABC):
 
     def outputs(self, model: nn.Module, batch: dict[str, Tensor]) -> Tensor:
         """Logits [B, T, K] of the whole pieces."""
-        x = network_input(batch["features"].to(self.device), self.mean, self.input_scale, self.context)
+        x = self.inputs(batch)
         return model(x, model.initial_state(len(x)))[0]
+
+    def inputs(self, batch: dict[str, Tensor]) -> Tensor:
+        return network_input(batch["features"].to(self.device), self.mean, self.input_scale, self.context)
 
     def standardise(self, mean: list[float], spread: list[float]) -> None:
         self.mean = torch.tensor(mean, device=self.device)
@@ -111,6 +114,7 @@ def train_as(task: Task, rank: int) -> Run:
         some = torch.cat([next(batches)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
         mean, spread = (together.from_the_first(v) for v in task.statistics(some))
     extra = {"mean": mean.tolist(), "spread": spread.tolist(), "layout": task.layout}
+    task.standardise(**{key: extra[key] for key in ("mean", "spread")})
     run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate, args.core_minutes), extra)
     task.standardise(run.extra["mean"], run.extra["spread"])
     run.train(batches, task.loss, task.validate)

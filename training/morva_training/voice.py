@@ -30,13 +30,25 @@ VOICE_RECIPE = Recipe(
     pause_share=0.7,
     pause_seconds=1.0,
     babble_share=0.12,
+    talkers=(3, 25),
+    made_share=0.25,
+    texture_share=0.1,
+    start_stop_share=0.15,
+    noise_room_share=0.25,
     speed_share=0.75,
     speed=(0.78, 1.3),
     noise_speed_share=0.7,
     noise_speed=(0.65, 1.5),
     second_noise_share=0.45,
-    room_share=0.2,
+    formant_share=0.2,
+    room_share=0.3,
+    simulated_room_share=0.7,
+    early_only=True,
     full_band_share=0.12,  # few speakers, and the band above 4 kHz is of no use here
+    microphone_share=0.3,
+    gain_step_share=0.1,
+    overload_share=0.03,
+    codec_share=0.1,
     equaliser_db=4.5,
     boosted=("music", "keyboard", "mouse_click", "human_nonspeech", "baby_cry", "animal", "dog_bark", "cat", "birds"),
 )
@@ -98,20 +110,25 @@ def stream_features(samples: np.ndarray, frame: int, heard: np.ndarray | None = 
 
 
 class VoiceBatches(IterableDataset):
-    """Endless batches of features, labels and weights; the caller's frame changes from batch to batch."""
+    """Endless batches of features, labels and weights; the caller's frame changes from batch to batch.
+
+    Every draw is used `reuse` times, each time in another noise.
+    """
 
     FRAME_BLOCKS = (1, 1, 1, 1, 2, 3, 4)
 
     def __init__(
-        self, store: Path, size: int, seed: int, split: str = "train", recipe: Recipe = VOICE_RECIPE, blocks: int = 0
+        self,
+        store: Path,
+        size: int,
+        seed: int,
+        split: str = "train",
+        recipe: Recipe = VOICE_RECIPE,
+        blocks: int = 0,
+        reuse: int = 1,
     ) -> None:
         self.store, self.size, self.seed, self.split = store, size, seed, split
-        self.recipe, self.blocks = recipe, blocks
-
-    def piece(self, maker: MixtureMaker) -> tuple[np.ndarray, np.ndarray, np.ndarray, np.ndarray]:
-        """Noisy samples, clean samples, voice per block, weight per block."""
-        waves = maker.draw()
-        return waves.heard(), waves.speech, *block_labels(waves.speech, BLOCK)
+        self.recipe, self.blocks, self.reuse = recipe, blocks, reuse
 
     def __iter__(self) -> Iterator[dict[str, Tensor]]:
         worker = torch.utils.data.get_worker_info()
@@ -120,9 +137,10 @@ class VoiceBatches(IterableDataset):
         maker = MixtureMaker(self.store, seed, self.recipe, self.split, RATE)
         while True:
             blocks = self.blocks or int(maker.rng.choice(self.FRAME_BLOCKS))
-            pieces = [self.piece(maker) for _ in range(self.size)]
-            noisy, clean = (np.stack([p[i] for p in pieces]) for i in (0, 1))
-            voice, weight = (np.stack([frame_labels(p[i], blocks) for p in pieces]) for i in (2, 3))
+            pieces = maker.draws(self.size, self.reuse)
+            noisy, clean = np.stack([p.heard() for p in pieces]), np.stack([p.speech for p in pieces])
+            labels = [block_labels(p.speech, BLOCK) for p in pieces]
+            voice, weight = (np.stack([frame_labels(pair[i], blocks) for pair in labels]) for i in (0, 1))
             features = torch.from_numpy(stream_features(noisy, blocks * BLOCK))
             clean = torch.from_numpy(stream_features(clean, blocks * BLOCK, heard=noisy))
             yield {
