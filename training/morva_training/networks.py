@@ -16,6 +16,8 @@ import torch
 from torch import Tensor, nn
 from torch.nn import functional
 
+from .recurrence import recurrent
+
 
 @torch.jit.script
 def normalised_recurrence(
@@ -184,11 +186,8 @@ class Both(nn.Module):
         self.time = nn.GRU(channels, channels)
 
     def forward(self, x: Tensor) -> Tensor:
-        frames, pieces, bands, _ = x.shape
-        along = self.norms[0](x).permute(2, 0, 1, 3).flatten(1, 2)
-        across = self.mixed(self.bands(along)[0]).unflatten(1, (frames, pieces))
-        x = x + across.permute(1, 2, 0, 3)
-        return x + self.time(self.norms[1](x).flatten(1, 2))[0].unflatten(1, (pieces, bands))
+        x = x + self.mixed(recurrent(self.bands, self.norms[0](x), -2))
+        return x + recurrent(self.time, self.norms[1](x), 0)
 
 
 class BandSharedNetwork(nn.Module):
@@ -204,8 +203,8 @@ class BandSharedNetwork(nn.Module):
         self.place = nn.Parameter(torch.zeros(bins // 4, channels))  # where in the spectrum a band is
         self.blocks = nn.ModuleList(Both(channels, across) for _ in range(depth))
         self.spread = nn.ModuleList([nn.Linear(channels, 2 * half), nn.Linear(half, 2 * half)])
-        self.output = nn.Linear(3 * (half + context), 1)
-        nn.init.constant_(self.output.bias, 1.0)
+        self.output = nn.Linear(half + context, 3)  # what a bin says about the one above, itself and the one below
+        nn.init.constant_(self.output.bias, 1.0 / 3.0)
 
     def initial_state(self, batch: int) -> Tensor:
         return self.place.new_zeros(batch)
@@ -213,8 +212,8 @@ class BandSharedNetwork(nn.Module):
     @staticmethod
     def neighbours(x: Tensor, count: int, step: int) -> Tensor:
         """Windows of `count` bins [..., F / step, count * C] of x [..., F, C]."""
-        padded = functional.pad(x, (0, 0, count // 2, count // 2))
-        return padded.unfold(-2, count, step).flatten(-2)
+        size, padded = x.shape[-2], functional.pad(x, (0, 0, count // 2, count // 2))
+        return torch.cat([padded[..., i : i + size : step, :] for i in range(count)], -1)
 
     def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
         seen = x.unflatten(-1, (self.context, self.bins)).permute(1, 0, 3, 2)
@@ -224,7 +223,8 @@ class BandSharedNetwork(nn.Module):
             y = block(y)
         y = functional.relu(self.spread[0](y).unflatten(-1, (2, -1)).flatten(-3, -2) + fine)
         y = functional.relu(self.spread[1](y).unflatten(-1, (2, -1)).flatten(-3, -2))
-        logits = self.output(self.neighbours(torch.cat([y, seen], -1), 3, 1))[..., 0]
+        above, same, below = self.output(torch.cat([y, seen], -1)).unbind(-1)
+        logits = same + functional.pad(above, (1, 0))[..., :-1] + functional.pad(below, (0, 1))[..., 1:]
         return logits.transpose(0, 1), state
 
 
