@@ -2,11 +2,12 @@
 
 The calibration uses the validation share of the training speakers, and noise alone for nearly half
 of the time, as in a call where the others talk: the middle is the lowest logit with about the best
-F1, low and high are the 10th and 90th percentile. Further out nothing is in doubt, and the scores of
+F1 that no more than a tenth of the frames without voice pass, low and high are the 10th and 90th percentile. Further out nothing is in doubt, and the scores of
 what is keep their distance from one half.
 
 While it learns, the network also says what share of each feature is speech: who finds the speech
-under the noise knows where it is. The weight file keeps the voice's column only.
+under the noise knows where it is. The weight file keeps the voice's column only. With `--teacher` the scores of a
+larger network count as much as the labels.
 """
 
 from __future__ import annotations
@@ -14,28 +15,46 @@ from __future__ import annotations
 import argparse
 import functools
 from dataclasses import replace
+from pathlib import Path
+from typing import Callable
 
 import numpy as np
 import torch
 from torch import Tensor, nn
 from torch.nn.functional import binary_cross_entropy_with_logits
 
-from . import trainer
+from . import mvw, trainer
 from .convert import network_of, voice_weight
 from .measures import best_f1, quick_threshold, roc_auc
 from .mixing import Recipe
 from .mvw import Weight
-from .networks import Network, PlainGatedNetwork
+from .networks import Network, PlainGatedNetwork, network_input
 from .reshape import deepened, narrowed, widened, with_outputs
 from .voice import CONTEXT, DEV_RECIPE, FEATURES, VOICE_RECIPE, VoiceBatches
 
 F1_SLACK = 0.003
 QUIET_SHARE = 0.45  # of the calibration's pieces, noise only
+MOST_FALSE = 0.1  # of the frames without voice
 SPEECH_SHARE = 0.15  # of the loss, for the speech in each feature
 
 
 class VoiceTask(trainer.Task):
     context, skipped = CONTEXT, 5
+
+    @functools.cached_property
+    def teacher(self) -> Callable[[Tensor], Tensor] | None:
+        """Logits of features, from a weight file with its own statistics."""
+        if not self.args.teacher:
+            return None
+        weight = mvw.read(self.args.teacher)
+        network = network_of(weight).to(self.device)
+        mean, spread = (torch.from_numpy(weight[key]).to(self.device) for key in ("MU", "SD"))
+
+        def logits(features: Tensor) -> Tensor:
+            x = network_input(features.to(self.device), mean, self.scale(spread), self.context)
+            return network(x, network.initial_state(len(x)))[0][..., 0]
+
+        return logits
 
     def batches(self, seed: int) -> VoiceBatches:
         return VoiceBatches(self.args.store, self.args.batch, seed, reuse=self.args.reuse)
@@ -63,6 +82,10 @@ class VoiceTask(trainer.Task):
     def loss(self, model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
         y = self.outputs(model, batch)[:, self.skipped :]
         voice, weight, speech = (batch[k].to(self.device)[:, self.skipped :] for k in ("voice", "weight", "speech"))
+        if self.teacher:
+            with torch.no_grad():
+                teaching = torch.sigmoid(self.teacher(batch["features"])[:, self.skipped :])
+            voice = 0.5 * (voice + teaching)
         loss = binary_cross_entropy_with_logits(y[..., 0], voice, weight)
         error = binary_cross_entropy_with_logits(y[..., 1:], speech)
         return loss + SPEECH_SHARE * error, {"loss": loss.item(), "speech": error.item()}
@@ -94,7 +117,8 @@ class VoiceTask(trainer.Task):
         calibration = self.kept_back(6, replace(VOICE_RECIPE, noise_only_share=QUIET_SHARE))
         scores, voice = self.scored(model, calibration)
         low, high = np.percentile(scores, [10, 90])
-        points = [float(low), quick_threshold(scores, voice, F1_SLACK), float(high)]
+        middle = max(quick_threshold(scores, voice, F1_SLACK), np.quantile(scores[~voice], 1.0 - MOST_FALSE))
+        points = [float(low), float(middle), float(high)]
         print("calibration", points, self.validate(model))
         return voice_weight(with_outputs(model, 1), mean, spread, points)
 
@@ -106,6 +130,7 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     trainer.add_options(parser, steps=2500, batch=48, rate=1.5e-3, seed=3)
     parser.add_argument("--hidden", type=int, default=288)
     parser.add_argument("--layers", type=int, default=4, help="matrices, the output's included")
+    parser.add_argument("--teacher", type=Path, help="weight file of a larger network")
     parser.add_argument("--reuse", type=int, default=3, help="mixtures made of one draw of speech and noise")
     parser.add_argument(
         "--bfloat16", action="store_true", help="less exact and quicker where the CPU has such products"
