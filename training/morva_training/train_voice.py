@@ -13,6 +13,7 @@ from __future__ import annotations
 
 import argparse
 import functools
+from collections.abc import Iterator
 from dataclasses import replace
 
 import numpy as np
@@ -37,8 +38,8 @@ SPEECH_SHARE = 0.15  # of the loss, for the speech in each feature
 class VoiceTask(trainer.Task):
     context, skipped = CONTEXT, 5
 
-    def batches(self, seed: int) -> VoiceBatches:
-        return VoiceBatches(self.args.store, self.args.batch, seed, reuse=self.args.reuse)
+    def batches(self, seed: int) -> Iterator[dict[str, Tensor]]:
+        return self.loaded(VoiceBatches(self.args.store, self.args.batch, seed, reuse=self.args.reuse))
 
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         return features.mean(0), features.var(0).clamp_min(1e-2)
