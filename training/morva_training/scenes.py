@@ -47,7 +47,8 @@ class SceneMaker:
         clean = clean & has_speech
         wideband, speech = self.speech(pieces)
         noise = self.noises(pieces)
-        noise[rows_of(clean)] = self.background(int(clean.sum()))
+        if len(rows := rows_of(clean)):
+            noise[rows] = self.background(len(rows))
         speech = speech * has_speech[:, None]
         wanted, late, noise = self.over_time(*self.through_rooms_and_microphones(speech, noise))
         level = FULL_SCALE * 10 ** (c.uniform(pieces, low=r.level_db[0], high=r.level_db[1]) / 20)
@@ -154,11 +155,9 @@ class SceneMaker:
             out[rows] = self.made(len(rows))
         if len(rows := rows_of(~made)):
             out[rows] = self.recorded(self.pool.noises, len(rows))
-        some = rows_of(~made & c.happens(r.start_stop_share, pieces))
-        if len(some):
+        if len(some := rows_of(~made & c.happens(r.start_stop_share, pieces))):
             out[some] = connections.started_and_stopped(c, out[some], BASE_RATE)
-        some = rows_of(~made & c.happens(r.noise_room_share, pieces))
-        if len(some):
+        if len(some := rows_of(~made & c.happens(r.noise_room_share, pieces))):
             rooms = torch.fft.rfft(self.rooms(len(some)).sum(1), self.size)
             out[some] = torch.fft.irfft(torch.fft.rfft(out[some], self.size) * rooms, self.size)[:, : self.count]
         return out / (active_levels(out, BLOCK) + 1e-3)[:, None]
@@ -166,8 +165,7 @@ class SceneMaker:
     def noises(self, pieces: int) -> Tensor:
         c = self.chance
         out = self.one_noise(pieces)
-        rows = rows_of(c.happens(self.recipe.second_noise_share, pieces))
-        if len(rows):
+        if len(rows := rows_of(c.happens(self.recipe.second_noise_share, pieces))):
             level = 10 ** (c.uniform(len(rows), 1, low=-12.0, high=3.0) / 20)
             out[rows] += level * self.one_noise(len(rows))
         return out
@@ -177,8 +175,7 @@ class SceneMaker:
         c = self.chance
         out = connections.coloured(c, pieces, self.count, BASE_RATE)
         if self.pool.room_tone:
-            rows = rows_of(c.happens(0.5, pieces))
-            if len(rows):
+            if len(rows := rows_of(c.happens(0.5, pieces))):
                 out[rows] = self.recorded(self.pool.room_tone, len(rows))
         return out
 
@@ -193,8 +190,7 @@ class SceneMaker:
         microphone = connections.gains(c, pieces, self.size // 2 + 1, BASE_RATE, r, CONVERTER_HZ)
         spectra = torch.fft.rfft(speech, self.size)
         parts = torch.stack([spectra, torch.zeros_like(spectra)], 1)
-        rows = rows_of(c.happens(r.room_share, pieces))
-        if len(rows):
+        if len(rows := rows_of(c.happens(r.room_share, pieces))):
             rooms = torch.fft.rfft(self.rooms(len(rows)), self.size)
             if not r.early_only:
                 rooms = torch.stack([rooms.sum(1), torch.zeros_like(rooms[:, 0])], 1)

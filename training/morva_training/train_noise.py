@@ -78,8 +78,10 @@ class NoiseTask(trainer.Task):
         return [vars(Batch.of(next(source), self.layout, self.device)) for _ in range(4)]
 
     def validate(self, model: nn.Module) -> dict[str, float]:
+        state = self.state  # goes on afterwards
         with torch.no_grad():
             results = [self.loss(model, batch) for batch in self.dev]
+        self.state = state
         parts = [{"loss": loss.item(), **terms} for loss, terms in results]
         return {name: float(np.mean([p[name] for p in parts])) for name in parts[0]}
 

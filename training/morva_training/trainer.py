@@ -82,8 +82,7 @@ class Task(ABC):
         x = self.inputs(batch)
         goes_on = lead > 0 and self.state is not None  # a run may begin in the middle of a piece
         y, state = model(x, self.state if goes_on else model.initial_state(len(x)))
-        if torch.is_grad_enabled():  # what validation hears is no part of it
-            self.state = state.detach().nan_to_num()
+        self.state = state.detach().nan_to_num()
         return y
 
     def inputs(self, batch: dict[str, Tensor]) -> Tensor:
