@@ -20,7 +20,7 @@ from torch import Tensor, nn
 
 SOURCE = Path(__file__).with_name("recurrence.cpp")
 MOST_ROWS = 32768  # that libraries of GPUs take at once
-FLAGS = ("-std=c++20", "-O3", "-march=native", "-ffast-math", "-shared", "-fPIC")
+FLAGS = ("-std=c++20", "-O3", "-march=native", "-ffast-math", "-Wno-psabi", "-shared", "-fPIC")
 
 
 class _Layer(ctypes.Structure):

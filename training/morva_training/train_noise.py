@@ -105,7 +105,7 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     parser.add_argument("--carry", type=int, default=1, help="consecutive pieces through which the state is carried")
     parser.add_argument("--on-device", action="store_true", help="mix where the network is, from a pool in its memory")
     parser.add_argument("--made-hours", type=float, default=1.0, help="with --on-device, of noise made by --workers")
-    parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw of speech and noise")
+    parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw, unless --on-device")
     for term in TERMS:
         parser.add_argument(f"--{term.replace('_', '-')}", type=float, help="weight of this part of the loss")
     args = parser.parse_args(arguments)

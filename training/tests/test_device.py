@@ -9,7 +9,7 @@ import numpy as np
 import pytest
 import torch
 
-from morva_training import pack, recurrence, train_noise, unpack
+from morva_training import drift, pack, recurrence, train_noise, unpack
 from morva_training.batches import Batch
 from morva_training.corpus import Corpus
 from morva_training.drawing import active_levels, interpolated
@@ -69,7 +69,9 @@ def test_other_speeds_keep_the_level_and_add_nothing(speed: float) -> None:
 
 
 @pytest.mark.parametrize("network", [["--hidden", "8"], ["--band-shared"]])
-def test_a_state_that_is_carried_is_that_of_the_whole(store: Path, tmp_path: Path, network: list[str]) -> None:
+def test_a_state_that_is_carried_is_that_of_the_whole(
+    store: Path, tmp_path: Path, capsys: pytest.CaptureFixture, network: list[str]
+) -> None:
     """And a run on the device goes on from part to part."""
     options = ["8k", "--store", store, "--run", tmp_path, "--on-device", "--carry", 3, "--seconds", 1, "--batch", 4]
     options += ["--made-hours", 0, "--steps", 4, "--workers", 0, *network]
@@ -83,7 +85,12 @@ def test_a_state_that_is_carried_is_that_of_the_whole(store: Path, tmp_path: Pat
     at_once = task.outputs(model, vars(whole))
     assert torch.allclose(torch.cat([task.outputs(model, part) for part in parts], 1), at_once, atol=1e-4)
     train_noise.main(arguments)
-    assert (tmp_path / "best.pt").exists()
+    drift.main(["8k", str(tmp_path), "--store", str(store), "--seconds", "2", "--stretch", "1", "--pieces", "1"])
+    first, second = capsys.readouterr().out.splitlines()[1:]
+    assert first.split()[3:6] == first.split()[6:], "both have heard all there was"
+    assert float(second.split()[3]) == pytest.approx(float(second.split()[6]), abs=1e-3), (
+        "a second is less than --before"
+    )
 
 
 @pytest.mark.parametrize("dim,both_ways,state", [(0, False, True), (-2, True, False)])
