@@ -64,7 +64,8 @@ class Pool:
     noises: Clips
     room_tone: Clips | None
     made: Tensor | None  # [n, samples] int16: noise that no recording holds
-    rooms: Tensor  # [n, 2, samples]: early and late
+    rooms: Tensor  # [n, 2, samples]: early and late; simulated ones and, behind them, recorded ones
+    simulated: int  # how many
 
     @staticmethod
     def of(
@@ -83,13 +84,15 @@ class Pool:
         # What one is louder than the next is the recordists' choice.
         gains = {c.path: 1000.0 / (active_level(maker.corpus.read(c), BASE_RATE) + 1.0) for c in long}
         tone = {name: clips for name, clips in maker.categories.items() if name == "room_tone"}
-        every = [room for some in rooms for room in some] + [_room_parts(room) for room in maker.rooms]
+        simulated = [room for some in rooms for room in some]
+        recorded = [_room_parts(room) for room in maker.rooms]
         return Pool(
             {b: Clips.of(speech, v, maker.voice_odds[b], {}) for b, v in maker.voices.items() if v},
             Clips.of(noise, maker.categories, maker.category_odds, gains),
             Clips.of(noise, tone, odds_of(tone), gains) if tone else None,
             torch.from_numpy(np.concatenate(made)).to(device) if len(made[0]) else None,
-            torch.from_numpy(np.stack(every)).to(device),
+            torch.from_numpy(np.stack(simulated + recorded)).to(device),
+            len(simulated),
         )
 
 

@@ -181,8 +181,11 @@ class SceneMaker:
 
     def rooms(self, pieces: int) -> Tensor:
         """[pieces, 2, samples]: the early and the late part."""
-        number = torch.full((pieces,), len(self.pool.rooms), device=self.device)
-        return self.pool.rooms[self.chance.below(number)]
+        c, simulated = self.chance, self.pool.simulated
+        recorded = len(self.pool.rooms) - simulated
+        chosen = c.happens(self.recipe.simulated_room_share if recorded else 1.0, pieces)
+        number = c.below(torch.where(chosen, simulated, recorded))
+        return self.pool.rooms[torch.where(chosen, number, simulated + number)]
 
     def through_rooms_and_microphones(self, speech: Tensor, noise: Tensor) -> tuple[Tensor, Tensor, Tensor]:
         """The wanted part of the speech, the rest of it, and the noise, which stands in another place."""
