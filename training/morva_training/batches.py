@@ -18,6 +18,7 @@ from .mixing import MixtureMaker, Recipe, Waves
 from .spectra import FULL_32K, Layout, analyse, frame_energies, level_gains, log_features, power_of
 
 SILENCE = 1e-10  # power that every bin has at least
+QUIET = 1e-3  # of a piece's mean power; nobody speaks in a part that is below
 
 
 @dataclass
@@ -30,6 +31,7 @@ class Batch:
     product: Tensor  # Re(X S*)
     wideband: Tensor  # [B] bool
     has_speech: Tensor  # [B] bool
+    lead: int = 0  # frames of features before the first of the others
 
     @staticmethod
     @torch.no_grad()
@@ -50,6 +52,23 @@ class Batch:
             wideband=waves["wideband"],
             has_speech=waves["has_speech"],
         )
+
+    def parts(self, count: int, lead: int) -> Iterator[Batch]:
+        """Consecutive parts of one length; all but the first have `lead` frames of features from before."""
+        frames = self.noisy_power.shape[1] // count
+        loud = self.speech_power.sum(-1)
+        for start in range(0, count * frames, frames):
+            cut, before = slice(start, start + frames), lead if start else 0
+            spoken = loud[:, cut].mean(1) > QUIET * loud.mean(1)
+            yield Batch(
+                self.features[:, start - before : start + frames],
+                self.noisy_power[:, cut],
+                self.speech_power[:, cut],
+                self.product[:, cut],
+                self.wideband,
+                self.has_speech & spoken,
+                before,
+            )
 
 
 def lower_part(spectra: Tensor, layout: Layout) -> Tensor:

@@ -82,6 +82,13 @@ def in_blocks(samples: np.ndarray, rate: int, coarseness: float) -> np.ndarray:
     return (np.rint(blocks / step) * step).reshape(-1)[: len(samples)].astype(np.float32)
 
 
+def bands_of_codec(rate: int) -> tuple[np.ndarray, np.ndarray]:
+    """The first bins and the widths of the bands of `in_bands`."""
+    size = rate // 50
+    edges = np.concatenate([[0], np.unique(np.geomspace(4, size // 2, 18).astype(int))[:-1]])
+    return edges, np.diff(np.append(edges, size // 2))
+
+
 def in_bands(samples: np.ndarray, rate: int, coarseness: float) -> np.ndarray:
     """What perceptual codecs leave: coarse steps per band and frame, coarser above, and holes where it is soft."""
     size = rate // 50
@@ -90,9 +97,7 @@ def in_bands(samples: np.ndarray, rate: int, coarseness: float) -> np.ndarray:
     window = np.sin(np.pi * (np.arange(size) + 0.5) / size).astype(np.float32)
     spectra = sfft.rfft((frames * window).astype(np.float32), axis=-1)[..., : size // 2]
     power = np.square(spectra.real) + np.square(spectra.imag)
-    edges = np.unique(np.geomspace(4, size // 2, 18).astype(int))[:-1]
-    edges = np.concatenate([[0], edges])
-    widths = np.diff(np.append(edges, size // 2))
+    edges, widths = bands_of_codec(rate)
     level = np.sqrt(np.add.reduceat(power, edges, axis=-1) / widths)
     loudest = level.max(axis=-1, keepdims=True)
     step = level * (0.3 + 1.6 * coarseness) * np.linspace(0.5, 1.5, len(edges)) + 1e-4 * 10**coarseness * loudest + 1e-3

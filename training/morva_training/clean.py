@@ -42,7 +42,7 @@ def main(arguments: list[str] | None = None) -> None:
     parser.add_argument("output", type=Path)
     args = parser.parse_args(arguments)
     torch.set_num_threads(1)
-    network, extra = torch.load(args.run / "best.pt")
+    network, extra = torch.load(args.run / "best.pt", map_location="cpu", weights_only=False)
     layout: Layout = extra["layout"]
     samples = read_audio(args.input, layout.rate) * 32768.0
     result = cleaned(samples, network, layout, *(torch.tensor(extra[key]) for key in ("mean", "spread")))

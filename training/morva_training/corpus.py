@@ -24,7 +24,7 @@ import re
 import tempfile
 import zlib
 from collections import defaultdict
-from collections.abc import Callable
+from collections.abc import Callable, Iterable
 from contextlib import contextmanager
 from dataclasses import dataclass
 from pathlib import Path
@@ -104,27 +104,29 @@ def _new_file(folder: Path, name: Callable[[], str]) -> Iterator[BinaryIO]:
         raise
 
 
-def _decode(rows: list[Row], root: Path, out: Path, kind: str, rate: int) -> dict[str, Any]:
-    """Every row's recording below `root` in one file of `out`; its entry in the index."""
+def _decoded(rows: list[Row], root: Path, kind: str, rate: int) -> Iterator[tuple[dict[str, Any], np.ndarray]]:
+    """What is known of every row's recording below `root`, and its samples."""
+    for row in tqdm(rows, desc=f"decoding {kind}", mininterval=2.0):
+        known = {
+            "path": row["path"],
+            "split": row.get("split") or "train",
+            "group": row.get("speaker") or row.get("category") or "",
+            "band": row.get("band") or "full",
+            "recording": recording_of(row),
+        }
+        yield known, to_int16(read_audio(root / row["path"], rate))
+
+
+def _write(clips: Iterable[tuple[dict[str, Any], np.ndarray]], out: Path, kind: str, rate: int) -> dict[str, Any]:
+    """All clips in one file of `out`; its entry in the index."""
     digest = hashlib.sha256()
     entry: dict[str, Any] = {"clips": []}
     position = 0
     with _new_file(out, lambda: _samples_file(kind, rate, digest.hexdigest()[:12])) as file:
-        for row in tqdm(rows, desc=f"decoding {kind}", mininterval=2.0):
-            samples = to_int16(read_audio(root / row["path"], rate))
+        for known, samples in clips:
             file.write(samples.tobytes())
             digest.update(samples.tobytes())
-            entry["clips"].append(
-                {
-                    "path": row["path"],
-                    "start": position,
-                    "length": len(samples),
-                    "split": row.get("split") or "train",
-                    "group": row.get("speaker") or row.get("category") or "",
-                    "band": row.get("band") or "full",
-                    "recording": recording_of(row),
-                }
-            )
+            entry["clips"].append({**known, "start": position, "length": len(samples)})
             position += len(samples)
     return {"content": digest.hexdigest()[:12], **entry}
 
@@ -133,8 +135,8 @@ def _samples_file(kind: str, rate: int, content: str) -> str:
     return f"{kind}-{rate}-{content}.i16"
 
 
-def _rooms(rows: list[Row], root: Path, out: Path, rate: int) -> str:
-    """Room responses, scaled to unit energy of the direct sound and cut at 0.8 s; the file's name."""
+def _rooms(rows: list[Row], root: Path, rate: int) -> dict[str, np.ndarray]:
+    """Room responses, scaled to unit energy of the direct sound and cut at 0.8 s."""
     rooms: dict[str, np.ndarray] = {}
     for number, row in enumerate(rows):
         response = read_audio(root / row["path"], rate)[: int(0.8 * rate)]
@@ -142,26 +144,33 @@ def _rooms(rows: list[Row], root: Path, out: Path, rate: int) -> str:
         direct = response[max(0, peak - margin) : peak + margin]
         response = response[max(0, peak - margin) :] / (np.sqrt(np.sum(direct**2)) + 1e-9)
         rooms[f"{row.get('split') or 'train'}-{number:04d}"] = response.astype(np.float32)
-    digest = hashlib.sha256(b"".join(name.encode() + room.tobytes() for name, room in rooms.items()))
-    name = f"rooms-{digest.hexdigest()[:12]}.npz"
-    with _new_file(out, lambda: name) as file:
-        np.savez(file, **rooms)
-    return name
+    return rooms
 
 
-def build(tables: dict[str, list[Row]], root: Path, out: Path, rate: int = BASE_RATE) -> None:
-    """Writes the store of the recordings below `root` that the tables "speech", "noise" and "rir" name."""
-    if len({row.get("split") == UNSEEN for rows in tables.values() for row in rows}) > 1:
-        raise ValueError("unseen recordings belong in a store of their own, where no training looks")
+def write_store(
+    clips: dict[str, Iterable[tuple[dict[str, Any], np.ndarray]]], rooms: dict[str, np.ndarray], out: Path, rate: int
+) -> None:
+    """Writes a store of the clips of each kind, what the index says of them and their samples, and named rooms."""
     out.mkdir(parents=True, exist_ok=True)
-    index: dict[str, Any] = {kind: _decode(tables[kind], root, out, kind, rate) for kind in KINDS}
-    index |= {"rate": rate, "rooms": _rooms(tables.get("rir", []), root, out, rate)}
+    index: dict[str, Any] = {kind: _write(clips[kind], out, kind, rate) for kind in KINDS}
+    digest = hashlib.sha256(b"".join(name.encode() + room.tobytes() for name, room in rooms.items()))
+    index |= {"rate": rate, "rooms": f"rooms-{digest.hexdigest()[:12]}.npz"}
+    with _new_file(out, lambda: index["rooms"]) as file:
+        np.savez(file, **rooms)
     with _new_file(out, lambda: "index.json") as file:
         file.write(json.dumps(index).encode())
     contents = {index[kind]["content"] for kind in KINDS}
     for file in [*out.glob("*.i16"), *out.glob("rooms-*.npz")]:
         if file.name != index["rooms"] and file.stem.rsplit("-", 1)[-1] not in contents:
             file.unlink()  # of the store that was here before
+
+
+def build(tables: dict[str, list[Row]], root: Path, out: Path, rate: int = BASE_RATE) -> None:
+    """Writes the store of the recordings below `root` that the tables "speech", "noise" and "rir" name."""
+    if len({row.get("split") == UNSEEN for rows in tables.values() for row in rows}) > 1:
+        raise ValueError("unseen recordings belong in a store of their own, where no training looks")
+    clips = {kind: _decoded(tables[kind], root, kind, rate) for kind in KINDS}
+    write_store(clips, _rooms(tables.get("rir", []), root, rate), out, rate)
 
 
 @dataclass(frozen=True)
@@ -174,6 +183,7 @@ class Clip:
     length: int
     group: str  # speaker of speech, category of noise
     band: str  # "full", or "8k" when the recording holds nothing above 8 kHz
+    recording: str  # what was recorded in one go
 
 
 def _kept_back(clips: list[dict[str, Any]], kind: str) -> set[str]:
@@ -225,8 +235,7 @@ class Corpus:
         self._clips = {kind: self._by_split(kind) for kind in KINDS}
 
     def _at_rate(self, kind: str) -> np.ndarray:
-        entry, ratio = self._index[kind], self._base_rate // self.rate
-        target = self._folder / _samples_file(kind, self.rate, entry["content"])
+        entry, ratio, target = self._index[kind], self._base_rate // self.rate, self.file_of(kind)
         if not target.exists():
             base = _mapped(self._folder / _samples_file(kind, self._base_rate, entry["content"]))
             low = _decimated(base, entry["clips"], ratio)
@@ -234,12 +243,18 @@ class Corpus:
                 low.tofile(file)
         return _mapped(target)
 
+    def file_of(self, kind: str) -> Path:
+        """All samples of a kind, in which `start` of a clip counts."""
+        return self._folder / _samples_file(kind, self.rate, self._index[kind]["content"])
+
     def _by_split(self, kind: str) -> dict[str, list[Clip]]:
         splits: dict[str, list[Clip]] = {"train": [], "dev": [], "heldout": [], UNSEEN: []}
         ratio, listed = self._base_rate // self.rate, self._index[kind]["clips"]
-        kept = _kept_back(listed, kind)
+        known = any(c["split"] == "dev" for c in listed)
+        kept = set() if known else _kept_back(listed, kind)
         for c in listed:
-            clip = Clip(kind, c["path"], _scaled_start(c["start"], ratio), c["length"] // ratio, c["group"], c["band"])
+            start, length = _scaled_start(c["start"], ratio), c["length"] // ratio
+            clip = Clip(kind, c["path"], start, length, c["group"], c["band"], c["recording"])
             dev = c["split"] == "train" and _identity(c, kind) in kept
             splits["dev" if dev else c["split"]].append(clip)
         if not splits["dev"]:  # too few recordings to keep some back

@@ -52,7 +52,7 @@ class Schedule:
 def steps_done(folder: Path) -> int:
     """How far the run in a folder has come."""
     checkpoint = folder / "checkpoint.pt"
-    return torch.load(checkpoint, map_location="cpu")["step"] if checkpoint.exists() else 0
+    return torch.load(checkpoint, map_location="cpu", weights_only=False)["step"] if checkpoint.exists() else 0
 
 
 class Run:
@@ -79,7 +79,7 @@ class Run:
         return self.folder / "checkpoint.pt"
 
     def _resume(self) -> None:
-        state = torch.load(self.checkpoint, map_location="cpu")
+        state = torch.load(self.checkpoint, map_location="cpu", weights_only=False)
         self.network.load_state_dict(state["network"])
         self.averaged.load_state_dict(state["averaged"])
         self.optimiser.load_state_dict(state["optimiser"])

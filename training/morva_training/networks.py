@@ -58,11 +58,12 @@ def plain_recurrence(inputs: Tensor, state: Tensor, weights: Tensor) -> Tuple[Te
     return torch.stack(outputs), state
 
 
-def network_input(features: Tensor, mean: Tensor, scale: Tensor, context: int) -> Tensor:
-    """Standardised features with their context, oldest first; before the start there is silence."""
-    padded = functional.pad(features, (0, 0, context - 1, 0))
+def network_input(features: Tensor, mean: Tensor, scale: Tensor, context: int, goes_on: bool = False) -> Tensor:
+    """Standardised features with their context, oldest first; before the start there is silence, unless the first
+    context - 1 frames are what was there."""
+    padded = features if goes_on else functional.pad(features, (0, 0, context - 1, 0))
     standard = (padded - mean) / scale
-    count = features.shape[1]
+    count = padded.shape[1] - context + 1
     return torch.cat([standard[:, i : i + count] for i in range(context)], dim=-1)
 
 
@@ -175,7 +176,7 @@ class PlainGatedNetwork(nn.Module):
 class Both(nn.Module):
     """Recurrence over the bands, both ways, then over time; the weights are those of every band and frame.
 
-    x [T, B, F, C] to the same shape.
+    x [T, B, F, C] to the same shape; states [B * F, C].
     """
 
     def __init__(self, channels: int, across: int) -> None:
@@ -185,9 +186,10 @@ class Both(nn.Module):
         self.mixed = nn.Linear(2 * across, channels)
         self.time = nn.GRU(channels, channels)
 
-    def forward(self, x: Tensor) -> Tensor:
+    def forward(self, x: Tensor, state: Tensor) -> tuple[Tensor, Tensor]:
         x = x + self.mixed(recurrent(self.bands, self.norms[0](x), -2))
-        return x + recurrent(self.time, self.norms[1](x), 0)
+        y = recurrent(self.time, self.norms[1](x), 0, state)
+        return x + y, y[-1].flatten(0, 1)
 
 
 class BandSharedNetwork(nn.Module):
@@ -207,7 +209,7 @@ class BandSharedNetwork(nn.Module):
         nn.init.constant_(self.output.bias, 1.0 / 3.0)
 
     def initial_state(self, batch: int) -> Tensor:
-        return self.place.new_zeros(batch)
+        return self.place.new_zeros(len(self.blocks), batch * len(self.place), self.channels)
 
     @staticmethod
     def neighbours(x: Tensor, count: int, step: int) -> Tensor:
@@ -219,13 +221,15 @@ class BandSharedNetwork(nn.Module):
         seen = x.unflatten(-1, (self.context, self.bins)).permute(1, 0, 3, 2)
         fine = functional.relu(self.gather[0](self.neighbours(seen, 5, 2)))
         y = functional.relu(self.gather[1](self.neighbours(fine, 3, 2))) + self.place
-        for block in self.blocks:
-            y = block(y)
+        states = []
+        for block, before in zip(self.blocks, state):
+            y, after = block(y, before)
+            states.append(after)
         y = functional.relu(self.spread[0](y).unflatten(-1, (2, -1)).flatten(-3, -2) + fine)
         y = functional.relu(self.spread[1](y).unflatten(-1, (2, -1)).flatten(-3, -2))
         above, same, below = self.output(torch.cat([y, seen], -1)).unbind(-1)
         logits = same + functional.pad(above, (1, 0))[..., :-1] + functional.pad(below, (0, 1))[..., 1:]
-        return logits.transpose(0, 1), state
+        return logits.transpose(0, 1), torch.stack(states)
 
 
 Network = LayerNormGatedNetwork | PlainGatedNetwork | BandSharedNetwork

@@ -1,7 +1,7 @@
 // Forward and backward loop of a gated recurrent layer (as torch.nn.GRU has it) over many short
 // rows at once.
 //
-// 32 rows travel together, one per lane of two vectors, from their first step to their last;
+// As many rows as two vectors have lanes travel together, from their first step to their last;
 // weights are broadcast. The backward loop computes the gates again instead of having kept them.
 // Rows and steps are wherever their strides say, so that the same tensor serves recurrence over
 // time and over bands.
@@ -12,7 +12,14 @@
 
 namespace {
 
-constexpr int LANES = 16, ROWS = 2 * LANES, TILE = 4, CHUNK = 8;
+#if defined(__AVX512F__)
+constexpr int LANES = 16;
+#elif defined(__AVX__)
+constexpr int LANES = 8;
+#else
+constexpr int LANES = 4;
+#endif
+constexpr int ROWS = 2 * LANES, TILE = 4, CHUNK = 8;
 
 using Vector = float __attribute__((vector_size(4 * LANES)));
 using Whole = std::int32_t __attribute__((vector_size(4 * LANES)));
@@ -187,7 +194,7 @@ struct Gradients {
 
 namespace {
 
-/// Gates of 32 rows at one step.
+/// Gates of rows that travel together, at one step.
 class Gates {
 public:
     explicit Gates(const Layer& layer)

@@ -19,7 +19,8 @@ import torch
 from torch import Tensor, nn
 
 SOURCE = Path(__file__).with_name("recurrence.cpp")
-FLAGS = ("-std=c++20", "-O3", "-march=native", "-ffast-math", "-shared", "-fPIC")
+MOST_ROWS = 32768  # that libraries of GPUs take at once
+FLAGS = ("-std=c++20", "-O3", "-march=native", "-ffast-math", "-Wno-psabi", "-shared", "-fPIC")
 
 
 class _Layer(ctypes.Structure):
@@ -102,5 +103,7 @@ def recurrent(gru: nn.GRU, x: Tensor, dim: int, state: Tensor | None = None) -> 
         before = x.new_zeros(x[..., 0].numel() // x.shape[dim], gru.hidden_size) if state is None else state
         return _Loop.apply(x, before.contiguous(), dim, *gru.parameters())
     moved = x.movedim(dim, 0)
-    y = gru(moved.flatten(1, -2), None if state is None else state[None])[0]
+    rows = moved.flatten(1, -2)
+    states = [None] * rows.shape[1] if state is None else state[None].split(MOST_ROWS, 1)
+    y = torch.cat([gru(part, before)[0] for part, before in zip(rows.split(MOST_ROWS, 1), states)], 1)
     return y.unflatten(1, moved.shape[1:-1]).movedim(0, dim)

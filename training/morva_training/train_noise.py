@@ -4,6 +4,7 @@ from __future__ import annotations
 
 import argparse
 import functools
+from collections.abc import Iterator
 from dataclasses import replace
 
 import numpy as np
@@ -17,7 +18,9 @@ from .losses import LEVEL_WEIGHTS, LevelLoss, LossWeights, MaskLoss
 from .mixing import RECIPES
 from .mvw import Weight
 from .networks import BandSharedNetwork, LayerNormGatedNetwork, Network, PlainGatedNetwork
+from .pool import Pool
 from .reshape import widened
+from .scenes import SceneMaker
 from .spectra import FULL_32K, SMALL_8K, SMALL_16K
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
@@ -40,11 +43,16 @@ class NoiseTask(trainer.Task):
         self.band_of_bin = torch.from_numpy(self.layout.band_of_bin()).to(self.device)
         self.criterion = (LevelLoss if args.level else MaskLoss)(self.layout, weights, self.device)
 
-    def batches(self, seed: int) -> MixtureBatches:
-        return MixtureBatches(self.args.store, self.recipe, self.args.batch, seed, self.args.reuse)
+    def batches(self, seed: int) -> Iterator[dict[str, Tensor]]:
+        args, recipe = self.args, replace(self.recipe, seconds=self.recipe.seconds * self.args.carry)
+        if not args.on_device:
+            return self.loaded(MixtureBatches(args.store, recipe, args.batch, seed, args.reuse))
+        pool = Pool.of(args.store, recipe, seed, args.made_hours, args.workers, self.device)
+        return SceneMaker(pool, recipe, seed, self.device).batches(args.batch)
 
-    def prepared(self, batch: dict[str, Tensor]) -> dict[str, Tensor]:
-        return vars(Batch.of(batch, self.layout, self.device))
+    def prepared(self, batch: dict[str, Tensor]) -> Iterator[dict[str, Tensor]]:
+        whole = Batch.of(batch, self.layout, self.device)
+        yield from map(vars, whole.parts(self.args.carry, self.context - 1))
 
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         return features.mean(0), features.std(0).clamp_min(0.1)
@@ -61,16 +69,19 @@ class NoiseTask(trainer.Task):
 
     def loss(self, model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
         gains = 2.0 * nn.functional.logsigmoid(self.outputs(model, batch))  # the engine squares the mask
-        return self.criterion(gains[..., self.band_of_bin], Batch(**batch), self.skipped)
+        skipped = 0 if batch["lead"] else self.skipped
+        return self.criterion(gains[..., self.band_of_bin], Batch(**batch), skipped)
 
     @functools.cached_property
     def dev(self) -> list[dict[str, Tensor]]:
         source = iter(MixtureBatches(self.args.store, self.recipe, 16, seed=77, split="dev"))
-        return [self.prepared(next(source)) for _ in range(4)]
+        return [vars(Batch.of(next(source), self.layout, self.device)) for _ in range(4)]
 
     def validate(self, model: nn.Module) -> dict[str, float]:
+        state = self.state  # goes on afterwards
         with torch.no_grad():
             results = [self.loss(model, batch) for batch in self.dev]
+        self.state = state
         parts = [{"loss": loss.item(), **terms} for loss, terms in results]
         return {name: float(np.mean([p[name] for p in parts])) for name in parts[0]}
 
@@ -91,7 +102,10 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     parser.add_argument("--recipe", choices=RECIPES, default="plain", help="how mixtures are drawn")
     parser.add_argument("--hidden", type=int, help="units per layer; more than in --start doubles some")
     parser.add_argument("--seconds", type=float, default=3.0, help="length of a piece")
-    parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw of speech and noise")
+    parser.add_argument("--carry", type=int, default=1, help="consecutive pieces through which the state is carried")
+    parser.add_argument("--on-device", action="store_true", help="mix where the network is, from a pool in its memory")
+    parser.add_argument("--made-hours", type=float, default=1.0, help="with --on-device, of noise made by --workers")
+    parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw, unless --on-device")
     for term in TERMS:
         parser.add_argument(f"--{term.replace('_', '-')}", type=float, help="weight of this part of the loss")
     args = parser.parse_args(arguments)

@@ -14,9 +14,9 @@ from __future__ import annotations
 
 import argparse
 import functools
+from collections.abc import Callable, Iterator
 from dataclasses import replace
 from pathlib import Path
-from typing import Callable
 
 import numpy as np
 import torch
@@ -56,8 +56,8 @@ class VoiceTask(trainer.Task):
 
         return logits
 
-    def batches(self, seed: int) -> VoiceBatches:
-        return VoiceBatches(self.args.store, self.args.batch, seed, reuse=self.args.reuse)
+    def batches(self, seed: int) -> Iterator[dict[str, Tensor]]:
+        return self.loaded(VoiceBatches(self.args.store, self.args.batch, seed, reuse=self.args.reuse))
 
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         return features.mean(0), features.var(0).clamp_min(1e-2)

@@ -9,6 +9,8 @@ from __future__ import annotations
 import argparse
 import ctypes
 from abc import ABC, abstractmethod
+from collections.abc import Iterator
+from itertools import chain
 from pathlib import Path
 
 import numpy as np
@@ -32,17 +34,26 @@ class Task(ABC):
     context: int  # frames of features that the network sees
     skipped: int  # frames at the start of a piece, while the memory fills
     layout: Layout | None = None  # of the noise models
+    state: Tensor | None = None  # of the network after the last part
 
     def __init__(self, args: argparse.Namespace) -> None:
         self.args = args
         self.device = torch.device("cuda" if torch.cuda.is_available() else "cpu")
 
     @abstractmethod
-    def batches(self, seed: int) -> IterableDataset: ...
+    def batches(self, seed: int) -> Iterator[dict[str, Tensor]]: ...
 
-    def prepared(self, batch: dict[str, Tensor]) -> dict[str, Tensor]:
-        """What the data process brings as network and loss take it, on the device."""
-        return batch
+    def loaded(self, dataset: IterableDataset) -> Iterator[dict[str, Tensor]]:
+        """Batches of other processes."""
+        return iter(DataLoader(dataset, batch_size=None, num_workers=self.args.workers))
+
+    def prepared(self, batch: dict[str, Tensor]) -> Iterator[dict[str, Tensor]]:
+        """What was drawn as network and loss take it, on the device: one or several parts, in their order.
+
+        The first `lead` frames of a part's features, if there are any, are the last of the part before, whose
+        state goes on.
+        """
+        yield batch
 
     @abstractmethod
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
@@ -67,11 +78,16 @@ class Task(ABC):
 
     def outputs(self, model: nn.Module, batch: dict[str, Tensor]) -> Tensor:
         """Logits [B, T, K] of the whole pieces."""
+        lead = int(batch.get("lead", 0))
         x = self.inputs(batch)
-        return model(x, model.initial_state(len(x)))[0]
+        goes_on = lead > 0 and self.state is not None  # a run may begin in the middle of a piece
+        y, state = model(x, self.state if goes_on else model.initial_state(len(x)))
+        self.state = state.detach().nan_to_num()
+        return y
 
     def inputs(self, batch: dict[str, Tensor]) -> Tensor:
-        return network_input(batch["features"].to(self.device), self.mean, self.input_scale, self.context)
+        goes_on = int(batch.get("lead", 0)) > 0
+        return network_input(batch["features"].to(self.device), self.mean, self.input_scale, self.context, goes_on)
 
     def standardise(self, mean: list[float], spread: list[float]) -> None:
         self.mean = torch.tensor(mean, device=self.device)
@@ -117,7 +133,7 @@ def train_as(task: Task, rank: int) -> Run:
     args = task.args
     # A resumed run must not hear the same mixtures again, nor two processes the same.
     seed = args.seed + 7919 * steps_done(args.run) + 104729 * rank
-    batches = map(task.prepared, DataLoader(task.batches(seed), batch_size=None, num_workers=args.workers))
+    batches = chain.from_iterable(map(task.prepared, task.batches(seed)))
     start = mvw.read(args.start) if args.start else None
     if start:
         mean, spread = (torch.from_numpy(start[key]) for key in ("MU", "SD"))

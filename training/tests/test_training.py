@@ -12,7 +12,7 @@ import soundfile
 import torch
 
 import morva
-from morva_training import clean, mvw, recurrence, together, train_noise, train_voice
+from morva_training import clean, mvw, together, train_noise, train_voice
 from morva_training.loop import Run, Schedule
 from morva_training.optimisers import orthogonalised
 
@@ -62,7 +62,7 @@ def test_network_shared_over_bands_learns_and_cleans(store: Path, tmp_path: Path
     train_noise.main([*map(str, arguments), "--rate", "0.01"])
     losses = entries(tmp_path, "dev_loss")
     assert losses[-1] < losses[0]
-    network = torch.load(tmp_path / "best.pt")[0]
+    network = torch.load(tmp_path / "best.pt", weights_only=False)[0]
     x = torch.randn(2, 9, 3 * 80)
     early, late = (network(x[:, :count], network.initial_state(2))[0][:, :5] for count in (5, 9))
     assert torch.allclose(early, late, atol=1e-5)
@@ -93,23 +93,6 @@ def test_voice_model_learns_and_grows(store: Path, tmp_path: Path) -> None:
     grown = ("--start", out, "--hidden", 16, "--layers", 4, "--bfloat16", "--steps", 1)
     run(train_voice, store, tmp_path / "grown", tmp_path / "grown.mvw", *grown)
     assert entries(tmp_path / "grown", "dev_auc")[0] == pytest.approx(areas[-1], abs=0.1)
-
-
-@pytest.mark.parametrize("dim,both_ways,state", [(0, False, True), (-2, True, False)])
-def test_compiled_recurrence_is_that_of_the_framework(dim: int, both_ways: bool, state: bool) -> None:
-    """Results and all gradients, over rows that fill no whole block and sizes that fill no whole vector."""
-    torch.manual_seed(1)
-    gru, x = torch.nn.GRU(11, 7, bidirectional=both_ways), torch.randn(9, 5, 13, 11, requires_grad=True)
-    before = torch.randn(65, 7) if state else None
-    ours = recurrence.recurrent(gru, x, dim, before)
-    moved = x.movedim(dim, 0)
-    theirs = gru(moved.flatten(1, 2), before if before is None else before[None])[0]
-    theirs = theirs.unflatten(1, moved.shape[1:3]).movedim(0, dim)
-    assert recurrence.library() and torch.allclose(ours, theirs, atol=1e-6)
-    wanted = torch.randn_like(ours)
-    gradients = [torch.autograd.grad((y * wanted).sum(), [x, *gru.parameters()]) for y in (ours, theirs)]
-    for one, other in zip(*gradients):
-        assert torch.allclose(one, other, atol=2e-5)
 
 
 def test_orthogonal_steps_are_even_in_all_directions() -> None:
