@@ -59,7 +59,7 @@ def narrowed(network: PlainGatedNetwork, hidden: int, x: Tensor) -> PlainGatedNe
     with torch.no_grad():
         for values in network.hidden_layers(x, network.initial_state(len(x)))[0]:
             values = values.flatten(0, 1)
-            units = torch.from_numpy(qr(values.numpy(), mode="r", pivoting=True)[1][:hidden].astype("int64"))
+            units = torch.from_numpy(qr(values.cpu().numpy(), mode="r", pivoting=True)[1][:hidden].astype("int64"))
             kept.append(units)
             guesses.append(torch.linalg.lstsq(values[:, units], values).solution)
         result = _like(network, hidden, network.outputs)
