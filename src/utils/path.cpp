@@ -1,13 +1,11 @@
 #include "utils/path.h"
 
-#include <codecvt>
-#include <locale>
 #include <string_view>
+
+#include "utils/utf8.h"
 
 namespace MORVA::UTILS {
 namespace {
-
-using Converter = std::wstring_convert<std::codecvt_utf8<wchar_t>>;
 
 void dropLastComponent(std::wstring& path, wchar_t separator) {
     std::size_t const cut =
@@ -85,11 +83,11 @@ std::wstring Path::getFileExtension() const {
 }
 
 std::string Path::convertWString2MBString(std::wstring const& wide) const {
-    return Converter().to_bytes(wide);
+    return toUtf8(wide);
 }
 
 std::wstring Path::convertMBString2WString(std::string const& bytes) const {
-    return Converter().from_bytes(bytes);
+    return toWide(bytes);
 }
 
 bool Path::openIfstream(std::ifstream& stream, std::ios_base::openmode mode) const {
