@@ -23,6 +23,18 @@ endforeach()
 set(ENV{PKG_CONFIG_LIBDIR} ${deps}/cross/${MORVA_TARGET}/lib/pkgconfig)
 set(PKG_CONFIG_ARGN --static)
 
+# What is linked in that is not so elsewhere.
+set(MORVA_LICENSE_LLVM ${deps}/zig/ziglang/lib/libcxx/LICENSE.TXT)
+set(MORVA_LICENSE_CLI11 /usr/share/doc/libcli11-dev/copyright)
+set(MORVA_LICENSE_JSON /usr/share/doc/nlohmann-json3-dev/copyright)
+set(MORVA_LICENSE_libsndfile ${deps}/cross/sources/libsndfile/COPYING)
+set(MORVA_LICENSE_libsamplerate ${deps}/cross/sources/libsamplerate/COPYING)
+set(MORVA_LINKED_PARTS LLVM CLI11 JSON libsndfile libsamplerate)
+if(CMAKE_SYSTEM_NAME STREQUAL Windows)
+    set(MORVA_LICENSE_MinGW ${deps}/zig/ziglang/lib/libc/mingw/COPYING)
+    list(APPEND MORVA_LINKED_PARTS MinGW)
+endif()
+
 # CMake wants each tool as one file; ccache judges them by their names.
 set(tools ${deps}/cross/${MORVA_TARGET}/tools)
 foreach(tool IN ITEMS "clang=cc -target ${triple}" "clang++=c++ -target ${triple}" ar=ar ranlib=ranlib rc=rc)
