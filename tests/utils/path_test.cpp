@@ -17,19 +17,20 @@ TEST(Path, NormalizesLikeTheStandardLibrary) {
     test_support::Random random(17);
     TRACE_SEED(random);
     wchar_t const* const parts[] = {L"a", L".", L"..", L"", L".d", L"e..", L"...", L"b\\.."};
+    auto const main = Path::separator_.substr(0, 1);
     for (int i = 0; i < 2000; ++i) {
         std::wstring text;
         for (std::size_t n = random.between(0, 6); n > 0; --n) {
-            text += L"/";
+            text += main;
             text += parts[random.between(0, std::size(parts) - 1)];
         }
-        text += random.chance(0.5) ? L"/f" : L"/..";
+        text += main + (random.chance(0.5) ? L"f" : L"..");
         Path path(text.c_str());
         ASSERT_TRUE(path.normalize());
         Path relative((L"r" + text).c_str());
         ASSERT_FALSE(relative.normalize());
         ASSERT_EQ(relative.str(), L"r" + text);
-        text.erase(0, text.find_first_not_of(L'/') - 1);  // a doubled root means something there
+        text.erase(0, text.find_first_not_of(main) - 1);  // a doubled root means something there
         ASSERT_EQ(path.str(), std::filesystem::path(text).lexically_normal().wstring())
             << path.convertWString2MBString(text);
     }
