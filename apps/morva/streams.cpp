@@ -54,9 +54,7 @@ void takeDiagnostics(MorvaExtDiagnostic take) {
 }  // namespace
 
 Streams::Streams(bool verbose)
-    : verbose_(verbose),
-      out_(duplicate(STDOUT_FILENO)),
-      err_(duplicate(STDERR_FILENO)) {
+    : verbose_(verbose), out_(duplicate(STDOUT_FILENO)), err_(duplicate(STDERR_FILENO)) {
     takeDiagnostics(verbose_ ? hearAndShow : hear);
 }
 

@@ -9,6 +9,7 @@
 
 #include <array>
 
+// clang-format off
 #define HOST_FUNCTIONS(X)                                                                         \
     X(napi_add_env_cleanup_hook) X(napi_adjust_external_memory) X(napi_async_destroy)             \
     X(napi_async_init) X(napi_call_threadsafe_function) X(napi_close_escapable_handle_scope)      \
@@ -29,6 +30,7 @@
     X(napi_set_named_property) X(napi_throw_error) X(napi_typeof)                                 \
     X(napi_unref_threadsafe_function) X(uv_async_init) X(uv_async_send) X(uv_close) X(uv_ref)     \
     X(uv_strerror) X(uv_unref)
+// clang-format on
 
 extern "C" {
 #define POINTER(name) FARPROC imported_##name __asm__("__imp_" #name);

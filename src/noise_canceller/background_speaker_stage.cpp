@@ -26,8 +26,7 @@ BackgroundSpeakerStage::Params::Params(ParameterReader const& reader)
       cutStartDb(reader.real("BACKGROUND_SPEAKER_FIX_CUT_START_DB", 10.0f)),
       cutEndDb(reader.real("BACKGROUND_SPEAKER_FIX_CUT_END_DB", 15.0f)),
       runFrameCount(frameCount(reader.real("BACKGROUND_SPEAKER_FIX_RUN_FRAME_COUNT", 40.0f))),
-      runMinLen(
-          static_cast<std::size_t>(reader.integer("BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN", 2))),
+      runMinLen(static_cast<std::size_t>(reader.integer("BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN", 2))),
       utteranceLen(reader.real("BACKGROUND_SPEAKER_FIX_UTTERANCE_LEN", 2.0f)),
       varWindMode(reader.isOn("BACKGROUND_SPEAKER_FIX_VAR_WIND_MODE", true)) {}
 

@@ -13,8 +13,7 @@ constexpr std::size_t kUsualBlock =
 
 }  // namespace
 
-Resampler::Resampler(std::size_t inRate, std::size_t outRate)
-    : inRate_(inRate), outRate_(outRate) {
+Resampler::Resampler(std::size_t inRate, std::size_t outRate) : inRate_(inRate), outRate_(outRate) {
     bool const near =
         (inRate - 1) / kLargestRatio < outRate && (outRate - 1) / kLargestRatio < inRate;
     if (inRate == 0 || outRate == 0 || !near) {

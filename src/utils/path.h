@@ -1,5 +1,5 @@
-// A file path as a wide string (code points, on Windows UTF-16): made absolute, normalised, and opened under its UTF-8 name.
-// A value; any thread as long as each has its own.
+// A file path as a wide string (code points, on Windows UTF-16): made absolute, normalised, and
+// opened under its UTF-8 name. A value; any thread as long as each has its own.
 #pragma once
 
 #include <fstream>

@@ -1,14 +1,15 @@
-// What a path looks like here. The main separator is the one that every form of path knows: where the system
-// is asked to take a path literally, "\\?\C:\folder", the other one is an ordinary character to it.
-#include "utils/path.h"
-
+// What a path looks like here. The main separator is the one that every form of path knows: where
+// the system is asked to take a path literally, "\\?\C:\folder", the other one is an ordinary
+// character to it.
 #include <algorithm>
+
+#include "utils/path.h"
 
 namespace MORVA::UTILS {
 
 std::wstring const Path::separator_ = L"\\/";
 
-// C:\  \  \\server\share\  \\?\C:\
+// One of "C:\", "\", "\\server\share\" and "\\?\C:\".
 std::size_t Path::rootLength() const {
     auto const isSeparator = [&](std::size_t at) {
         return at < path_.size() && separator_.find(path_[at]) != std::wstring::npos;

@@ -1,5 +1,5 @@
-// Numbers in text, read as in the "C" locale: the host's locale, with its decimal comma, has no say.
-// Text that is no number counts as 0. [any thread]
+// Numbers in text, read as in the "C" locale: the host's locale, with its decimal comma, has no
+// say. Text that is no number counts as 0. [any thread]
 #pragma once
 
 #include <string>

@@ -9,9 +9,9 @@ namespace quorral::util {
 std::string ModuleBasePath() {
     HMODULE module = nullptr;
     const auto here = reinterpret_cast<LPCWSTR>(&ModuleBasePath);
-    if (GetModuleHandleExW(GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS |
-                               GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
-                           here, &module) == 0) {
+    if (GetModuleHandleExW(
+            GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS | GET_MODULE_HANDLE_EX_FLAG_UNCHANGED_REFCOUNT,
+            here, &module) == 0) {
         return {};
     }
     std::wstring path(MAX_PATH, L'\0');
