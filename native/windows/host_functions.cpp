@@ -70,13 +70,16 @@ INT_PTR WINAPI Refuse() {
     return -1;
 }
 
-bool Connect() {
-    if (Fill(Host())) return true;
-    for (const auto& each : kImports) *each.pointer = &Refuse;
-    return false;
-}
+struct Connection {
+    bool made = Fill(Host());
 
-[[gnu::init_priority(101)]] const bool gConnected = Connect();
+    Connection() {
+        for (const auto& each : kImports) {
+            if (!made) *each.pointer = &Refuse;
+        }
+    }
+};
+[[gnu::init_priority(101)]] const Connection gConnection;
 
 }  // namespace
 
@@ -86,5 +89,6 @@ extern "C" BOOL WINAPI DllMain(HINSTANCE module, DWORD reason, LPVOID /*reserved
     constexpr DWORD kForGood =
         GET_MODULE_HANDLE_EX_FLAG_PIN | GET_MODULE_HANDLE_EX_FLAG_FROM_ADDRESS;
     HMODULE pinned = nullptr;
-    return gConnected && GetModuleHandleExW(kForGood, reinterpret_cast<LPCWSTR>(module), &pinned);
+    return gConnection.made &&
+           GetModuleHandleExW(kForGood, reinterpret_cast<LPCWSTR>(module), &pinned);
 }

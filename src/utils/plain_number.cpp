@@ -14,15 +14,15 @@ _locale_t plainLocale() {
     static _locale_t const plain = _create_locale(LC_ALL, "C");
     return plain;
 }
-constexpr auto realIn = &_strtod_l;
-constexpr auto integerIn = &_strtol_l;
+auto const realIn = &_strtod_l;
+auto const integerIn = &_strtol_l;
 #else
 locale_t plainLocale() {
     static locale_t const plain = newlocale(LC_ALL_MASK, "C", nullptr);
     return plain;
 }
-constexpr auto realIn = &strtod_l;
-constexpr auto integerIn = &strtol_l;
+auto const realIn = &strtod_l;
+auto const integerIn = &strtol_l;
 #endif
 
 }  // namespace
