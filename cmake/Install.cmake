@@ -28,7 +28,7 @@ install(FILES packaging/morva.bash RENAME morva
         DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
 install(FILES LICENSE CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
 # What is compiled or linked in comes with its licence.
-foreach(part Highway oneMKL)
+foreach(part Highway oneMKL ${MORVA_LINKED_PARTS})
     if(MORVA_LICENSE_${part})
         install(FILES ${MORVA_LICENSE_${part}} RENAME LICENSE.${part}.txt DESTINATION ${CMAKE_INSTALL_DOCDIR})
     endif()

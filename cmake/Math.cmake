@@ -12,15 +12,12 @@ if(NOT MORVA_MATH MATCHES "^(mkl|portable)$")
     message(FATAL_ERROR "MORVA_MATH is neither mkl nor portable: ${MORVA_MATH}")
 endif()
 
-# Headers only: what the kernels use of Highway needs no library at run time. They are the same
-# for all processors and come through a folder of their own, since those beside them are not.
-find_path(MORVA_HIGHWAY_INCLUDE hwy/highway.h REQUIRED NO_CMAKE_FIND_ROOT_PATH)
+# Headers only: what the kernels use of Highway needs no library at run time.
+find_path(MORVA_HIGHWAY_INCLUDE hwy/highway.h REQUIRED)
 add_library(morva_vectors INTERFACE)
 add_library(morva::vectors ALIAS morva_vectors)
-file(MAKE_DIRECTORY ${PROJECT_BINARY_DIR}/vectors)
-file(CREATE_LINK ${MORVA_HIGHWAY_INCLUDE}/hwy ${PROJECT_BINARY_DIR}/vectors/hwy SYMBOLIC)
-target_include_directories(morva_vectors SYSTEM INTERFACE ${PROJECT_BINARY_DIR}/vectors)
-find_file(MORVA_LICENSE_Highway copyright PATHS /usr/share/doc/libhwy-dev NO_DEFAULT_PATH)
+target_include_directories(morva_vectors SYSTEM INTERFACE ${MORVA_HIGHWAY_INCLUDE})
+find_file(MORVA_LICENSE_Highway copyright PATHS /usr/share/doc/libhwy-dev NO_DEFAULT_PATH NO_CMAKE_FIND_ROOT_PATH)
 
 find_package(Threads REQUIRED)
 add_library(morva_math INTERFACE)

@@ -22,7 +22,8 @@ target_compile_options(morva_options INTERFACE
     $<$<COMPILE_LANGUAGE:CXX>:-Wnon-virtual-dtor -Wold-style-cast> -ffunction-sections -fdata-sections
     $<$<CXX_COMPILER_ID:GNU>:-Wno-restrict>  # false alarms on std::string in GCC 12
     -fno-math-errno -ffp-contract=off)
-target_link_options(morva_options INTERFACE -Wl,--gc-sections)
+target_link_options(morva_options INTERFACE
+    $<IF:$<PLATFORM_ID:Darwin>,-Wl$<COMMA>-dead_strip,-Wl$<COMMA>--gc-sections>)
 if(MORVA_SANITIZE)
     target_compile_options(morva_options INTERFACE -fsanitize=${MORVA_SANITIZE} -fno-omit-frame-pointer
                            -fno-sanitize-recover=all -O1)
@@ -31,3 +32,35 @@ endif()
 if(MORVA_FUZZ)
     target_compile_options(morva_options INTERFACE -fsanitize=fuzzer-no-link)
 endif()
+
+# A shared library or module exports what the map names, whatever static libraries it holds. Other systems than Linux
+# export what is declared visible; on Windows nothing is declared, and the names are listed: those of the map, where it
+# has a pattern the functions of that name in the headers.
+function(morva_export target map)
+    if(CMAKE_SYSTEM_NAME STREQUAL Linux)
+        target_link_options(${target} PRIVATE -Wl,--version-script=${map})
+        set_target_properties(${target} PROPERTIES LINK_DEPENDS ${map})
+    elseif(WIN32)
+        file(READ ${map} patterns)
+        string(REPLACE ";" "," patterns "${patterns}")
+        string(REGEX MATCHALL "[A-Za-z0-9_]+[*]?," patterns "${patterns}")
+        set(declared "")
+        foreach(header ${ARGN})
+            file(READ ${header} text)
+            string(APPEND declared "${text}")
+        endforeach()
+        set(names "")
+        foreach(pattern ${patterns})
+            string(REGEX MATCH "[A-Za-z0-9_]+" start ${pattern})
+            if(pattern MATCHES "[*]")
+                string(REGEX MATCHALL "${start}[A-Za-z0-9_]+\\(" start "${declared}")
+            endif()
+            list(APPEND names ${start})
+        endforeach()
+        list(REMOVE_DUPLICATES names)
+        list(TRANSFORM names REPLACE "\\(" "")
+        list(JOIN names "\n" names)
+        file(CONFIGURE OUTPUT ${target}.def CONTENT "EXPORTS\n${names}\n")
+        target_sources(${target} PRIVATE ${CMAKE_CURRENT_BINARY_DIR}/${target}.def)
+    endif()
+endfunction()

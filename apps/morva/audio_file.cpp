@@ -1,6 +1,5 @@
 #include "audio_file.h"
 
-#include <fcntl.h>
 #include <unistd.h>
 
 #include <algorithm>
@@ -17,6 +16,7 @@
 #include "descriptor.h"
 #include "error.h"
 #include "formatted.h"
+#include "platform.h"
 #include "wav_header.h"
 
 namespace morva::cli {
@@ -108,6 +108,33 @@ void copyTags(SNDFILE* from, SNDFILE* to) {
     }
 }
 
+// What the library writes instead of a file.
+struct MemoryFile {
+    std::string bytes;
+    sf_count_t at = 0;
+
+    static MemoryFile& of(void* file) { return *static_cast<MemoryFile*>(file); }
+    static sf_count_t length(void* file) { return static_cast<sf_count_t>(of(file).bytes.size()); }
+    static sf_count_t tell(void* file) { return of(file).at; }
+    static sf_count_t seek(sf_count_t offset, int whence, void* file) {
+        sf_count_t const from = whence == SEEK_SET   ? 0
+                                : whence == SEEK_CUR ? tell(file)
+                                                     : length(file);
+        return of(file).at = from + offset;
+    }
+    static sf_count_t write(void const* data, sf_count_t count, void* file) {
+        auto& [bytes, at] = of(file);
+        bytes.resize(static_cast<std::size_t>(std::max(length(file), at + count)));
+        std::copy_n(static_cast<char const*>(data), count, bytes.begin() + at);
+        at += count;
+        return count;
+    }
+    static sf_count_t read(void*, sf_count_t, void*) { return 0; }
+    static SF_VIRTUAL_IO calls() {
+        return {.get_filelen = length, .seek = seek, .read = read, .write = write, .tell = tell};
+    }
+};
+
 }  // namespace
 
 std::string spokenInput(fs::path const& path) {
@@ -123,7 +150,7 @@ SoundReader::SoundReader(fs::path const& path) : path_(path), file_(nullptr, &sf
         auto const status = fs::status(path, error);
         if (!fs::exists(status)) throw Error(path.string() + ": no such file");
         if (fs::is_directory(status)) throw Error(path.string() + ": is a folder");
-        file_.reset(sf_open(path.c_str(), SFM_READ, &info_));
+        file_.reset(sf_open(path.string().c_str(), SFM_READ, &info_));
     }
     if (!file_) {
         throw Error(spokenInput(path) + ": cannot be read: " + reasonOf(nullptr) +
@@ -170,7 +197,7 @@ bool SoundReader::isCut() const {
         return std::string_view(log).find("End-Of-Stream") != std::string_view::npos;
     }
     if (path_ == standardStream) return endsInsideSound(STDIN_FILENO);
-    return endsInsideSound(Descriptor(::open(path_.c_str(), O_RDONLY | O_CLOEXEC)).get());
+    return endsInsideSound(openForReading(path_).get());
 }
 
 bool isWritableEnding(fs::path const& path) {
@@ -264,12 +291,10 @@ void SoundWriter::finish() {
 // Where standard output is a file, its header can say what came in the end.
 void SoundWriter::correctHeader() {
     auto const length = written_ * info_.channels * sampleBytes(info_.format);
-    auto const end = ::lseek(standardOutput_, 0, SEEK_CUR);
-    bool const appends = (::fcntl(standardOutput_, F_GETFL) & O_APPEND) != 0;
-    if (written_ == announced_ || end < 0 || appends) return;
+    if (written_ == announced_) return;
     auto const header = wavHeader(info_, written_);
-    auto const start = end - length - static_cast<off_t>(header.size());
-    if (::pwrite(standardOutput_, header.data(), header.size(), start) < 0) fail();
+    auto const back = static_cast<std::uint64_t>(length) + header.size();
+    if (!rewriteHeader(standardOutput_, back, header)) fail();
 }
 
 void SoundWriter::fail() {
@@ -282,12 +307,13 @@ std::string wavFile(std::span<float const> samples, int rateHz) {
     info.channels = 1;
     info.samplerate = rateHz;
     info.format = SF_FORMAT_WAV | SF_FORMAT_PCM_16;
-    Descriptor const memory = memoryFile();
-    SoundHandle file(sf_open_fd(memory.get(), SFM_WRITE, &info, SF_FALSE), &sf_close);
+    MemoryFile memory;
+    auto calls = MemoryFile::calls();
+    SoundHandle file(sf_open_virtual(&calls, SFM_WRITE, &info, &memory), &sf_close);
     if (!file || !writeSamples(file.get(), info.format, samples) || sf_close(file.release()) != 0) {
         throw Error("a sound cannot be held in memory: " + reasonOf(file.get()));
     }
-    return contentFrom(memory, 0);
+    return std::move(memory.bytes);
 }
 
 }  // namespace morva::cli

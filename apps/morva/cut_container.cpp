@@ -1,29 +1,22 @@
 #include "cut_container.h"
 
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <string>
+
+#include "platform.h"
 
 namespace morva::cli {
 namespace {
 
 class Bytes {
 public:
-    explicit Bytes(int descriptor) : descriptor_(descriptor) {
-        struct stat facts {};
-        if (::fstat(descriptor, &facts) == 0 && S_ISREG(facts.st_mode))
-            size_ = static_cast<std::uint64_t>(facts.st_size);
-    }
+    explicit Bytes(int descriptor) : descriptor_(descriptor), size_(sizeOf(descriptor)) {}
 
     std::uint64_t size() const { return size_; }
 
     // Less than `count` where the file ends.
     std::string text(std::uint64_t at, std::size_t count) const {
         std::string text(count, '\0');
-        auto const got =
-            at < size_ ? ::pread(descriptor_, text.data(), count, static_cast<off_t>(at)) : 0;
-        text.resize(static_cast<std::size_t>(got > 0 ? got : 0));
+        text.resize(at < size_ ? readAt(descriptor_, at, text.data(), count) : 0);
         return text;
     }
 
@@ -37,7 +30,7 @@ public:
 
 private:
     int descriptor_;
-    std::uint64_t size_ = 0;
+    std::uint64_t size_;
 };
 
 }  // namespace

@@ -1,8 +1,8 @@
 #include "descriptor.h"
 
-#include <sys/mman.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <cerrno>
 #include <utility>
 
@@ -22,28 +22,15 @@ int Descriptor::release() {
 }
 
 bool writeAll(int descriptor, std::string_view text) noexcept {
+    constexpr std::size_t most = 1U << 20;
     while (!text.empty()) {
-        auto const written = ::write(descriptor, text.data(), text.size());
+        auto const count = static_cast<unsigned>(std::min(text.size(), most));
+        auto const written = ::write(descriptor, text.data(), count);
         if (written < 0 && errno == EINTR) continue;
         if (written <= 0) return false;
         text.remove_prefix(static_cast<std::size_t>(written));
     }
     return true;
-}
-
-Descriptor memoryFile() {
-    return Descriptor(::memfd_create("morva", MFD_CLOEXEC));
-}
-
-std::string contentFrom(Descriptor const& file, long start) {
-    std::string text;
-    char block[4096];
-    for (auto at = start;;) {
-        auto const got = ::pread(file.get(), block, sizeof block, at);
-        if (got <= 0) return text;
-        text.append(block, static_cast<std::size_t>(got));
-        at += got;
-    }
 }
 
 }  // namespace morva::cli

@@ -1,7 +1,6 @@
-// File descriptors that close themselves, and files that are held in memory.
+// File descriptors that close themselves.
 #pragma once
 
-#include <string>
 #include <string_view>
 
 namespace morva::cli {
@@ -22,11 +21,5 @@ private:
 
 // False when not all can be written.
 bool writeAll(int descriptor, std::string_view text) noexcept;
-
-// Empty, open for reading and writing; -1 when the system has none to give.
-Descriptor memoryFile();
-
-// What stands in the file from `start` on.
-std::string contentFrom(Descriptor const& file, long start);
 
 }  // namespace morva::cli

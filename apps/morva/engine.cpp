@@ -4,6 +4,7 @@
 #include "morva-ext.h"
 #include "morva-sdk/vocabulary.h"
 #include "streams.h"
+#include "utils/utf8.h"
 
 namespace morva::cli {
 namespace {
@@ -40,8 +41,8 @@ std::size_t SessionSetup::frameSize() const {
 }
 
 std::wstring wide(std::filesystem::path const& path) {
-    auto const points = path.u32string();
-    return {points.begin(), points.end()};
+    auto const bytes = path.u8string();
+    return MORVA::UTILS::toWide(std::string(bytes.begin(), bytes.end()));
 }
 
 Engine::Engine() {

@@ -38,7 +38,7 @@ public:
     void addModel(std::filesystem::path const& file, std::string const& name);
 };
 
-// The engine's form of a path. File names are UTF-8, whatever the locale; others throw.
+// The engine's form of a path. Throws for a file name that is no UTF-8.
 std::wstring wide(std::filesystem::path const& path);
 
 // Closes a session of one kind.

@@ -5,6 +5,7 @@
 #include "command.h"
 #include "error.h"
 #include "morva-sdk/vocabulary.h"
+#include "platform.h"
 #include "vanishing_file.h"
 
 namespace morva::cli {
@@ -62,6 +63,7 @@ int run(int argc, char** argv) {
 }  // namespace morva::cli
 
 int main(int argc, char** argv) {
+    morva::cli::prepareStreams();
     morva::cli::removeVanishingFilesOnSignals();
     try {
         return morva::cli::run(argc, argv);

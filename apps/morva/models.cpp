@@ -1,7 +1,5 @@
 #include "models.h"
 
-#include <unistd.h>
-
 #include <algorithm>
 #include <cerrno>
 #include <system_error>
@@ -9,6 +7,7 @@
 #include <vector>
 
 #include "error.h"
+#include "platform.h"
 #include "vanishing_file.h"
 #include "weights/control_file.h"
 
@@ -23,7 +22,7 @@ void mustBeFile(fs::path const& file) {
     auto const status = fs::status(file, error);
     if (!fs::exists(status)) throw Error(file.string() + ": no such file");
     if (fs::is_directory(status)) throw Error(file.string() + ": is a folder, not a model");
-    if (::access(file.c_str(), R_OK) != 0)
+    if (openForReading(file).get() < 0)
         throw Error(file.string() + ": " + std::generic_category().message(errno));
 }
 
@@ -43,9 +42,8 @@ fs::path weightNamedIn(fs::path const& control) {
 }
 
 fs::path programFolder() {
-    std::error_code error;
-    auto const program = fs::read_symlink("/proc/self/exe", error);
-    return error ? fs::current_path() : program.parent_path();
+    auto const program = programFile();
+    return program.empty() ? fs::current_path() : program.parent_path();
 }
 
 }  // namespace

@@ -1,6 +1,5 @@
 #include "output_file.h"
 
-#include <sys/stat.h>
 #include <unistd.h>
 
 #include <optional>
@@ -12,13 +11,8 @@ namespace morva::cli {
 namespace fs = std::filesystem;
 namespace {
 
-// Device and number of a regular file.
-std::optional<std::pair<dev_t, ino_t>> identity(fs::path const& path) {
-    struct stat facts {};
-    bool const found = path == standardStream ? ::fstat(STDIN_FILENO, &facts) == 0
-                                              : ::stat(path.c_str(), &facts) == 0;
-    if (!found || !S_ISREG(facts.st_mode)) return std::nullopt;
-    return std::pair(facts.st_dev, facts.st_ino);
+std::optional<FileIdentity> identity(fs::path const& path) {
+    return path == standardStream ? identityOf(STDIN_FILENO) : identityOf(path);
 }
 
 // What `target` is a link to is written, not the link.
@@ -30,17 +24,6 @@ fs::path checked(fs::path const& target) {
     if (!fs::is_regular_file(status))
         throw Error(target.string() + ": cannot be written: not a regular file");
     return fs::canonical(target);
-}
-
-// As programs make their files; an older one's permissions stay.
-mode_t permissionsFor(fs::path const& target) {
-    static mode_t const mask = [] {
-        auto const set = ::umask(0);
-        ::umask(set);
-        return set;
-    }();
-    struct stat older {};
-    return ::stat(target.c_str(), &older) == 0 ? older.st_mode & 0777U : 0666U & ~mask;
 }
 
 }  // namespace
@@ -64,7 +47,7 @@ OutputFile::OutputFile(fs::path const& target)
     : target_(checked(target)), unfinished_(target_.string() + ".part-", "", target.string()) {}
 
 void OutputFile::finish() {
-    ::fchmod(unfinished_.descriptor().get(), permissionsFor(target_));
+    takePermissions(unfinished_.descriptor().get(), target_);
     unfinished_.become(target_);
 }
 

@@ -2,14 +2,12 @@
 // target, which is replaced only by a complete result.
 #pragma once
 
-#include <sys/types.h>
-
 #include <filesystem>
 #include <initializer_list>
 #include <set>
 #include <string_view>
-#include <utility>
 
+#include "platform.h"
 #include "vanishing_file.h"
 
 namespace morva::cli {
@@ -29,7 +27,7 @@ public:
     void mustNotHold(std::filesystem::path const& output) const;
 
 private:
-    std::set<std::pair<dev_t, ino_t>> files_;
+    std::set<FileIdentity> files_;
 };
 
 class OutputFile {

@@ -1,6 +1,5 @@
 #include "streams.h"
 
-#include <fcntl.h>
 #include <unistd.h>
 
 #include <cerrno>
@@ -8,6 +7,7 @@
 
 #include "error.h"
 #include "morva-ext.h"
+#include "platform.h"
 #include "utils/diagnostics.h"
 
 namespace morva::cli {
@@ -54,9 +54,7 @@ void takeDiagnostics(MorvaExtDiagnostic take) {
 }  // namespace
 
 Streams::Streams(bool verbose)
-    : verbose_(verbose),
-      out_(::fcntl(STDOUT_FILENO, F_DUPFD_CLOEXEC, 3)),
-      err_(::fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 3)) {
+    : verbose_(verbose), out_(duplicate(STDOUT_FILENO)), err_(duplicate(STDERR_FILENO)) {
     takeDiagnostics(verbose_ ? hearAndShow : hear);
 }
 

@@ -1,18 +1,14 @@
 #include "vanishing_file.h"
 
-#include <unistd.h>
-
 #include <cerrno>
-#include <csignal>
-#include <cstdlib>
 #include <memory>
 #include <mutex>
 #include <set>
 #include <system_error>
-#include <thread>
 #include <utility>
 
 #include "error.h"
+#include "platform.h"
 
 namespace morva::cli {
 namespace fs = std::filesystem;
@@ -30,44 +26,23 @@ std::shared_ptr<Vanishing> const& vanishing() {
     return all;
 }
 
-sigset_t endingSignals() {
-    sigset_t set;
-    sigemptyset(&set);
-    for (int const signal : {SIGINT, SIGTERM, SIGHUP}) {
-        struct sigaction now {};
-        sigaction(signal, nullptr, &now);
-        // NOLINTNEXTLINE(*-cast*): the system's constant
-        if (now.sa_handler != SIG_IGN) sigaddset(&set, signal);  // a background job ignores some
-    }
-    return set;
-}
-
-[[noreturn]] void endBySignal(Vanishing& all, sigset_t const& awaited) {
-    int signal = SIGTERM;
-    sigwait(&awaited, &signal);
-    std::lock_guard const noMoreChanges(all.changing);
-    for (auto const& file : all.files) ::unlink(file.c_str());
-    std::signal(signal, SIG_DFL);
-    pthread_sigmask(SIG_UNBLOCK, &awaited, nullptr);
-    ::kill(::getpid(), signal);
-    std::_Exit(128 + signal);
-}
-
 }  // namespace
 
 void removeVanishingFilesOnSignals() {
-    auto const awaited = endingSignals();
-    pthread_sigmask(SIG_BLOCK, &awaited, nullptr);
-    std::thread([awaited, all = vanishing()] { endBySignal(*all, awaited); }).detach();
+    beforeEnding([all = vanishing()] {
+        all->changing.lock();  // for good: no more changes
+        std::error_code ignored;
+        for (auto const& file : all->files) fs::remove(file, ignored);
+    });
 }
 
 VanishingFile::VanishingFile(fs::path const& start, std::string const& ending, std::string knownAs)
     : knownAs_(std::move(knownAs)) {
-    auto name = start.string() + "XXXXXX" + ending;
     std::lock_guard const lock(vanishing()->changing);
-    descriptor_ = Descriptor(::mkstemps(name.data(), static_cast<int>(ending.size())));
-    if (descriptor_.get() < 0) fail();
-    path_ = name;
+    auto [descriptor, name] = makeNewFile(start, ending);
+    if (descriptor.get() < 0) fail(errno);
+    descriptor_ = std::move(descriptor);
+    path_ = std::move(name);
     vanishing()->files.insert(path_);
 }
 
@@ -80,18 +55,20 @@ VanishingFile::~VanishingFile() {
 }
 
 void VanishingFile::write(std::string_view text) {
-    if (!writeAll(descriptor_.get(), text)) fail();
+    if (!writeAll(descriptor_.get(), text)) fail(errno);
 }
 
 void VanishingFile::become(fs::path const& target) {
     std::lock_guard const lock(vanishing()->changing);
-    if (::rename(path_.c_str(), target.c_str()) != 0) fail();
+    std::error_code error;
+    fs::rename(path_, target, error);
+    if (error) fail(error.default_error_condition().value());
     vanishing()->files.erase(path_);
     path_.clear();
 }
 
-void VanishingFile::fail() const {
-    throw Error(knownAs_ + ": cannot be written: " + std::generic_category().message(errno));
+void VanishingFile::fail(int reason) const {
+    throw Error(knownAs_ + ": cannot be written: " + std::generic_category().message(reason));
 }
 
 }  // namespace morva::cli

@@ -35,7 +35,7 @@ public:
     void become(std::filesystem::path const& target);
 
 private:
-    [[noreturn]] void fail() const;
+    [[noreturn]] void fail(int reason) const;
 
     std::string knownAs_;
     std::filesystem::path path_;

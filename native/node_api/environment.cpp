@@ -13,7 +13,7 @@ std::atomic<std::size_t> gLiveEnvironments{0};
 
 }  // namespace
 
-Environment::Environment(napi_env env) : env_(env), owner_(pthread_self()) {
+Environment::Environment(napi_env env) : env_(env), owner_(std::this_thread::get_id()) {
     ++gLiveEnvironments;
 }
 

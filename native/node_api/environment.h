@@ -9,13 +9,13 @@
 #pragma once
 
 #include <node_api.h>
-#include <pthread.h>
 
 #include <atomic>
 #include <cstddef>
 #include <functional>
 #include <memory>
 #include <mutex>
+#include <thread>
 #include <unordered_set>
 #include <utility>
 #include <vector>
@@ -102,12 +102,12 @@ public:
     Environment& operator=(const Environment&) = delete;
 
 private:
-    bool IsOwnerThread() const { return pthread_equal(owner_, pthread_self()) != 0; }
+    bool IsOwnerThread() const { return owner_ == std::this_thread::get_id(); }
     void ThrowText(const char* text) const noexcept;
 
     std::atomic<napi_env> env_;
     std::unique_ptr<uv::Executor> executor_;
-    const pthread_t owner_;
+    const std::thread::id owner_;
 
     // Guards executor_ against a submission from a foreign thread during teardown. Recursive, since
     // a task that cannot be queued is destroyed right there and may submit work of its own.

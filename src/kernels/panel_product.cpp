@@ -1,5 +1,7 @@
 #include "kernels/panel_product.h"
 
+#include "utils/processor.h"
+
 #define HWY_TARGET_INCLUDE "kernels/panel_product.cpp"  // compiled once for every width
 #include "kernels/vector_layer.h"
 
@@ -63,8 +65,9 @@ namespace MORVA::CONTAINERS {
 PanelProduct const& panelProduct() {
 #if HWY_TARGETS & HWY_AVX3
     // Wide registers from the generation on that does not slow its clock down for them.
-    __builtin_cpu_init();
-    if (__builtin_cpu_supports("avx512vbmi2")) return N_AVX3::kProduct;
+    using enum UTILS::CpuRegister;
+    static bool const wide = UTILS::processorHas({"AVX512_VBMI2", 7, ecx, 6, UTILS::kWidestState});
+    if (wide) return N_AVX3::kProduct;
 #endif
     return HWY_STATIC_DISPATCH(kProduct);
 }

@@ -34,6 +34,10 @@
  *   and print a line on standard error that says what happened (a model that could not be
  *   registered, and a null argument there, on standard output).
  *
+ * Paths
+ *   are wide strings: code points where wchar_t has 32 bits, UTF-16 on Windows. There "\" and "/"
+ *   separate, and "C:\", "\\server\share\" and "\\?\C:\" begin a path that is not relative.
+ *
  * Frames
  *   A frame holds rate * duration / 1000 samples (truncated; 441 for 44100 Hz and 10 ms). Sizes are
  *   counts of samples. Integer samples use the whole 16-bit range; float samples lie in -1..1 and

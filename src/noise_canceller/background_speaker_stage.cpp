@@ -10,13 +10,13 @@ namespace {
 // The stage keeps an energy per counted frame; half an hour of them is more than anyone means.
 constexpr float kMaxRunFrameCount = 100000.0f;
 
-unsigned long frameCount(float value) {
+std::size_t frameCount(float value) {
     if (!(value >= 1.0f && value <= kMaxRunFrameCount)) {
         UTILS::raise("BACKGROUND_SPEAKER_FIX_RUN_FRAME_COUNT is " + std::to_string(value) +
                          ", must be 1..100000",
                      "src/noise_canceller/background_speaker_stage", "Params");
     }
-    return static_cast<unsigned long>(value);
+    return static_cast<std::size_t>(value);
 }
 
 }  // namespace
@@ -26,8 +26,7 @@ BackgroundSpeakerStage::Params::Params(ParameterReader const& reader)
       cutStartDb(reader.real("BACKGROUND_SPEAKER_FIX_CUT_START_DB", 10.0f)),
       cutEndDb(reader.real("BACKGROUND_SPEAKER_FIX_CUT_END_DB", 15.0f)),
       runFrameCount(frameCount(reader.real("BACKGROUND_SPEAKER_FIX_RUN_FRAME_COUNT", 40.0f))),
-      runMinLen(
-          static_cast<unsigned long>(reader.integer("BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN", 2))),
+      runMinLen(static_cast<std::size_t>(reader.integer("BACKGROUND_SPEAKER_FIX_RUN_MIN_LEN", 2))),
       utteranceLen(reader.real("BACKGROUND_SPEAKER_FIX_UTTERANCE_LEN", 2.0f)),
       varWindMode(reader.isOn("BACKGROUND_SPEAKER_FIX_VAR_WIND_MODE", true)) {}
 

@@ -28,8 +28,8 @@ public:
         bool enableBackgroundSpeakerFix;
         float cutStartDb;
         float cutEndDb;
-        unsigned long runFrameCount;
-        unsigned long runMinLen;
+        std::size_t runFrameCount;
+        std::size_t runMinLen;
         float utteranceLen;  // seconds
         bool varWindMode;
     };

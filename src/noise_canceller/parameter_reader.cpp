@@ -1,35 +1,9 @@
 #include "noise_canceller/parameter_reader.h"
 
-#include <locale.h>
-#include <stdlib.h>
-
-#include <algorithm>
-#include <limits>
-
 #include "utils/diagnostics.h"
+#include "utils/plain_number.h"
 
 namespace MORVA::NOISE_CANCELLER {
-namespace {
-
-// The host's locale, with its decimal comma, has no say.
-locale_t plainLocale() {
-    static locale_t const plain = newlocale(LC_ALL_MASK, "C", nullptr);
-    return plain;
-}
-
-// atof in that locale.
-float toReal(std::string const& text) {
-    return static_cast<float>(strtod_l(text.c_str(), nullptr, plainLocale()));
-}
-
-// atoi, without its undefined behaviour on overflow.
-int toInteger(std::string const& text) {
-    long const value = strtol_l(text.c_str(), nullptr, 10, plainLocale());
-    return static_cast<int>(
-        std::clamp<long>(value, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
-}
-
-}  // namespace
 
 ParameterReader::ParameterReader(Environment const& environment, char const* suffix)
     : environment_(environment), suffix_(suffix) {}
@@ -49,21 +23,21 @@ std::shared_ptr<T> ParameterReader::stored(std::string const& key) const {
 
 float ParameterReader::real(char const* name, float byDefault) const {
     auto const k = key(name);
-    if (auto const value = text(k)) return toReal(*value);
+    if (auto const value = text(k)) return UTILS::toReal(*value);
     if (auto const value = stored<float>(k)) return *value;
     return byDefault;
 }
 
 int ParameterReader::integer(char const* name, int byDefault) const {
     auto const k = key(name);
-    if (auto const value = text(k)) return toInteger(*value);
+    if (auto const value = text(k)) return UTILS::toInteger(*value);
     if (auto const value = stored<int>(k)) return *value;
     return byDefault;
 }
 
 float ParameterReader::wholeNumber(char const* name, float byDefault) const {
     auto const k = key(name);
-    if (auto const value = text(k)) return static_cast<float>(toInteger(*value));
+    if (auto const value = text(k)) return static_cast<float>(UTILS::toInteger(*value));
     if (auto const value = stored<int>(k)) return static_cast<float>(*value);
     if (auto const value = stored<float>(k)) return *value;
     return byDefault;

@@ -13,7 +13,7 @@ constexpr double kNoDrift = 1e-15;
 
 }  // namespace
 
-BandLimitedInterpolator::BandLimitedInterpolator(unsigned long inRate, unsigned long outRate)
+BandLimitedInterpolator::BandLimitedInterpolator(std::size_t inRate, std::size_t outRate)
     : filter_(InterpolationFilter::forRates(inRate, outRate)),
       phaseStep_(filter_->inStep() % filter_->outStep()),
       step_(1.0 / (static_cast<double>(outRate) / static_cast<double>(inRate))),

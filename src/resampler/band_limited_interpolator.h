@@ -16,7 +16,7 @@ namespace MORVA::UTILS {
 class BandLimitedInterpolator final : public StreamConverter {
 public:
     // Throws MORVA_Exception for rates whose filter would be too large.
-    BandLimitedInterpolator(unsigned long inRate, unsigned long outRate);
+    BandLimitedInterpolator(std::size_t inRate, std::size_t outRate);
 
     int process(float const* in, int inCount, int& used, float* out, int room) override;
     void reset() override;

@@ -7,14 +7,13 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr unsigned long kLargestRatio = 256;
+constexpr std::size_t kLargestRatio = 256;
 constexpr std::size_t kUsualBlock =
     3840;  // 40 ms at 96 kHz: reserved ahead, so that no frame allocates
 
 }  // namespace
 
-Resampler::Resampler(unsigned long inRate, unsigned long outRate)
-    : inRate_(inRate), outRate_(outRate) {
+Resampler::Resampler(std::size_t inRate, std::size_t outRate) : inRate_(inRate), outRate_(outRate) {
     bool const near =
         (inRate - 1) / kLargestRatio < outRate && (outRate - 1) / kLargestRatio < inRate;
     if (inRate == 0 || outRate == 0 || !near) {

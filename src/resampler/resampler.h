@@ -18,7 +18,7 @@ class Resampler : private NonCopyMovable {
 public:
     // Throws MORVA_Exception for a rate of 0, a ratio outside 1/256 .. 256, or when the filter
     // cannot be built.
-    Resampler(unsigned long inRate, unsigned long outRate);
+    Resampler(std::size_t inRate, std::size_t outRate);
 
     // Converts one block: `out` gets exactly in.size() * outRate / inRate samples, truncated.
     // Returns how many samples the filter delivered in this call (in.size() at equal rates, where
@@ -44,8 +44,8 @@ private:
     void startWithDelay(std::vector<float>& out, int produced);
     void continueStream(std::vector<float>& out, int produced);
 
-    unsigned long inRate_;
-    unsigned long outRate_;
+    std::size_t inRate_;
+    std::size_t outRate_;
     std::unique_ptr<StreamConverter> converter_;
     int extraRoom_ = 1024;
     int heldOver_ = 0;

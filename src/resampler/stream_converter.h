@@ -24,6 +24,6 @@ public:
 };
 
 // Throws MORVA_Exception when the filter cannot be built. [control thread]
-std::unique_ptr<StreamConverter> makeStreamConverter(unsigned long inRate, unsigned long outRate);
+std::unique_ptr<StreamConverter> makeStreamConverter(std::size_t inRate, std::size_t outRate);
 
 }  // namespace MORVA::UTILS

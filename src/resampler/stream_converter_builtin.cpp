@@ -3,7 +3,7 @@
 
 namespace MORVA::UTILS {
 
-std::unique_ptr<StreamConverter> makeStreamConverter(unsigned long inRate, unsigned long outRate) {
+std::unique_ptr<StreamConverter> makeStreamConverter(std::size_t inRate, std::size_t outRate) {
     return std::make_unique<BandLimitedInterpolator>(inRate, outRate);
 }
 

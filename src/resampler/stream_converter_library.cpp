@@ -8,7 +8,7 @@ namespace {
 
 class LibraryConverter final : public StreamConverter {
 public:
-    LibraryConverter(unsigned long inRate, unsigned long outRate)
+    LibraryConverter(std::size_t inRate, std::size_t outRate)
         : factor_(static_cast<double>(outRate) / static_cast<double>(inRate)), handle_(open()) {}
 
     int process(float const* in, int inCount, int& used, float* out, int room) override {
@@ -43,7 +43,7 @@ private:
 
 }  // namespace
 
-std::unique_ptr<StreamConverter> makeStreamConverter(unsigned long inRate, unsigned long outRate) {
+std::unique_ptr<StreamConverter> makeStreamConverter(std::size_t inRate, std::size_t outRate) {
     return std::make_unique<LibraryConverter>(inRate, outRate);
 }
 

@@ -9,13 +9,13 @@
 namespace MORVA::UTILS {
 namespace {
 
-constexpr unsigned long kMaxRunFrames = 100000;
+constexpr std::size_t kMaxRunFrames = 100000;
 
 void require(bool condition, char const* message) {
     if (!condition) raise(message, "src/statistics/background_speaker_fix", "BackgroundSpeakerFix");
 }
 
-std::size_t checkedRunFrames(unsigned long count) {
+std::size_t checkedRunFrames(std::size_t count) {
     require(count >= 1 && count <= kMaxRunFrames,
             "The run frame count of the background speaker stage must be 1..100000");
     return count;
@@ -24,9 +24,9 @@ std::size_t checkedRunFrames(unsigned long count) {
 }  // namespace
 
 BackgroundSpeakerFix::BackgroundSpeakerFix(float cutStartDb, float cutEndDb,
-                                           unsigned long runFrameCount, unsigned long runMinLen,
+                                           std::size_t runFrameCount, std::size_t runMinLen,
                                            float utteranceLen, bool varWindMode,
-                                           unsigned long frameLengthMs,
+                                           std::size_t frameLengthMs,
                                            std::vector<float> const& window)
     : cutStartLevel_(cutStartDb),
       cutEndLevel_(cutEndDb),

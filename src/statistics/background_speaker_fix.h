@@ -19,9 +19,9 @@ public:
     // window: the synthesis window.
     // Throws MORVA_Exception for a run frame count outside 1 .. 100000, equal or infinite cut
     // levels, an utterance length that is not positive and finite, or a window without energy.
-    BackgroundSpeakerFix(float cutStartDb, float cutEndDb, unsigned long runFrameCount,
-                         unsigned long runMinLen, float utteranceLen, bool varWindMode,
-                         unsigned long frameLengthMs, std::vector<float> const& window);
+    BackgroundSpeakerFix(float cutStartDb, float cutEndDb, std::size_t runFrameCount,
+                         std::size_t runMinLen, float utteranceLen, bool varWindMode,
+                         std::size_t frameLengthMs, std::vector<float> const& window);
 
     // Scales the frame in place; always true.
     bool frame_compute(std::vector<float>& frame);

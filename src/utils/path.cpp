@@ -1,13 +1,12 @@
 #include "utils/path.h"
 
-#include <codecvt>
-#include <locale>
+#include <filesystem>
 #include <string_view>
+
+#include "utils/utf8.h"
 
 namespace MORVA::UTILS {
 namespace {
-
-using Converter = std::wstring_convert<std::codecvt_utf8<wchar_t>>;
 
 void dropLastComponent(std::wstring& path, wchar_t separator) {
     std::size_t const cut =
@@ -43,17 +42,13 @@ std::wstring withoutDots(std::wstring_view rest, wchar_t separator) {
 
 template <class Stream>
 bool openStream(Stream& stream, std::string const& name, std::ios_base::openmode mode) {
-    stream.open(name, mode);
+    stream.open(std::filesystem::path(std::u8string(name.begin(), name.end())), mode);
     return stream.is_open();
 }
 
 }  // namespace
 
 Path::Path(wchar_t const* path) : path_(path) {}
-
-bool Path::isAbsolute() const {
-    return !path_.empty() && path_.front() == separator_.front();
-}
 
 bool Path::pushFront(std::wstring const& front) {
     if (isAbsolute()) return true;
@@ -64,9 +59,10 @@ bool Path::pushFront(std::wstring const& front) {
 
 bool Path::normalize() {
     replaceAllSeparatorsWithMainSeparator();
-    if (!isAbsolute()) return false;
-    wchar_t const separator = separator_.front();
-    path_ = separator + withoutDots(std::wstring_view(path_).substr(1), separator);
+    std::size_t const root = rootLength();
+    if (root == 0) return false;
+    path_.replace(root, path_.npos,
+                  withoutDots(std::wstring_view(path_).substr(root), separator_.front()));
     return true;
 }
 
@@ -85,11 +81,11 @@ std::wstring Path::getFileExtension() const {
 }
 
 std::string Path::convertWString2MBString(std::wstring const& wide) const {
-    return Converter().to_bytes(wide);
+    return toUtf8(wide);
 }
 
 std::wstring Path::convertMBString2WString(std::string const& bytes) const {
-    return Converter().from_bytes(bytes);
+    return toWide(bytes);
 }
 
 bool Path::openIfstream(std::ifstream& stream, std::ios_base::openmode mode) const {

@@ -1,5 +1,5 @@
-// A file path in code points: made absolute, normalised, and opened under its UTF-8 name.
-// A value; any thread as long as each has its own.
+// A file path as a wide string (code points, on Windows UTF-16): made absolute, normalised, and
+// opened under its UTF-8 name. A value; any thread as long as each has its own.
 #pragma once
 
 #include <fstream>
@@ -10,15 +10,15 @@ namespace MORVA::UTILS {
 
 class Path {
 public:
-    // All accepted separators, the main one first. A backslash is an ordinary character.
-    inline static std::wstring const separator_ = L"/";
+    // All accepted separators, the main one first: "/" alone, on Windows the backslash and "/".
+    static std::wstring const separator_;
 
     // `path` must not be null.
     explicit Path(wchar_t const* path);
 
     std::wstring const& str() const { return path_; }
 
-    bool isAbsolute() const;
+    bool isAbsolute() const { return rootLength() > 0; }
 
     // Puts `front` before a relative path; an absolute one stays. Always true.
     bool pushFront(std::wstring const& front);
@@ -42,6 +42,9 @@ public:
     bool openOfstream(std::ofstream& stream, std::ios_base::openmode mode) const;
 
 private:
+    // Characters of what no ".." leaves, its separator included; 0: the path is relative.
+    std::size_t rootLength() const;
+
     std::wstring path_;
 };
 

@@ -152,7 +152,7 @@ bool ModelRegistry::enterModel(ModelEnvironment const& environment, std::string 
         return false;
     }
     // Nodes are made before the registry changes, so that a failed allocation leaves it as it was.
-    unsigned long const index = environments_.size();
+    std::size_t const index = environments_.size();
     Positions name{{modelName, index}};
     Positions identity;
     if (!identifier.empty()) identity.emplace(identifier, index);

@@ -24,7 +24,7 @@ class ModelRegistry : private UTILS::NonCopyMovable {
 public:
     using ModelEnvironment = CONTAINERS::ModelEnvironment;
     using WeightAndIdentifier = std::pair<std::shared_ptr<Weight>, std::string>;
-    using Positions = std::map<std::string, unsigned long>;  // in environments()
+    using Positions = std::map<std::string, std::size_t>;  // in environments()
 
     // Relative file names are resolved against `workingPath`.
     explicit ModelRegistry(wchar_t const* workingPath);

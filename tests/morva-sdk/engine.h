@@ -6,6 +6,7 @@
 
 #include <cmath>
 #include <numbers>
+#include <regex>
 #include <string>
 #include <utility>
 #include <vector>
@@ -58,13 +59,18 @@ auto gives(Result result, ::testing::Matcher<std::string> const& err = std::stri
                             ::testing::Field("stdout", &Seen::out, out));
 }
 
+// The whole text, by the rules of POSIX on every system.
+MATCHER_P(MatchesPattern, pattern, "matches " + pattern) {
+    return std::regex_match(arg, std::regex(pattern, std::regex::extended));
+}
+
 // Matches an Outcome of an engine exception: its one text on standard error. `place` is what stands
 // between "in file " and " Function " (a regular expression).
 template <class Result>
 auto fails(Result result, std::string const& function, std::string const& message,
            std::string const& place = "[a-z_/0-9-]* Line [0-9]*") {
     auto const text = "MORVA_Exeption in file " + place + " Function " + function + "\n messege ";
-    return gives(result, ::testing::MatchesRegex(text + message + "\n"), ::testing::_);
+    return gives(result, MatchesPattern(text + message + "\n"), ::testing::_);
 }
 
 // The engine for one test, without printing.

@@ -5,7 +5,11 @@ set -eu
 library=$1
 shift
 declared=$(cat "$@" | grep -oE '\b(Morva_[A-Za-z0-9_]+|MorvaExt_[A-Za-z0-9_]+)\(' | tr -d '(' | sort -u)
-exported=$(nm -D --defined-only "$library" | awk '{ print $3 }' | sort -u)
+case $library in
+    *.dylib) exported=$(llvm-nm -gU "$library" | sed 's/.* _//' | sort -u) ;;
+    *.dll) exported=$(objdump -p "$library" | sed -n 's/^.*\[ *[0-9]*\] .*\(Morva\)/\1/p' | sort -u) ;;
+    *) exported=$(nm -D --defined-only "$library" | awk '{ print $3 }' | sort -u) ;;
+esac
 if [ "$declared" != "$exported" ]; then
     printf 'declared:\n%s\n\nexported:\n%s\n' "$declared" "$exported"
     exit 1

@@ -182,8 +182,8 @@ TEST(ExtensionTexts, OfTheLastErrorTheVersionAndTheProcessor) {
     std::string other = "not run";
     std::thread([&] { other = MorvaExt_LastError(); }).join();
     EXPECT_EQ(other, "");
-    EXPECT_THAT(MorvaExt_Version(), ::testing::MatchesRegex("[0-9]+\\.[0-9]+\\.[0-9]+"));
-    EXPECT_THAT(MorvaExt_ProcessorFeatures(), ::testing::MatchesRegex(".*avx2.*|neon"));
+    EXPECT_THAT(MorvaExt_Version(), MatchesPattern(std::string("[0-9]+\\.[0-9]+\\.[0-9]+")));
+    EXPECT_THAT(MorvaExt_ProcessorFeatures(), MatchesPattern(std::string(".*avx2.*|neon")));
 }
 
 namespace {

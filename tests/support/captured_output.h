@@ -2,6 +2,7 @@
 // way it is written (iostreams, stdio, file descriptor).
 #pragma once
 
+#include <fcntl.h>
 #include <unistd.h>
 
 #include <cstdio>
@@ -39,6 +40,9 @@ private:
         std::cerr.flush();
         std::fflush(nullptr);
         dup2(target, descriptor_);
+#ifdef _WIN32  // lines end as they are written
+        _setmode(descriptor_, _O_BINARY);
+#endif
     }
 
     int descriptor_;

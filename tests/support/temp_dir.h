@@ -1,11 +1,9 @@
 // A folder of one test, removed with everything in it at the end.
 #pragma once
 
-#include <stdlib.h>
-
 #include <filesystem>
 #include <fstream>
-#include <stdexcept>
+#include <random>
 #include <string>
 #include <string_view>
 
@@ -18,9 +16,10 @@ inline void writeFile(std::filesystem::path const& path, std::string_view bytes)
 class TempDir {
 public:
     TempDir() {
-        auto pattern = (std::filesystem::temp_directory_path() / "morva-XXXXXX").string();
-        if (mkdtemp(pattern.data()) == nullptr) throw std::runtime_error("no temporary folder");
-        path_ = pattern;
+        std::random_device random;
+        do {
+            path_ = std::filesystem::temp_directory_path() / ("morva-" + std::to_string(random()));
+        } while (!std::filesystem::create_directory(path_));
     }
     ~TempDir() {
         std::error_code ignored;

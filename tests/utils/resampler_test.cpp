@@ -21,7 +21,7 @@ using Block = std::vector<float>;
 
 namespace {
 
-constexpr unsigned long rates[] = {8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
+constexpr std::size_t rates[] = {8000, 12000, 16000, 24000, 32000, 44100, 48000, 88200, 96000};
 double const tolerance = std::pow(10.0, -90.0 / 20.0);
 
 void append(Block& all, Block const& block) {
@@ -59,13 +59,13 @@ private:
 
 }  // namespace
 
-class RatePair : public testing::TestWithParam<std::tuple<unsigned long, unsigned long>> {};
+class RatePair : public testing::TestWithParam<std::tuple<std::size_t, std::size_t>> {};
 
 // Every block has its exact length; the stream is the library's, shifted by the leading zeros; a
 // reset begins it anew, bit for bit.
 TEST_P(RatePair, BlocksAreTheLibrarysStreamAfterTheLeadingZeros) {
     auto const [inRate, outRate] = GetParam();
-    for (unsigned long const ms : {10, 20, 30, 40}) {
+    for (std::size_t const ms : {10, 20, 30, 40}) {
         std::size_t const inBlock = inRate * ms / 1000;
         std::size_t const outBlock = outRate * ms / 1000;
         SCOPED_TRACE(testing::Message() << ms << " ms, " << inBlock << " -> " << outBlock);

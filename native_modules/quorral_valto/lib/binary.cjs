@@ -46,7 +46,7 @@ function load() {
       const raw = require(file);
       // The same file once more, asked for its second export object.
       const second = { exports: { sessions: {} } };
-      process.dlopen(second, file);
+      process.dlopen(second, path.toNamespacedPath(file));
       return { raw, sessions: second.exports.sessions, directory: path.dirname(file) };
     } catch (cause) {
       tried.push({ file, reason: cause.message, cause });

@@ -16,7 +16,7 @@ function startupError(nativeCode, directory, weightFiles) {
   const weight = weightFiles[FIRST_WEIGHT - nativeCode];
   if (weight === undefined) return fail('ERR_VALTO_ENGINE', 'The engine could not be created');
   const file = path.join(directory, weight);
-  if (/[\u{10000}-\u{10FFFF}]/u.test(directory)) {
+  if (process.platform !== 'win32' && /[\u{10000}-\u{10FFFF}]/u.test(directory)) {
     return fail(
       'ERR_VALTO_PATH',
       `The install path holds a character outside the Basic Multilingual Plane (an emoji?), ` +

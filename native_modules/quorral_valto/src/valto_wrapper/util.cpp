@@ -1,7 +1,5 @@
-// Text conversion through the standard library's converters, and the loader's view of this module.
+// Text conversion through the standard library's converters.
 #include "native_modules/quorral_valto/src/valto_wrapper/util.h"
-
-#include <dlfcn.h>
 
 #include <codecvt>
 #include <locale>
@@ -29,16 +27,5 @@ std::wstring ToUTF16(const std::string& text) {
 }
 
 #pragma GCC diagnostic pop
-
-std::string ModuleBasePath() {
-    Dl_info info{};
-    if (dladdr(reinterpret_cast<const void*>(&ModuleBasePath), &info) == 0 ||
-        info.dli_fname == nullptr) {
-        return {};
-    }
-    const std::string path = info.dli_fname;
-    const auto slash = path.rfind('/');
-    return slash == std::string::npos ? std::string() : path.substr(0, slash);
-}
 
 }  // namespace quorral::util

@@ -13,7 +13,8 @@ std::string ToUTF8(const std::wstring& text);
 // ill-formed UTF-8.
 std::wstring ToUTF16(const std::string& text);
 
-// Directory of the file that this code was loaded from, without a trailing "/". Empty when unknown.
+// Directory of the file that this code was loaded from, without the separator behind it. Empty when
+// unknown.
 std::string ModuleBasePath();
 
 }  // namespace quorral::util

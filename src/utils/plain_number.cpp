@@ -1,0 +1,40 @@
+#include "utils/plain_number.h"
+
+#include <locale.h>
+#include <stdlib.h>
+
+#include <algorithm>
+#include <limits>
+
+namespace MORVA::UTILS {
+namespace {
+
+#ifdef _WIN32  // the same functions under other names
+_locale_t plainLocale() {
+    static _locale_t const plain = _create_locale(LC_ALL, "C");
+    return plain;
+}
+auto const realIn = &_strtod_l;
+auto const integerIn = &_strtol_l;
+#else
+locale_t plainLocale() {
+    static locale_t const plain = newlocale(LC_ALL_MASK, "C", nullptr);
+    return plain;
+}
+auto const realIn = &strtod_l;
+auto const integerIn = &strtol_l;
+#endif
+
+}  // namespace
+
+float toReal(std::string const& text) {
+    return static_cast<float>(realIn(text.c_str(), nullptr, plainLocale()));
+}
+
+int toInteger(std::string const& text) {
+    long const value = integerIn(text.c_str(), nullptr, 10, plainLocale());
+    return static_cast<int>(
+        std::clamp<long>(value, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
+}
+
+}  // namespace MORVA::UTILS
