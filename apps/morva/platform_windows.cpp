@@ -94,6 +94,9 @@ BOOL WINAPI onControl(DWORD /*event*/) {
 }  // namespace
 
 void prepareStreams() {
+    // A descriptor that is not open is a failed call, and does not end the program.
+    ::_set_invalid_parameter_handler(
+        [](wchar_t const*, wchar_t const*, wchar_t const*, unsigned, std::uintptr_t) {});
     for (int const stream : {0, 1, 2}) ::_setmode(stream, _O_BINARY);
     HANDLE const terminal = handleOf(2);
     DWORD mode = 0;
