@@ -28,7 +28,8 @@ static int values(char const* kind, FILE* sound) {
         if (strcmp(kind, "NC") == 0) {
             count = frameSize;
             for (int i = 0; i < frameSize; ++i) exact[i] = (float)in[i] / 32768;
-            if (Morva_NC_CleanAmbientNoiseFloat(session, exact, frameSize, out, frameSize)) return 1;
+            if (Morva_NC_CleanAmbientNoiseFloat(session, exact, frameSize, out, frameSize))
+                return 1;
         } else if (strcmp(kind, "VAD") == 0) {
             out[0] = Morva_VAD_FrameInt16(session, in, frameSize);
         } else {

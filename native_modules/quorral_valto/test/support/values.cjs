@@ -1,11 +1,11 @@
-// values.c through the host module: node values.cjs PACKAGE RECORDING {NC|VAD MODEL.mvw} ...
+// tests/targets/values.c through the host module: node values.cjs PACKAGE RECORDING {NC|VAD MODEL.mvw} ...
 'use strict';
 const fs = require('node:fs');
 const path = require('node:path');
 
 const [folder, recording, ...wanted] = process.argv.slice(2);
 const valto = require(path.resolve(folder));
-const shipped = require('../../models/shipped.json');
+const shipped = require('../../../../models/shipped.json');
 const bytes = fs.readFileSync(recording);
 const sound = new Int16Array(bytes.buffer, bytes.byteOffset, bytes.length / 2);
 
