@@ -109,7 +109,8 @@ TEST_P(Products, AgreeWithDoubleSumsWhereverTheOperandsLie) {
         Matrix V = W;
         if (half) std::transform(W.data.begin(), W.data.end(), V.data.begin(), toHalfPrecision);
         PackedMatrix const packed(V);
-        EXPECT_EQ(packed.isHalfPrecision(), half && MORVA::CONTAINERS::panelProduct().half != nullptr);
+        EXPECT_EQ(packed.isHalfPrecision(),
+                  half && MORVA::CONTAINERS::panelProduct().half != nullptr);
         matMulPlusB(down, packed, bias, out);
         addProduct(bound, out, {down, 1, rows}, V, bias);
         for (std::size_t offset = 0; offset < 16; ++offset) {

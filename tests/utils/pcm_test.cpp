@@ -71,6 +71,7 @@ TEST(Pcm, TakesAnyFloat) {
 }
 
 TEST(FloatControl, HoldsForItsScopeOnly) {
+    if (kFlushDenormals == 0) GTEST_SKIP() << "one mode only";
     float volatile tiny = 1e-39f;
     auto const denormalSurvives = [&] { return tiny * 1.0f != 0.0f; };
     auto const before = floatControl();

@@ -71,7 +71,7 @@ export class Denoiser extends Node {
         module: assets.module,
         models: assets.models.filter(({ name }) => !sent.has(name)),
         session: { model, voice: voice ? voiceModel : null },
-        ...{ channels, meterSeconds },
+        ...{ channels, meterSeconds, isLive: context instanceof AudioContext },
       });
       for (const { name } of assets.models) sent.add(name);
       return node;

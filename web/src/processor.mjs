@@ -43,7 +43,7 @@ class DenoiserProcessor extends AudioWorkletProcessor {
   #queues = [];
   #limit = NO_LIMIT;
   #bypass = false;
-  #punctuality = new Punctuality();
+  #punctuality = null;
   #meters = new Float32Array(2);
   #report = { type: 'meters', voice: 0, noise: 0, dropouts: 0, memory: 0 };
   #framesPerReport = 0;
@@ -64,7 +64,7 @@ class DenoiserProcessor extends AudioWorkletProcessor {
     };
   }
 
-  #open({ module, models, session, channels, meterSeconds }) {
+  #open({ module, models, session, channels, meterSeconds, isLive }) {
     engine ??= new Engine(module);
     for (const model of models) engine.addModel(model);
     for (let i = 0; i < channels; ++i) {
@@ -74,6 +74,8 @@ class DenoiserProcessor extends AudioWorkletProcessor {
     }
     const [first] = this.#queues;
     this.#framesPerReport = Math.round(meterSeconds * sampleRate);
+    this.#untilReport = first.latency; // until there is something to tell
+    if (isLive) this.#punctuality = new Punctuality();
     this.#tail = 2 * first.latency;
     this.port.postMessage({ type: 'ready', latency: first.latency });
   }
@@ -104,7 +106,7 @@ class DenoiserProcessor extends AudioWorkletProcessor {
     this.#queues[0].canceller.readMeters(this.#meters);
     this.#report.voice = this.#meters[0];
     this.#report.noise = this.#meters[1];
-    this.#report.dropouts = this.#punctuality.dropouts;
+    this.#report.dropouts = this.#punctuality?.dropouts ?? 0;
     this.#report.memory = engine.memory.buffer.byteLength;
     this.port.postMessage(this.#report);
   }
@@ -116,10 +118,10 @@ class DenoiserProcessor extends AudioWorkletProcessor {
     const quantum = output[0].length;
     this.#silentFor = input.length > 0 ? 0 : this.#silentFor + quantum;
     if (this.#silentFor > this.#tail) {
-      this.#punctuality.pause();
+      this.#punctuality?.pause();
       return false; // until something is connected and plays
     }
-    this.#punctuality.check(quantum);
+    this.#punctuality?.check(quantum);
     this.#apply(parameters);
     for (let i = 0; i < this.#queues.length; ++i) this.#queues[i].run(input[i], output[i]);
     this.#tell(quantum);
