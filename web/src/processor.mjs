@@ -119,7 +119,7 @@ class DenoiserProcessor extends AudioWorkletProcessor {
     this.#silentFor = input.length > 0 ? 0 : this.#silentFor + quantum;
     if (this.#silentFor > this.#tail) {
       this.#punctuality?.pause();
-      return false; // until something is connected and plays
+      return true; // idle until something plays; after false, some browsers never call again
     }
     this.#punctuality?.check(quantum);
     this.#apply(parameters);
