@@ -26,7 +26,7 @@ try {
   });
   const names = noiseModels.map(({ name }) => name);
   const conversation = new Conversation(engine, names, tell);
-  onmessage = ({ data }) => attempt(() => conversation.take(data));
+  self.onmessage = ({ data }) => attempt(() => conversation.take(data));
   tell({
     type: 'hello',
     models: noiseModels.map(({ name, rate }) => ({ name, rate })),

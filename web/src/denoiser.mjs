@@ -21,7 +21,9 @@ function answerOf(port) {
       else reject(new MorvaError(data.code ?? 'ERR_MORVA_ENGINE', data.message));
     };
     port.onmessageerror = () =>
-      reject(new MorvaError('ERR_MORVA_UNSUPPORTED', 'This browser hands no module to audio threads.'));
+      reject(
+        new MorvaError('ERR_MORVA_UNSUPPORTED', 'This browser hands no module to audio threads.'),
+      );
   });
 }
 

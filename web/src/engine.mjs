@@ -193,7 +193,8 @@ export class NoiseLevelMeter extends Session {
     const engine = this.take(frame);
     const { handle, frameSize, input, output } = this;
     const { MorvaExt_NoiseDB_FrameFloat: measure } = engine.functions;
-    if (measure(handle, input.address, frameSize, output.address) !== 0) throw engine.error('The frame was refused');
+    if (measure(handle, input.address, frameSize, output.address) !== 0)
+      throw engine.error('The frame was refused');
     return output.samples(true)[0];
   }
 }

@@ -14,7 +14,8 @@ const PROBES = [
   '0061736d01000000010401600000030201000a080106000640190b0b',
 ];
 
-const bytesOf = (digits) => Uint8Array.from(digits.match(/../g), (byte) => Number.parseInt(byte, 16));
+const bytesOf = (digits) =>
+  Uint8Array.from(digits.match(/../g), (byte) => Number.parseInt(byte, 16));
 
 /** Throws the one error for a browser that cannot run the engine. */
 export function requireSupport(assembly = globalThis.WebAssembly) {

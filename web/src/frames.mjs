@@ -1,5 +1,5 @@
 // An engine of one's own, for workers and for whole files.
-import { loadAssets, models as all } from './assets.mjs';
+import { models as all, loadAssets } from './assets.mjs';
 import { Engine } from './engine.mjs';
 
 /**

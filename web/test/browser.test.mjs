@@ -1,6 +1,14 @@
 // The package and the page in a headless browser whose microphone plays the bundled noisy recording.
 import assert from 'node:assert/strict';
-import { cpSync, mkdirSync, mkdtempSync, readdirSync, rmSync, symlinkSync, writeFileSync } from 'node:fs';
+import {
+  cpSync,
+  mkdirSync,
+  mkdtempSync,
+  readdirSync,
+  rmSync,
+  symlinkSync,
+  writeFileSync,
+} from 'node:fs';
 import os from 'node:os';
 import path from 'node:path';
 import { after, before, test } from 'node:test';
@@ -66,7 +74,10 @@ const RENDER = async () => {
   const context = new OfflineAudioContext(2, 48000 * 5, 48000);
   const audio = await context.decodeAudioData(encoded);
   const progress = [];
-  const options = { meterSeconds: 0.02, onProgress: ({ loaded, total }) => progress.push(loaded / total) };
+  const options = {
+    meterSeconds: 0.02,
+    onProgress: ({ loaded, total }) => progress.push(loaded / total),
+  };
   const [first, second] = await Promise.all([
     Denoiser.create(context, options),
     Denoiser.create(context, { model: 'small_NC', voice: false, attenuationLimit: 0 }),
@@ -84,11 +95,13 @@ const RENDER = async () => {
   const engine = await loadEngine({ models: ['full_NC-ca03f4'] });
   const session = new engine.NoiseCanceller({ sampleRate: 48000, model: 'full_NC-ca03f4' });
   const frames = before.slice();
-  for (let at = 0; at + 480 <= frames.length; at += 480) session.process(frames.subarray(at, at + 480));
+  for (let at = 0; at + 480 <= frames.length; at += 480)
+    session.process(frames.subarray(at, at + 480));
   const shift = Math.round(first.latency * 48000) - session.latency;
   const worst = (one, other, late) => {
     let most = 0;
-    for (let i = 480; i + late < one.length; ++i) most = Math.max(most, Math.abs(one[i + late] - other[i]));
+    for (let i = 480; i + late < one.length; ++i)
+      most = Math.max(most, Math.abs(one[i + late] - other[i]));
     return most;
   };
   while (meters.length < 200) await new Promise((resolve) => setTimeout(resolve, 20));
@@ -143,7 +156,10 @@ const LISTEN = async () => {
     powers.push(10 * Math.log10(values.reduce((sum, x) => sum + x * x, 0) / values.length + 1e-10));
   }
   powers.sort((a, b) => a - b);
-  return { quiet: powers[Math.floor(powers.length / 5)], loud: powers[Math.floor(powers.length * 0.9)] };
+  return {
+    quiet: powers[Math.floor(powers.length / 5)],
+    loud: powers[Math.floor(powers.length * 0.9)],
+  };
 };
 
 browsing('the far side of a call hears it clean', 'call.html', async (page) => {
@@ -171,10 +187,17 @@ test('esbuild and Vite build applications with it', { skip }, async (t) => {
   mkdirSync(path.join(app, 'node_modules'), { recursive: true });
   symlinkSync(path.dirname(dist), path.join(app, 'node_modules/quorral_valto_web'));
   writeFileSync(path.join(app, 'main.js'), APP);
-  const page = '<!doctype html><link rel="icon" href="data:,"><script type="module" src="./main.js"></script>';
+  const page =
+    '<!doctype html><link rel="icon" href="data:,"><script type="module" src="./main.js"></script>';
   writeFileSync(path.join(app, 'index.html'), page);
   const entry = { entryPoints: [path.join(app, 'main.js')], outdir: built('esbuild') };
-  await esbuild.build({ ...entry, bundle: true, format: 'esm', target: 'es2022', logLevel: 'error' });
+  await esbuild.build({
+    ...entry,
+    bundle: true,
+    format: 'esm',
+    target: 'es2022',
+    logLevel: 'error',
+  });
   for (const file of ['processor.mjs', 'morva_sdk.wasm', 'models']) {
     cpSync(path.join(dist, file), path.join(built('esbuild'), file), { recursive: true });
   }
