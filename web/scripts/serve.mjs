@@ -15,8 +15,11 @@ const TYPES = {
 };
 const PAGE = fileURLToPath(new URL('../../build/web-page', import.meta.url));
 
-/** @returns {Promise<{ url: string, requests: string[], close: () => Promise<void> }>} on the loopback interface */
-export async function serveFolder(folder = PAGE, port = 0) {
+/**
+ * @param {{ port?: number, headers?: Record<string, string> }} [options]
+ * @returns {Promise<{ url: string, requests: string[], close: () => Promise<void> }>} on the loopback interface
+ */
+export async function serveFolder(folder = PAGE, { port = 0, headers = {} } = {}) {
   const requests = [];
   const server = createServer((request, response) => {
     const { pathname } = new URL(request.url, 'http://localhost');
@@ -25,7 +28,11 @@ export async function serveFolder(folder = PAGE, port = 0) {
     requests.push(pathname);
     if (!existsSync(file) || !statSync(file).isFile()) return response.writeHead(404).end();
     const type = TYPES[path.extname(file)] ?? 'application/octet-stream';
-    response.writeHead(200, { 'Content-Type': type, 'Content-Length': statSync(file).size });
+    response.writeHead(200, {
+      ...headers,
+      'Content-Type': type,
+      'Content-Length': statSync(file).size,
+    });
     createReadStream(file).pipe(response);
   });
   await new Promise((resolve, reject) => {
@@ -40,5 +47,5 @@ export async function serveFolder(folder = PAGE, port = 0) {
 
 if (import.meta.url === pathToFileURL(process.argv[1]).href) {
   const [folder, port = '0'] = process.argv.slice(2);
-  console.log((await serveFolder(folder, Number(port))).url);
+  console.log((await serveFolder(folder, { port: Number(port) })).url);
 }
