@@ -3,7 +3,7 @@ import { Engine } from './engine.mjs';
 import { FrameQueue } from './frame-queue.mjs';
 
 const NO_LIMIT = 100; // decibels; AudioParams are finite
-const LATE_MS = 100; // behind the clock on the wall: a dropout that frame counts do not show
+const LATE_MS = 50; // behind the clock on the wall: a dropout that frame counts do not show
 
 /** @type {Engine | null} */
 let engine = null;
