@@ -1,4 +1,5 @@
-// Takes the picture of the live page for the documents: node apps/live-page/screenshot.mjs FILE.png
+// Takes the picture of the live page for the documents: node apps/live-page/screenshot.mjs FILE.png [ADDRESS]
+// ADDRESS: of the page as static files, already served; without it this package's own server is started.
 // A headless browser opens the bundled recording and stops in the middle of listening to it.
 import { execFileSync } from 'node:child_process';
 import { mkdtempSync, rmSync, writeFileSync } from 'node:fs';
@@ -7,8 +8,8 @@ import path from 'node:path';
 import { findChromium, openBrowser, openPage } from './browser.mjs';
 import { startServer } from './server.mjs';
 
-const [target] = process.argv.slice(2);
-if (!target) throw new Error('usage: node apps/live-page/screenshot.mjs FILE.png');
+const [target, address] = process.argv.slice(2);
+if (!target) throw new Error('usage: node apps/live-page/screenshot.mjs FILE.png [ADDRESS]');
 if (findChromium() === null) throw new Error('No Chromium found: set CHROMIUM or install it.');
 
 // A picture of noise hardly shrinks; 256 colours, undithered, are a third of the size.
@@ -21,7 +22,7 @@ picture.save(sys.argv[1], optimize=True)
 
 const folder = mkdtempSync(path.join(os.tmpdir(), 'quorral-page-'));
 const browser = await openBrowser(folder);
-const server = await startServer();
+const server = address ? { url: address, close() {} } : await startServer();
 try {
   const { page } = await openPage(browser, server.url, { colorScheme: 'light' });
   await page.click('#example');

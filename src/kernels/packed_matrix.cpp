@@ -41,10 +41,12 @@ PackedMatrix::PackedMatrix(Matrix const& matrix)
     // ones at least, reads the smallest halves back in it.
     UTILS::ScopedFloatControl const asInFrames(UTILS::Denormals::asZero);
     auto const values = packed(matrix);
-    half_.resize(values.size());
-    if (UTILS::toHalfPrecision(values, half_)) return;
-    half_.clear();
-    half_.shrink_to_fit();
+    if (product_.half != nullptr) {
+        half_.resize(values.size());
+        if (UTILS::toHalfPrecision(values, half_)) return;
+        half_.clear();
+        half_.shrink_to_fit();
+    }
     single_.assign(values.begin(), values.end());
 }
 

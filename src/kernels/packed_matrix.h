@@ -1,7 +1,8 @@
 // A weight matrix laid out for the one product that networks run: a row vector times the matrix,
 // plus a bias. Columns are stored in panels of 32, so that a product reads memory strictly forward
 // and keeps its sums in registers; a matrix whose values are all exact in half precision is stored
-// in half precision, which halves what the cache has to deliver and changes no result.
+// in half precision where the processor converts it, which halves what the cache has to deliver and
+// changes no result.
 //
 // The sums are single precision in a fixed order: the same bits from run to run, whatever the
 // alignment of the operands. Read-only after construction; any thread.

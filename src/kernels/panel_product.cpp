@@ -15,14 +15,20 @@ constexpr hn::CappedTag<float, kPanel> kFloats;
 constexpr hn::Rebind<std::uint16_t, decltype(kFloats)> kWords;
 constexpr hn::Rebind<hwy::float16_t, decltype(kFloats)> kHalves;
 constexpr std::size_t kLanes = hn::MaxLanes(kFloats);
+#ifdef __wasm__  // runs on processors with sixteen registers, which eight sums and their factors
+                 // fill
+constexpr std::size_t kRegisters = 4;
+#else
 constexpr std::size_t kRegisters = kPanel / kLanes;
+#endif
+constexpr std::size_t kColumns = kRegisters * kLanes;  // at a time
 
 using Floats = hn::Vec<decltype(kFloats)>;
 
 Floats load(float const* values) {
     return hn::Load(kFloats, values);
 }
-Floats load(std::uint16_t const* values) {
+[[maybe_unused]] Floats load(std::uint16_t const* values) {
     return hn::PromoteTo(kFloats, hn::BitCast(kHalves, hn::Load(kWords, values)));
 }
 
@@ -36,7 +42,7 @@ void accumulate(Floats (&into)[kRegisters], T const* values, float x) {
 
 // Even and odd rows apart, so that sums do not wait for each other.
 template <class T>
-void product(T const* panel, std::size_t rows, float const* x, float* sums) {
+void columns(T const* panel, std::size_t rows, float const* x, float* sums) {
     Floats even[kRegisters];
     Floats odd[kRegisters];
     for (std::size_t i = 0; i < kRegisters; ++i) even[i] = odd[i] = hn::Zero(kFloats);
@@ -51,10 +57,19 @@ void product(T const* panel, std::size_t rows, float const* x, float* sums) {
     }
 }
 
+template <class T>
+void product(T const* panel, std::size_t rows, float const* x, float* sums) {
+    for (std::size_t c = 0; c < kPanel; c += kColumns) columns(panel + c, rows, x, sums + c);
+}
+
 }  // namespace
 
 extern PanelProduct const kProduct;
+#ifdef __wasm__
+PanelProduct const kProduct{product<float>, nullptr};
+#else
 PanelProduct const kProduct{product<float>, product<std::uint16_t>};
+#endif
 
 }  // namespace MORVA::CONTAINERS::HWY_NAMESPACE
 HWY_AFTER_NAMESPACE();

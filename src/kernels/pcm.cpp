@@ -14,6 +14,7 @@ constexpr float kFullScale = 32768.0f;
 constexpr float kPcmMin = -32768.0f;
 constexpr float kPcmMax = 32767.0f;
 constexpr float kUnitLimit = 1e6f;
+constexpr float kUnitLeast = 1e-20f;
 
 // Written with selections only, so that the loops below become vector code.
 constexpr float limited(float x, float low, float high) {
@@ -30,8 +31,9 @@ void pcm16ToFloat(std::span<short const> in, std::span<float> out) {
 
 void unitToPcm16Scale(std::span<float const> in, std::span<float> out) {
     for (std::size_t i = 0; i < in.size(); ++i) {
-        bool const finite = std::abs(in[i]) <= std::numeric_limits<float>::max();
-        out[i] = finite ? limited(in[i], -kUnitLimit, kUnitLimit) * kFullScale : 0.0f;
+        float const size = std::abs(in[i]);
+        bool const sound = size >= kUnitLeast && size <= std::numeric_limits<float>::max();
+        out[i] = sound ? limited(in[i], -kUnitLimit, kUnitLimit) * kFullScale : 0.0f;
     }
 }
 

@@ -11,8 +11,9 @@ namespace MORVA::UTILS {
 void pcm16ToFloat(std::span<short const> in, std::span<float> out);
 
 // -1 .. 1 to the 16-bit scale (x 32768). What is no sound, a NaN or an infinity, becomes 0, so that
-// a filter's memory never holds it; a finite sample beyond 1e6 full scales becomes that, since a
-// sum of larger ones could overflow.
+// a filter's memory never holds it; so does what is smaller than 1e-20, whose products would be
+// denormal, which costs time where they cannot be switched off; a finite sample beyond 1e6 full
+// scales becomes that, since a sum of larger ones could overflow.
 void unitToPcm16Scale(std::span<float const> in, std::span<float> out);
 
 // Limits to -32768 .. 32767; NaN becomes 0.

@@ -77,6 +77,8 @@ char const* missingProcessorFeature() {
 char const* processorFeatures() {
 #ifdef __aarch64__
     return "neon";
+#elif defined(__wasm_simd128__)
+    return "simd128";
 #else
     return "";
 #endif

@@ -109,7 +109,8 @@ bool MorvaInstanceT::closeSession(MorvaSessionT* session, MorvaSessionType type)
 }
 
 bool MorvaInstanceT::remove(MorvaSessionT const* session) {
-    auto const found = std::ranges::find(sessions_, session, &std::unique_ptr<MorvaSessionT>::get);
+    auto const found = std::find_if(sessions_.begin(), sessions_.end(),
+                                    [&](auto const& owned) { return owned.get() == session; });
     if (found == sessions_.end()) return false;
     directory_.remove(session);
     sessions_.erase(found);

@@ -82,7 +82,7 @@ MORVA_API int MorvaExt_ListModels(MorvaExtModelInfo* models, int capacity);
 MORVA_API char const* MorvaExt_Version(void);
 
 /* [any thread] The processor's features that matter here, blank-separated: "sse4.1 avx2 fma bmi2
- * avx512f" or "neon". */
+ * avx512f", "neon" or "simd128". */
 MORVA_API char const* MorvaExt_ProcessorFeatures(void);
 
 /* One diagnostic: `stream` 1 or 2, where it would be printed (standard output, standard error), and

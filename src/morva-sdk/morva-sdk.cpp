@@ -35,7 +35,7 @@ int registerModel(bool hasInput, char const* nullWarning, Register&& add) {
 template <class Create>
 void* createSession(std::initializer_list<MorvaSamplingRate> rates, Create&& create) {
     return funnel(kHandleFailures, [&]() -> void* {
-        if (!std::ranges::all_of(rates, isSamplingRate)) {
+        if (!std::all_of(rates.begin(), rates.end(), isSamplingRate)) {
             printError("Unsupported Sampling rates!");
             return nullptr;
         }

@@ -8,7 +8,7 @@ namespace {
 // The slot of `chunk` that holds `session`, or null.
 template <class Chunk>
 auto slotOf(Chunk& chunk, void const* session) {
-    auto const slot = std::ranges::find_if(chunk.slots, [&](auto const& held) {
+    auto const slot = std::find_if(chunk.slots.begin(), chunk.slots.end(), [&](auto const& held) {
         return held.load(std::memory_order_acquire) == session;
     });
     return slot == chunk.slots.end() ? nullptr : &*slot;

@@ -22,13 +22,15 @@ enum class MorvaSessionType : int {
 inline constexpr std::array kSamplingRatesHz{MORVA_SAMPLING_RATES(MORVA_VALUE)};
 inline constexpr std::array kFrameDurationsMs{MORVA_FRAME_DURATIONS(MORVA_VALUE)};
 #undef MORVA_VALUE
-static_assert(std::ranges::is_sorted(kSamplingRatesHz));
+static_assert(std::is_sorted(kSamplingRatesHz.begin(), kSamplingRatesHz.end()));
 
 constexpr bool isSamplingRate(int hz) {
-    return std::ranges::find(kSamplingRatesHz, hz) != kSamplingRatesHz.end();
+    return std::find(kSamplingRatesHz.begin(), kSamplingRatesHz.end(), hz) !=
+           kSamplingRatesHz.end();
 }
 constexpr bool isFrameDuration(int ms) {
-    return std::ranges::find(kFrameDurationsMs, ms) != kFrameDurationsMs.end();
+    return std::find(kFrameDurationsMs.begin(), kFrameDurationsMs.end(), ms) !=
+           kFrameDurationsMs.end();
 }
 
 // Samples per frame: rate * duration / 1000, truncated; 0 for a negative rate or duration.

@@ -71,7 +71,8 @@ NoiseModel createNoiseModel(MorvaSamplingRate rate, MorvaFrameDuration frameMs,
                             char const* modelName) {
     auto environment = requireEnvironment(rate, modelName, MorvaSessionType::NoiseCancellation);
     auto const version = environment->first->getWeightVersion();
-    auto const row = std::ranges::find(kNoiseCleaners, version, &NoiseRow::version);
+    auto const row = std::find_if(std::begin(kNoiseCleaners), std::end(kNoiseCleaners),
+                                  [&](NoiseRow const& each) { return each.version == version; });
     if (row == std::end(kNoiseCleaners)) fail(kUnsupported, kLineUnsupportedVersion);
     return row->build(std::move(environment), static_cast<std::size_t>(frameMs));
 }

@@ -25,8 +25,10 @@ constexpr DelayRow kDelays[] = {
 
 // 0 for a pair that is not supported.
 std::size_t pipelineDelayMs(std::size_t modelFrameMs, std::size_t sessionFrameMs) {
-    auto const column = std::ranges::find(kSessionFramesMs, sessionFrameMs);
-    auto const row = std::ranges::find(kDelays, modelFrameMs, &DelayRow::modelFrameMs);
+    auto const column = std::find(kSessionFramesMs.begin(), kSessionFramesMs.end(), sessionFrameMs);
+    auto const row =
+        std::find_if(std::begin(kDelays), std::end(kDelays),
+                     [&](DelayRow const& each) { return each.modelFrameMs == modelFrameMs; });
     if (column == kSessionFramesMs.end() || row == std::end(kDelays)) return 0;
     return row->delayMs[static_cast<std::size_t>(column - kSessionFramesMs.begin())];
 }

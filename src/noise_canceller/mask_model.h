@@ -33,7 +33,7 @@ public:
               SpectralParams(environment, frameMs, generation(number)),
               Stage::Params(ParameterReader(environment, generation(number).suffix)) {
             if (mu.empty() || sd.empty()) refuseWeight("MU or SD is empty");
-            if (std::ranges::count(sd, 0.0f) > 0) refuseWeight("SD holds a zero");
+            if (std::count(sd.begin(), sd.end(), 0.0f) > 0) refuseWeight("SD holds a zero");
             Network::check(featureWidth(), bands.bands());
             std::size_t const layers = Network::weightNonLinear.size();
             Network::packed = sharedPackedNetwork(
@@ -66,7 +66,7 @@ public:
         spectral_.reset();
         pipeline_.reset();
         meter_.reset();
-        std::ranges::fill(state_, 0.0f);
+        std::fill(state_.begin(), state_.end(), 0.0f);
         silentInput_ = false;
     }
 
@@ -107,8 +107,8 @@ private:
     // Digital silence can bypass the network.
     void examineInput(std::vector<float> const& frame) {
         if (!params_.skipFrame || frame.empty()) return;
-        auto const [low, high] = std::ranges::minmax(frame);
-        silentInput_ = SpectralParams::kSkipThreshold >= std::max(std::abs(high), std::abs(low));
+        auto const [low, high] = std::minmax_element(frame.begin(), frame.end());
+        silentInput_ = SpectralParams::kSkipThreshold >= std::max(std::abs(*high), std::abs(*low));
     }
 
     Params const params_;

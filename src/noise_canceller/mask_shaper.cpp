@@ -22,13 +22,13 @@ MaskShaper::MaskShaper(SpectralParams const& params)
       applied_(params.coefficientNumber) {}
 
 void MaskShaper::reset() {
-    std::ranges::fill(applied_, 0.0f);
+    std::fill(applied_.begin(), applied_.end(), 0.0f);
 }
 
 std::vector<float>& MaskShaper::shape(std::vector<float> const& compressed) {
     params_.bands.expand(compressed, expanded_);
-    std::ranges::copy(expanded_,
-                      current_.begin() + static_cast<std::ptrdiff_t>(params_.filtrBegin));
+    std::copy(expanded_.begin(), expanded_.end(),
+              current_.begin() + static_cast<std::ptrdiff_t>(params_.filtrBegin));
     sharpen();
     smooth();
     if (params_.enableRmThreshold) {
@@ -57,7 +57,7 @@ void MaskShaper::sharpen() {
 void MaskShaper::smooth() {
     float const c = params_.smootCoef;
     if (c == 1.0f) {
-        std::ranges::copy(current_, applied_.begin());
+        std::copy(current_.begin(), current_.end(), applied_.begin());
         return;
     }
     for (std::size_t i = 0; i < applied_.size(); ++i) {

@@ -33,7 +33,7 @@ void calcFeatures(std::vector<std::complex<float>> const& spectrum, std::vector<
 
 void applyClipFix(std::vector<float>& frame, SpectralParams const& params) {
     if (frame.empty()) return;
-    float const peak = *std::ranges::max_element(frame);
+    float const peak = *std::max_element(frame.begin(), frame.end());
     if (!(peak > params.clipFixPoint)) return;
     float const scale = params.clipFixPoint / peak;
     for (float& sample : frame) sample *= scale;

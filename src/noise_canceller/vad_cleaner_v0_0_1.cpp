@@ -23,7 +23,8 @@ VadCleaner_v0_0_1::VadCleaner_v0_0_1(ModelEnvironment model, std::size_t frameMs
       windowed_(params_.frameLength),
       spectrum_(params_.bins),
       powers_(params_.bins) {
-    if (std::ranges::find(kFrameDurationsMs, frameMs) == std::end(kFrameDurationsMs)) {
+    if (std::find(std::begin(kFrameDurationsMs), std::end(kFrameDurationsMs), frameMs) ==
+        std::end(kFrameDurationsMs)) {
         UTILS::say(UTILS::Channel::output, "ERROR FRAMEDURATIONS");
     }
     resetSession();
@@ -32,7 +33,7 @@ VadCleaner_v0_0_1::VadCleaner_v0_0_1(ModelEnvironment model, std::size_t frameMs
 bool VadCleaner_v0_0_1::resetSession() {
     level_ = LevelTracker();
     watchdog_ = StateWatchdog();
-    std::ranges::fill(state_, 0.0f);
+    std::fill(state_.begin(), state_.end(), 0.0f);
     samples_.start = samples_.end = 0;
     samples_.push_backNULL(params_.frameLength);
     features_.start = features_.end = 0;
@@ -66,9 +67,9 @@ float VadCleaner_v0_0_1::probabilityCalc(float const* window, std::size_t n) {
     UTIL_FUNCTIONS::multiply(window, params_.hammingWindow->data(), windowed_.data(), n);
     params_.transform->computeForward(windowed_, spectrum_);
     powers_.resize(spectrum_.size());
-    std::ranges::transform(spectrum_, powers_.begin(), [](std::complex<float> bin) {
-        return bin.real() * bin.real() + bin.imag() * bin.imag();
-    });
+    std::transform(
+        spectrum_.begin(), spectrum_.end(), powers_.begin(),
+        [](std::complex<float> bin) { return bin.real() * bin.real() + bin.imag() * bin.imag(); });
     poolBands(powers_);
     for (float& power : powers_) power += 1.0f;
     UTILS::logarithms(powers_);
@@ -85,7 +86,7 @@ float VadCleaner_v0_0_1::probabilityCalc(float const* window, std::size_t n) {
 }
 
 void VadCleaner_v0_0_1::state_reset_functionality(float logit) {
-    if (watchdog_.observe(logit)) std::ranges::fill(state_, 0.0f);
+    if (watchdog_.observe(logit)) std::fill(state_.begin(), state_.end(), 0.0f);
 }
 
 }  // namespace MORVA::NOISE_CANCELLER

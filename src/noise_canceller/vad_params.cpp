@@ -79,7 +79,7 @@ float VadParams::standardise(float value, std::size_t k) const {
 void VadParams::checkShapes() const {
     requireLength("MU", mu, featureCount);
     requireLength("SD", sd, featureCount);
-    if (!std::ranges::all_of(sd, [](float v) { return v + kEpsilon > 0.0f; })) {
+    if (!std::all_of(sd.begin(), sd.end(), [](float v) { return v + kEpsilon > 0.0f; })) {
         refuseWeight("SD holds a variance that is not positive");
     }
     std::size_t const features = (kContextFrames + 1) * featureCount;

@@ -15,7 +15,7 @@ constexpr double kNoDrift = 1e-15;
 
 BandLimitedInterpolator::BandLimitedInterpolator(std::size_t inRate, std::size_t outRate)
     : filter_(InterpolationFilter::forRates(inRate, outRate)),
-      phaseStep_(filter_->inStep() % filter_->outStep()),
+      phaseStep_(static_cast<std::size_t>(filter_->inStep() % filter_->outStep())),
       step_(1.0 / (static_cast<double>(outRate) / static_cast<double>(inRate))),
       margin_(
           InterpolationFilter::margin(static_cast<double>(outRate) / static_cast<double>(inRate))),

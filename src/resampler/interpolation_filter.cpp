@@ -92,7 +92,7 @@ InterpolationFilter::InterpolationFilter(std::uint64_t inStep, std::uint64_t out
         raise("The resampler's filter for these rates would be too large",
               "src/resampler/interpolation_filter", "InterpolationFilter");
     }
-    phases_.reserve(outStep);
+    phases_.reserve(static_cast<std::size_t>(outStep));
     for (std::uint64_t phase = 0; phase < outStep; ++phase) {
         Row const none = exactRow(phase);
         Row const behind = driftedRow(phase, Drift::behind);

@@ -29,8 +29,8 @@ EnThreshold::EnThreshold(std::size_t K, std::size_t M, float activityThreshold)
       activeEnergies(M, 0.0) {}
 
 void EnThreshold::reset() {
-    std::ranges::fill(frameEnergies, 0.0);
-    std::ranges::fill(activeEnergies, 0.0);
+    std::fill(frameEnergies.begin(), frameEnergies.end(), 0.0);
+    std::fill(activeEnergies.begin(), activeEnergies.end(), 0.0);
     frameEnergySum = activeEnergySum = 0.0;
     activeCount = 0;
     gain = 1.0f;

@@ -30,7 +30,7 @@ MeanEnergy::MeanEnergy(std::size_t K, std::size_t M, float activityThreshold, fl
       spareNodes(M - 1, 0.0) {}
 
 void MeanEnergy::reset() {
-    std::ranges::fill(frameEnergies, 0.0);
+    std::fill(frameEnergies.begin(), frameEnergies.end(), 0.0);
     frameEnergySum = 0.0;
     spareNodes.splice(spareNodes.end(), activeEnergies, std::next(activeEnergies.begin()),
                       activeEnergies.end());

@@ -14,8 +14,8 @@ Noise::Noise(std::size_t K, std::size_t valuesPerFrame)
 
 void Noise::fillWithSilence() {
     while (frames.size() < windowFrames) addNullFrameNoise();
-    for (auto& frame : frames) std::ranges::fill(frame, 0.0f);
-    std::ranges::fill(mean, 0.0f);
+    for (auto& frame : frames) std::fill(frame.begin(), frame.end(), 0.0f);
+    std::fill(mean.begin(), mean.end(), 0.0f);
 }
 
 Noise::Iterator Noise::addFrameNoise(float const* frame, std::size_t n) {

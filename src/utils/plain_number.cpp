@@ -9,20 +9,18 @@
 namespace MORVA::UTILS {
 namespace {
 
-#ifdef _WIN32  // the same functions under other names
+#ifdef _WIN32  // the same function under another name
 _locale_t plainLocale() {
     static _locale_t const plain = _create_locale(LC_ALL, "C");
     return plain;
 }
 auto const realIn = &_strtod_l;
-auto const integerIn = &_strtol_l;
 #else
 locale_t plainLocale() {
     static locale_t const plain = newlocale(LC_ALL_MASK, "C", nullptr);
     return plain;
 }
 auto const realIn = &strtod_l;
-auto const integerIn = &strtol_l;
 #endif
 
 }  // namespace
@@ -32,7 +30,7 @@ float toReal(std::string const& text) {
 }
 
 int toInteger(std::string const& text) {
-    long const value = integerIn(text.c_str(), nullptr, 10, plainLocale());
+    long const value = strtol(text.c_str(), nullptr, 10);  // asks no locale
     return static_cast<int>(
         std::clamp<long>(value, std::numeric_limits<int>::min(), std::numeric_limits<int>::max()));
 }

@@ -82,7 +82,8 @@ TEST(RefusedWeights, WhatDoesNotFit) {
         bool const isVad = model.kind == Kind::voice;
         MORVA::WEIGHTS::Weight weight;
         ASSERT_TRUE(weight.read(model.weight.data(), model.weight.size()));
-        for (auto const& [name, object] : weight.values()) {
+        for (auto const& entry : weight.values()) {
+            auto const& name = entry.first;
             // Parameters have ranges, and statistics of noise cleaners are read modulo their
             // length.
             if (name.starts_with("Test_") || name.starts_with("CONTROL_")) continue;

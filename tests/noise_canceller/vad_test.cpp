@@ -24,7 +24,8 @@ VadShape randomShape(Random& random) {
     shape.sampleRate = std::array{8000, 16000, 32000}[random.between(0, 2)];
     shape.frameLength = std::array{240, 160, 320, 480, 256, 512}[random.between(0, 5)];
     int const ms = shape.frameLength * 1000 / shape.sampleRate;
-    if (std::ranges::count(std::array{10, 15, 20, 30, 32, 40}, ms) == 0) shape = VadShape();
+    std::array const known{10, 15, 20, 30, 32, 40};
+    if (std::count(known.begin(), known.end(), ms) == 0) shape = VadShape();
     shape.hidden = static_cast<int>(random.between(1, 24));
     shape.gates = random.chance(0.3) ? 1 : shape.hidden;
     shape.layers = static_cast<int>(random.between(1, 4));

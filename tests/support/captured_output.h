@@ -8,9 +8,33 @@
 #include <cstdio>
 #include <iostream>
 #include <memory>
+#include <sstream>
 #include <string>
 
 namespace test_support {
+
+#ifdef __EMSCRIPTEN__  // whose descriptors are not to be turned round: of iostreams only
+
+class CapturedOutput {
+public:
+    explicit CapturedOutput(int descriptor)
+        : stream_(descriptor == 1 ? std::cout : std::cerr), saved_(stream_.rdbuf(all_.rdbuf())) {}
+    CapturedOutput(CapturedOutput const&) = delete;
+    CapturedOutput& operator=(CapturedOutput const&) = delete;
+    ~CapturedOutput() { stream_.rdbuf(saved_); }
+
+    std::string text() {
+        stream_.rdbuf(saved_);
+        return all_.str();
+    }
+
+private:
+    std::ostringstream all_;
+    std::ostream& stream_;
+    std::streambuf* saved_;
+};
+
+#else
 
 class CapturedOutput {
 public:
@@ -49,5 +73,7 @@ private:
     int saved_;
     std::unique_ptr<std::FILE, int (*)(std::FILE*)> file_{std::tmpfile(), &std::fclose};
 };
+
+#endif
 
 }  // namespace test_support

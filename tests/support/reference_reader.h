@@ -27,7 +27,7 @@ public:
                 auto const start = at_;
                 auto const length = u32();
                 skip(length);
-                auto const name = data_.substr(start + 4, length);
+                auto const name = data_.substr(start + 4, static_cast<std::size_t>(length));
                 auto const code = u32();
                 if (code > 6) continue;
                 skipValue(code);

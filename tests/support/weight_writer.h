@@ -180,7 +180,7 @@ WeightWriter frontOf(Shape const& shape, std::string_view version) {
 // A `matrixGain` of 0 makes every product 0; `outputBias` is what the output layer adds.
 inline std::string ncWeight(NcShape const& shape, float matrixGain, float outputBias) {
     auto suffix = "_v" + shape.version;
-    std::ranges::replace(suffix, '.', '_');
+    std::replace(suffix.begin(), suffix.end(), '.', '_');
     int const h = shape.hidden;
     int const inputs = shape.inputs();
     int const k = shape.compressedBands();

@@ -2,8 +2,8 @@
 
 #include <gtest/gtest.h>
 
-#include <bit>
 #include <cmath>
+#include <cstring>
 #include <limits>
 #include <vector>
 
@@ -23,9 +23,13 @@ Samples anyFloats() {
     Samples values{nan,    -nan,     infinity, -infinity, 0.0f,      -0.0f,
                    1e-42f, 32767.0f, 32768.0f, -32768.0f, -32769.0f, 1.0f,
                    -1.0f,  12.9f,    -12.9f,   32767.5f,  3e38f};
+    std::vector<std::uint32_t> patterns;
     for (int i = 0; i < 1000; ++i)
-        values.push_back(std::bit_cast<float>(static_cast<std::uint32_t>(
-            random.between(0, std::numeric_limits<std::uint32_t>::max()))));
+        patterns.push_back(static_cast<std::uint32_t>(
+            random.between(0, std::numeric_limits<std::uint32_t>::max())));
+    values.resize(values.size() + patterns.size());
+    std::memcpy(values.data() + values.size() - patterns.size(), patterns.data(),
+                4 * patterns.size());
     for (float const value : random.normal(1000, 20000.0f)) values.push_back(value);
     return values;
 }
@@ -59,7 +63,7 @@ TEST(Pcm, TakesAnyFloat) {
     for (std::size_t i = 0; i < in.size(); ++i) {
         SCOPED_TRACE(in[i]);
         float const finite = std::isfinite(in[i]) ? clipped(in[i], -1e6f, 1e6f) : 0.0f;
-        ASSERT_EQ(scaled[i], finite * 32768.0f);
+        ASSERT_EQ(scaled[i], std::abs(finite) < 1e-20f ? 0.0f : finite * 32768.0f);
         float const pcm = clipped(in[i], -32768.0f, 32767.0f);
         ASSERT_EQ(limited[i], pcm);
         ASSERT_EQ(shorts[i], static_cast<short>(pcm));
@@ -67,6 +71,7 @@ TEST(Pcm, TakesAnyFloat) {
 }
 
 TEST(FloatControl, HoldsForItsScopeOnly) {
+    if (kFlushDenormals == 0) GTEST_SKIP() << "one mode only";
     float volatile tiny = 1e-39f;
     auto const denormalSurvives = [&] { return tiny * 1.0f != 0.0f; };
     auto const before = floatControl();

@@ -10,6 +10,7 @@
 #include <sstream>
 
 #include "support/allocation_counter.h"
+#include "support/captured_output.h"
 #include "support/reference_reader.h"
 #include "support/temp_dir.h"
 #include "support/weight_writer.h"
@@ -20,8 +21,6 @@ namespace {
 
 using namespace MORVA;
 using namespace test_support;
-using testing::internal::CaptureStdout;
-using testing::internal::GetCapturedStdout;
 using WEIGHTS::Weight;
 
 std::shared_ptr<Weight> fromBlob(std::string const& bytes) {
@@ -34,12 +33,12 @@ std::shared_ptr<Weight> fromBlob(std::string const& bytes) {
 // cost millions.
 void expectModestAndEqualToReference(std::string const& bytes) {
     Weight weight;
-    CaptureStdout();
+    CapturedOutput said(1);
     bool result = false;
     auto const sizes =
         measureAllocations([&] { result = weight.read(bytes.data(), bytes.size()); });
     auto const expected = ReferenceReader(bytes).read();
-    EXPECT_EQ(GetCapturedStdout(), expected.empty() ? "Warning Nothing added from weight\n" : "");
+    EXPECT_EQ(said.text(), expected.empty() ? "Warning Nothing added from weight\n" : "");
     EXPECT_TRUE(result);
     EXPECT_LE(sizes.largest, 10 * bytes.size() + 1024);
     EXPECT_LE(sizes.total, 100 * bytes.size() + 4096);
@@ -72,9 +71,9 @@ TEST(Weight, CutAtEveryByteKeepsTheWholeRecordsBeforeTheCut) {
         auto const cut = bytes.substr(0, size);
         expectModestAndEqualToReference(cut);
         Weight weight;
-        CaptureStdout();
+        CapturedOutput said(1);
         EXPECT_TRUE(weight.read(UTILS::Path(dir.write("cut.mvw", cut).wstring().c_str())));
-        GetCapturedStdout();
+        said.text();
         EXPECT_EQ(writeBack(weight.values()), ReferenceReader(cut).read());
         if (testing::Test::HasFailure()) return;
     }
@@ -101,9 +100,9 @@ TEST(Weight, SourcesWithoutARecord) {
                                          {dir.path().wstring() + L"/missing.mvw", false},
                                          {dir.path().wstring(), false}}) {
         Weight weight;
-        CaptureStdout();
+        CapturedOutput said(1);
         EXPECT_EQ(weight.read(UTILS::Path(path.c_str())), readable);
-        EXPECT_EQ(GetCapturedStdout(), readable ? "Warning Nothing added from weight\n" : "");
+        EXPECT_EQ(said.text(), readable ? "Warning Nothing added from weight\n" : "");
         EXPECT_TRUE(weight.values().empty());
         EXPECT_EQ(weight.message(), readable ? "" : "Corrupted weight file!");
     }
@@ -111,9 +110,9 @@ TEST(Weight, SourcesWithoutARecord) {
 
 // "none" for a refusal.
 std::string identify(WeightWriter const& writer) {
-    CaptureStdout();
+    CapturedOutput said(1);
     auto const identifier = WEIGHTS::ModelRegistry::mvwUniqueIdGenerator(fromBlob(writer.bytes()));
-    auto const printed = GetCapturedStdout();
+    auto const printed = said.text();
     return printed == "ERROR INVALID WEIGHT\n" && identifier.empty() ? "none"
                                                                      : printed + identifier;
 }

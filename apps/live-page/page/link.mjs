@@ -7,7 +7,7 @@ const MAX_AHEAD_SECONDS = 8;
 
 /**
  * Events, all with a `detail`: `hello` (models, sampleRates, maxSeconds, example), `started` (latency),
- * `model` (name), `result` (samples, voice, noise), `done`, `lost` (a sentence for people).
+ * `progress` (share of what is loaded before the hello), `model` (name), `result` (samples, voice, noise), `done`, `lost` (a sentence for people).
  *
  * A kind of link implements `connect()`, `isOpen` and `post(message)`, and calls `receive` and `lose`.
  */

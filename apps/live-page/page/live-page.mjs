@@ -237,6 +237,10 @@ function listen() {
     enter(state);
   });
 
+  link.addEventListener('progress', ({ detail }) => {
+    if (engine === null) say(`Loading models … ${Math.floor(100 * detail.share)} %`);
+  });
+
   link.addEventListener('started', ({ detail }) => {
     showModels();
     element('latency').textContent = `${((1000 * detail.latency) / take.rate).toFixed(1)} ms`;

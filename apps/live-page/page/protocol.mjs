@@ -5,7 +5,8 @@
 //   page -> engine   start { stream, sampleRate, model }   a new sound; replaces the one that runs
 //                    model { name }                        another model from the next frame on
 //                    stop                                  no more sound; the tail comes back
-//   engine -> page   hello { models, sampleRates, maxSeconds, example }
+//   engine -> page   progress { share }                    of what must be loaded before the hello
+//                    hello { models, sampleRates, maxSeconds, example }
 //                    models: { name, rate } each; example: address of a recording, or null
 //                    started { stream, latency }           delay in samples that is taken out
 //                    model { stream, name }                the new model is in use

@@ -1,6 +1,7 @@
 #include "kernels/elementary.h"
 
 #include <algorithm>
+#include <cmath>
 
 #include "kernels/vector_layer.h"
 // After the layer's settings:
@@ -36,10 +37,16 @@ void transform(std::span<T> values, Function function) {
 void exponentials(std::span<double> values) {
     // Within what the layer's function takes, and short of denormals.
     constexpr double kLimit = 700.0;
+#if !HWY_HAVE_FLOAT64  // WebAssembly: the layer has no registers of doubles
+    for (double& value : values) {
+        if (!std::isnan(value)) value = std::exp(std::clamp(value, -kLimit, kLimit));
+    }
+#else
     transform(values, [](auto tag, auto x) HWY_ATTR {
         auto const limited = hn::Min(hn::Max(x, hn::Set(tag, -kLimit)), hn::Set(tag, kLimit));
         return hn::Exp(tag, limited);
     });
+#endif
 }
 
 void logarithms(std::span<float> values) {
