@@ -41,7 +41,7 @@ TEST(Path, NormalizesLikeTheStandardLibrary) {
 TEST(Path, PutsAFrontBeforeRelativePathsAndFindsTheExtension) {
     using Row = std::array<wchar_t const*, 4>;
     auto const here = [](std::wstring text) {  // joined by the system's separator
-        std::ranges::replace(text, L'|', Path::separator_.front());
+        std::replace(text.begin(), text.end(), L'|', Path::separator_.front());
         return text;
     };
     for (auto const& [text, front, wanted, extension] :
