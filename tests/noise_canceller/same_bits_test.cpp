@@ -54,7 +54,7 @@ constexpr Row kRows[] = {
     {"NC_small_8k", Kind::cleaned, 44100, 24, {0x2244cdef664f6a5b, 0x4bf729218e298f14}},
     {"NC_small_16k", Kind::cleaned, 16000, 24, {0x29ab39b542b562c0, 0xba68acb2fc711311}},
     {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xef25d1da53ebb0b8, 0xe452eb32b1885647}},
-    {"VAD_weight", Kind::voice, 48000, 6, {0x1b60c347cdcfa61d, 0xa2ad078a32d630d1}},
+    {"VAD_weight", Kind::voice, 48000, 6, {0x7b28db1de01a0189, 0x9884995e3fc1127c}},
     {"noise_level_16k", Kind::level, 44100, 24, {0xd588628ba5057216, 0x202828774a0b42bc}},
 };
 // clang-format on
