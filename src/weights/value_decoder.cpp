@@ -2,9 +2,12 @@
 
 #include <array>
 #include <cstdint>
+#include <sstream>
+#include <type_traits>
 #include <utility>
 #include <vector>
 
+#include "weights/halves.h"
 #include "weights/serializers.h"
 #include "weights/value_types.h"
 
@@ -58,11 +61,25 @@ void decode(BoundedReader& reader, std::vector<Element>& value) {
     }
 }
 
+// What is damaged inside is a cut record of that name and no end of the data around it.
+void decodeHalves(std::string const& name, std::string const& halves, AnyMap& values) {
+    std::istringstream stream(withWholeFloats(halves));
+    BoundedReader reader(stream);
+    int code = 0;
+    if (reader.readNumber(code) && code > 2) decodeValue(reader, code, name, values);
+}
+
 template <class T>
 bool decodeAs(BoundedReader& reader, std::string const& name, AnyMap& values) {
     T value{};
     decode(reader, value);
     if (!reader.good()) return false;
+    if constexpr (std::is_same_v<T, std::string>) {
+        if (name.starts_with(HALF_PREFIX)) {
+            decodeHalves(name.substr(HALF_PREFIX.size()), value, values);
+            return true;
+        }
+    }
     values.insert<T>(name, std::move(value), InsertMode::keep);
     return true;
 }

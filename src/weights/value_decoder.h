@@ -1,4 +1,5 @@
-// Decodes one typed value of the weight format into a map. See weight.h for the encodings.
+// Decodes one typed value of the weight format into a map. See weight.h and halves.h for the
+// encodings.
 #pragma once
 
 #include <string>

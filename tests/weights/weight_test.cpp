@@ -92,6 +92,27 @@ TEST(Weight, HugeAndNegativeCountsAreCutRecords) {
     }
 }
 
+// 1, -2, the smallest and the largest half; every cut inside the string drops that value alone.
+TEST(Weight, HalvesAreTheSameValuesInHalfTheRoom) {
+    std::vector const floats{1.0F, -2.0F, 0x1p-24F, -0x1p-24F, 65504.0F, 0.0F};
+    std::string const halves("\x00\x3c\x00\xc0\x01\x00\x01\x80\xff\x7b\x00\x00", 12);
+    auto const whole = WeightWriter().number(6).number(1).number(2).number(3).raw(halves).bytes();
+    auto const holding = [](std::string const& inside) {
+        WeightWriter writer;
+        return fromBlob(writer.add("half:W", inside).add("after", 1).bytes());
+    };
+    WeightWriter plain;
+    plain.add("W", WeightWriter::Matrices{{floats, 2, 3}}).add("after", 1);
+    EXPECT_EQ(writeBack(holding(whole)->values()), ReferenceReader(plain.bytes()).read());
+    auto const nested = WeightWriter().number(2).number(3).raw("abc").bytes();
+    auto damaged = std::vector{nested};
+    for (std::size_t size = 0; size < whole.size(); ++size)
+        damaged.push_back(whole.substr(0, size));
+    for (auto const& inside : damaged) {
+        EXPECT_EQ(writeBack(holding(inside)->values()).size(), 1U) << inside.size();
+    }
+}
+
 TEST(Weight, SourcesWithoutARecord) {
     TempDir const dir;
     auto const empty = dir.write("empty.mvw", "").wstring();

@@ -25,9 +25,11 @@ from morva_training.voice import stream_features
 
 def test_every_cut_is_noticed_or_lies_between_records() -> None:
     m = np.arange(6, dtype=np.float32).reshape(2, 3)
-    weight = {"f": 0.5, "i": -7, "b": b"text", "v": m[0], "m": m, "vs": [m[0], m[1, :0]], "ms": [m, m.T, m[:, :0]]}
+    weight = {"f": 0.5, "i": -7, "b": b"b", "v": m[0] / 3, "m": m, "vs": [m[0], m[1, :0]], "ms": [m, m.T, m[:, :0]]}
     data = mvw.encode(weight)
     assert repr(mvw.decode(data + mvw.encode({"i": 9}))) == repr(weight), "of two equal names the first counts"
+    halved = mvw.halved(weight)
+    assert set(weight) - set(halved) == {"m", "vs", "ms"} and repr(mvw.decode(mvw.encode(halved))) == repr(weight)
     between = {len(mvw.encode(dict(list(weight.items())[:n]))) for n in range(len(weight))}
     for cut in range(len(data)):
         if cut in between:
