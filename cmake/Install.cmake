@@ -1,14 +1,17 @@
-# What `cmake --install` puts where, the CMake package, the pkg-config file and the Debian package.
+# What `cmake --install` puts where, the CMake package, the pkg-config file and the Debian package. The component
+# `engine` is what a host takes into a package of its own: library, models, licences.
 include(CMakePackageConfigHelpers)
 
 set(MORVA_INSTALL_MODELS ${CMAKE_INSTALL_DATADIR}/morva/models)
 set(package_dir ${CMAKE_INSTALL_LIBDIR}/cmake/morva)
 
-install(TARGETS morva EXPORT morvaTargets LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR})
+install(TARGETS morva EXPORT morvaTargets
+        LIBRARY DESTINATION ${CMAKE_INSTALL_LIBDIR} COMPONENT engine
+        RUNTIME DESTINATION ${CMAKE_INSTALL_BINDIR} COMPONENT engine)
 install(FILES src/morva-sdk/morva-sdk.h src/morva-sdk/morva-ext.h
         DESTINATION ${CMAKE_INSTALL_INCLUDEDIR}/morva)
-install(DIRECTORY models/ DESTINATION ${MORVA_INSTALL_MODELS}
-        FILES_MATCHING PATTERN "*.mvw" PATTERN "*.md")
+install(DIRECTORY models/ DESTINATION ${MORVA_INSTALL_MODELS} COMPONENT engine
+        FILES_MATCHING PATTERN "*.mvw" PATTERN "*.md" PATTERN "*.json")
 
 install(EXPORT morvaTargets NAMESPACE morva:: DESTINATION ${package_dir})
 configure_package_config_file(cmake/morvaConfig.cmake.in ${PROJECT_BINARY_DIR}/morvaConfig.cmake
@@ -26,12 +29,16 @@ install(FILES ${PROJECT_BINARY_DIR}/morva.pc DESTINATION ${CMAKE_INSTALL_LIBDIR}
 install(FILES packaging/morva.1 DESTINATION ${CMAKE_INSTALL_MANDIR}/man1)
 install(FILES packaging/morva.bash RENAME morva
         DESTINATION ${CMAKE_INSTALL_DATADIR}/bash-completion/completions)
-install(FILES LICENSE CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+install(FILES CHANGELOG.md DESTINATION ${CMAKE_INSTALL_DOCDIR})
+install(FILES LICENSE DESTINATION ${CMAKE_INSTALL_DOCDIR} COMPONENT engine)
 # What is compiled or linked in comes with its licence.
-foreach(part Highway oneMKL ${MORVA_LINKED_PARTS})
-    if(MORVA_LICENSE_${part})
-        install(FILES ${MORVA_LICENSE_${part}} RENAME LICENSE.${part}.txt DESTINATION ${CMAKE_INSTALL_DOCDIR})
-    endif()
+foreach(component engine command)
+    foreach(part ${MORVA_${component}_PARTS})
+        if(MORVA_LICENSE_${part})
+            install(FILES ${MORVA_LICENSE_${part}} RENAME LICENSE.${part}.txt DESTINATION ${CMAKE_INSTALL_DOCDIR}
+                    COMPONENT ${component})
+        endif()
+    endforeach()
 endforeach()
 
 set(CPACK_PACKAGE_NAME morva)

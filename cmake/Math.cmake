@@ -12,6 +12,9 @@ if(NOT MORVA_MATH MATCHES "^(mkl|portable)$")
     message(FATAL_ERROR "MORVA_MATH is neither mkl nor portable: ${MORVA_MATH}")
 endif()
 
+# What engine products hold of others; MORVA_LICENSE_<part> names the text that goes along with it.
+set(MORVA_engine_PARTS Highway oneMKL LLVM MinGW)
+
 # Headers only: what the kernels use of Highway needs no library at run time.
 find_path(MORVA_HIGHWAY_INCLUDE hwy/highway.h REQUIRED)
 add_library(morva_vectors INTERFACE)

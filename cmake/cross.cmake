@@ -29,10 +29,9 @@ set(MORVA_LICENSE_CLI11 /usr/share/doc/libcli11-dev/copyright)
 set(MORVA_LICENSE_JSON /usr/share/doc/nlohmann-json3-dev/copyright)
 set(MORVA_LICENSE_libsndfile ${deps}/cross/sources/libsndfile/COPYING)
 set(MORVA_LICENSE_libsamplerate ${deps}/cross/sources/libsamplerate/COPYING)
-set(MORVA_LINKED_PARTS LLVM CLI11 JSON libsndfile libsamplerate)
+set(MORVA_command_PARTS CLI11 JSON libsndfile libsamplerate)
 if(CMAKE_SYSTEM_NAME STREQUAL Windows)
     set(MORVA_LICENSE_MinGW ${deps}/zig/ziglang/lib/libc/mingw/COPYING)
-    list(APPEND MORVA_LINKED_PARTS MinGW)
 endif()
 
 # CMake wants each tool as one file; ccache judges them by their names.

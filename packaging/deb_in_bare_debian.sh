@@ -1,7 +1,7 @@
 #!/usr/bin/env bash
 # usage: deb_in_bare_debian.sh PACKAGE.deb SOURCE_DIR [MIRROR] - installs the package in a fresh minimal Debian
 # folder, uses it there and removes it. Needs root, debootstrap and a Debian mirror; some minutes.
-# Run by hand; the package comes from `cpack` in a build folder.
+# Run by hand; the package comes from scripts/package deb.
 set -euo pipefail
 package=$1 source=$2 mirror=${3:-}
 bare=$(mktemp -d)

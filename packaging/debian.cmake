@@ -6,10 +6,9 @@ set(usr ${CPACK_TEMPORARY_DIRECTORY}/usr)
 set(doc ${usr}/share/doc/morva)
 
 # ---- copyright, changelog, manual page -----------------------------------------------------------
-file(READ ${doc}/LICENSE.oneMKL.txt mkl_licence)
-string(REGEX REPLACE "\n\n+" "\n.\n" mkl_licence "${mkl_licence}")
-string(REGEX REPLACE "[ \t]*\n" "\n " mkl_licence "${mkl_licence}")
-string(STRIP "${mkl_licence}" mkl_licence)
+if(EXISTS ${doc}/LICENSE.oneMKL.txt)
+    message(FATAL_ERROR "Six libraries of 22 MB: package a build with MORVA_MATH=portable (scripts/package deb)")
+endif()
 file(WRITE ${doc}/copyright "Format: https://www.debian.org/doc/packaging-manuals/copyright-format/1.0/
 Upstream-Name: morva
 
@@ -19,10 +18,9 @@ License: Apache-2.0
  On Debian systems the text of this licence is in /usr/share/common-licenses/Apache-2.0.
 Comment:
  The models in /usr/share/morva/models were trained on the recordings that ATTRIBUTIONS.md there names.
- The libraries contain parts of Intel oneAPI Math Kernel Library:
- Copyright Intel Corporation, ${mkl_licence}
+ The libraries contain parts of Highway under the same licence: Copyright 2019-2022 Google LLC.
 ")
-file(REMOVE ${doc}/LICENSE ${doc}/LICENSE.oneMKL.txt)
+file(REMOVE ${doc}/LICENSE)
 
 string(TIMESTAMP date "%a, %d %b %Y %H:%M:%S +0000" UTC)
 file(WRITE ${doc}/changelog "morva (${CPACK_PACKAGE_VERSION}) unstable; urgency=medium

@@ -1,12 +1,14 @@
 """Puts the engine library, the models and the licences into the package.
 
-The library is taken from MORVA_LIBRARY, else from ../build/release, else built there. It is loaded at
-run time and links to no Python, so one wheel serves every Python version.
+They are taken from the install tree MORVA_STAGE, else from one of ../build/release, which is built if need be.
+The library is loaded at run time and links to no Python, so one wheel serves every Python version; the tag of its
+platform is MORVA_WHEEL_PLATFORM, else that of this machine.
 """
 
 import os
 import shutil
 import subprocess
+import tempfile
 from pathlib import Path
 
 from setuptools import Distribution, setup
@@ -16,27 +18,18 @@ from wheel.bdist_wheel import bdist_wheel
 ROOT = Path(__file__).resolve().parent.parent
 
 
-def engine_library() -> Path:
-    chosen = os.environ.get("MORVA_LIBRARY")
-    if chosen:
-        return Path(chosen)
-    library = ROOT / "build/release/libmorva.so"
-    if not library.exists():
-        subprocess.run(["cmake", "--preset", "release"], cwd=ROOT, check=True)
-        subprocess.run(
-            ["cmake", "--build", "--preset", "release", "--target", "morva"],
-            cwd=ROOT,
-            check=True,
-        )
-    return library
+def cmake(*arguments):
+    subprocess.run(["cmake", *arguments], cwd=ROOT, check=True)
 
 
-def math_library_licence() -> Path | None:
-    """The engine carries the math library, whose licence asks for its text to go along."""
-    roots = [Path(os.environ["MKLROOT"])] if "MKLROOT" in os.environ else []
-    folders = [*roots, *(root / "licensing" for root in roots), ROOT / ".deps/mkl"]
-    found = (folder / name for folder in folders for name in ("LICENSE.txt", "license.txt"))
-    return next(filter(Path.exists, found), None)
+def install_tree(folder: str) -> Path:
+    if "MORVA_STAGE" in os.environ:
+        return Path(os.environ["MORVA_STAGE"])
+    if not (ROOT / "build/release/libmorva.so").exists():
+        cmake("--preset", "release")
+        cmake("--build", "--preset", "release", "--target", "morva")
+    cmake("--install", "build/release", "--component", "engine", "--prefix", folder)
+    return Path(folder)
 
 
 class BuildWithEngine(build_py):
@@ -44,20 +37,17 @@ class BuildWithEngine(build_py):
         super().run()
         bundled = Path(self.build_lib) / "morva/_bundled"
         shutil.rmtree(bundled, ignore_errors=True)
-        (bundled / "models").mkdir(parents=True)
-        shutil.copyfile(engine_library(), bundled / "libmorva.so")
-        licences = bundled / "licenses"
-        licences.mkdir()
-        shutil.copyfile(ROOT / "LICENSE", licences / "LICENSE")
-        if (mkl := math_library_licence()) is not None:
-            shutil.copyfile(mkl, licences / "LICENSE.onemkl")
-        for model in (ROOT / "models").iterdir():
-            if model.suffix in (".mvw", ".md", ".json"):
-                shutil.copyfile(model, bundled / "models" / model.name)
+        with tempfile.TemporaryDirectory() as folder:
+            tree = install_tree(folder)
+            shutil.copytree(tree / "share/morva/models", bundled / "models")
+            shutil.copytree(tree / "share/doc/morva", bundled / "licenses", ignore=shutil.ignore_patterns("CHANGELOG*"))
+            library = next(file for kind in ("so", "dylib", "dll") for file in tree.glob(f"*/libmorva.{kind}"))
+            shutil.copyfile(library, bundled / library.name)
 
 
 class PlatformWheel(bdist_wheel):
     def finalize_options(self):
+        self.plat_name = self.plat_name or os.environ.get("MORVA_WHEEL_PLATFORM")
         super().finalize_options()
         self.root_is_pure = False
 

@@ -6,20 +6,28 @@ const fs = require('node:fs');
 const path = require('node:path');
 const { ValtoError } = require('./errors.cjs');
 
-const FILE = 'quorral_valto.node';
 const target = `${process.platform}-${process.arch}`;
+const root = path.join(__dirname, '..');
+const prebuilds = path.join(root, 'prebuilds');
 
 // An archive cannot be mapped by the system's loader; packagers put such files beside the archive.
 const outsideArchive = (file) => file.replace(/\.asar(?=[\\/])/g, '.asar.unpacked');
 
 function candidates() {
-  const root = path.join(__dirname, '..');
   // Inside an archive it is not looked for: Electron would load a copy, far from the weight files.
-  const packaged = outsideArchive(path.join(root, 'prebuilds', target, FILE));
+  const packaged = outsideArchive(path.join(prebuilds, `quorral_valto.${target}.node`));
   // Only a checkout of this project has the build's own file; elsewhere "../../build" is the host
   // application's.
   if (!fs.existsSync(path.join(root, 'CMakeLists.txt'))) return [packaged];
-  return [packaged, path.join(root, '../../build/release/quorral_valto', FILE)];
+  const built = (folder) =>
+    path.join(root, '../../build', folder, 'quorral_valto/quorral_valto.node');
+  return [packaged, built('release'), built(target)];
+}
+
+function prebuiltTargets() {
+  const folder = outsideArchive(prebuilds);
+  const files = fs.existsSync(folder) ? fs.readdirSync(folder) : [];
+  return files.flatMap((file) => file.match(/^quorral_valto\.(.*)\.node$/)?.[1] ?? []);
 }
 
 function isMusl() {
@@ -27,7 +35,10 @@ function isMusl() {
 }
 
 function remedy() {
-  if (target !== 'linux-x64') return 'Only linux-x64 has a prebuilt binary.';
+  const targets = prebuiltTargets();
+  if (targets.length && !targets.includes(target)) {
+    return `This package has binaries for ${targets.join(', ')} only.`;
+  }
   if (isMusl()) return 'The binary needs glibc; this system runs another C library (musl?).';
   return (
     'Reinstall the package. When the application is packed into an archive, keep the folder ' +

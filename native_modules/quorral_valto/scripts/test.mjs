@@ -40,13 +40,12 @@ const run = (command, args, options = {}) =>
   execFileSync(command, args, { cwd: root, stdio: 'inherit', ...options });
 
 function pack(folder) {
-  const env = { ...process.env, QUORRAL_VALTO_BUILD: path.join(build, 'quorral_valto') };
-  run('npm', ['pack', '--silent', '--pack-destination', folder], {
-    env,
-    stdio: ['ignore', 'ignore', 'inherit'],
-  });
-  const name = readdirSync(folder).find((file) => file.endsWith('.tgz'));
-  return path.join(folder, name);
+  const target = `${process.platform}-${process.arch}`;
+  run(path.join(repository, 'scripts/package'), ['npm', `${target}=${build}`, '--out', folder]);
+  return path.join(
+    folder,
+    readdirSync(folder).find((file) => file.endsWith('.tgz')),
+  );
 }
 
 function install(tarball, folder) {

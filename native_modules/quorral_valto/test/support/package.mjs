@@ -14,9 +14,12 @@ export const packageDir = fileURLToPath(new URL('../..', import.meta.url));
 export const repository = path.join(packageDir, '../..');
 
 const build = path.join(repository, 'build/release');
-const packaged = path.join(packageDir, 'prebuilds/linux-x64');
-export const binaryDir = fs.existsSync(packaged) ? packaged : path.join(build, 'quorral_valto');
-export const binaryFile = path.join(binaryDir, 'quorral_valto.node');
+const target = `${process.platform}-${process.arch}`;
+export const packagedFile = path.join('prebuilds', `quorral_valto.${target}.node`);
+const packaged = path.join(packageDir, packagedFile);
+const built = path.join(build, 'quorral_valto/quorral_valto.node');
+export const binaryFile = fs.existsSync(packaged) ? packaged : built;
+const binaryDir = path.dirname(binaryFile);
 const addons = process.env.QUORRAL_VALTO_TEST_ADDONS ?? path.join(build, 'test_addons');
 export const probePath = path.join(addons, 'probe.node');
 
@@ -41,13 +44,11 @@ export function copyPackage(t, name = 'copy') {
   for (const entry of ['package.json', 'index.cjs', 'index.mjs', 'lib']) {
     fs.cpSync(path.join(packageDir, entry), path.join(folder, entry), { recursive: true });
   }
-  const target = path.join(folder, 'prebuilds/linux-x64');
-  fs.mkdirSync(target, { recursive: true });
-  for (const file of fs.readdirSync(binaryDir)) {
-    const [from, to] = [binaryDir, target].map((each) => path.join(each, file));
-    if (WEIGHTS.includes(file)) fs.symlinkSync(from, to);
-    else fs.cpSync(from, to);
-  }
+  const prebuilds = path.join(folder, 'prebuilds');
+  fs.mkdirSync(prebuilds);
+  fs.cpSync(binaryFile, path.join(folder, packagedFile));
+  for (const file of WEIGHTS)
+    fs.symlinkSync(path.join(binaryDir, file), path.join(prebuilds, file));
   return folder;
 }
 
