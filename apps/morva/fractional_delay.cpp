@@ -16,8 +16,19 @@ double sinc(double x) {
     return std::abs(x) < negligible ? 1.0 : std::sin(std::numbers::pi * x) / (std::numbers::pi * x);
 }
 
+// Not every C++ library has std::cyl_bessel_i.
+double besselI0(double x) {
+    double sum = 1.0;
+    double term = 1.0;
+    for (int k = 1; term > 1e-15 * sum; ++k) {
+        term *= x * x / (4.0 * k * k);
+        sum += term;
+    }
+    return sum;
+}
+
 double kaiser(double x) {  // -1..1
-    return std::cyl_bessel_i(0.0, beta * std::sqrt(std::max(0.0, 1.0 - x * x)));
+    return besselI0(beta * std::sqrt(std::max(0.0, 1.0 - x * x)));
 }
 
 // Delay by reach - fraction.
