@@ -26,13 +26,14 @@ TEST(Path, NormalizesLikeTheStandardLibrary) {
             text += parts[random.between(0, std::size(parts) - 1)];
         }
         text += main + (random.chance(0.5) ? L"f" : L"..");
-        Path path(text.c_str());
-        ASSERT_TRUE(path.normalize());
         Path relative((L"r" + text).c_str());
         ASSERT_FALSE(relative.normalize());
         ASSERT_EQ(relative.str(), L"r" + text);
-        text.erase(0, text.find_first_not_of(main) - 1);  // a doubled root means something there
-        ASSERT_EQ(path.str(), std::filesystem::path(text).lexically_normal().wstring())
+        // A doubled root means something to the standard library, and to both on Windows.
+        auto const single = text.substr(text.find_first_not_of(main) - 1);
+        Path path((main == L"/" ? text : single).c_str());
+        ASSERT_TRUE(path.normalize());
+        ASSERT_EQ(path.str(), std::filesystem::path(single).lexically_normal().wstring())
             << path.convertWString2MBString(text);
     }
     EXPECT_FALSE(Path(L"").normalize());
