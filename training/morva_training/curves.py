@@ -1,6 +1,6 @@
 """Draws how runs went: what their logs say of the validation part, over time.
 
-    python -m morva_training.curves runs/dense runs/shared --out curves.png --figures loss ratio_db lost_db
+python -m morva_training.curves runs/dense runs/shared --out curves.png --figures loss ratio_db lost_db
 """
 
 from __future__ import annotations
