@@ -16,8 +16,13 @@ double sinc(double x) {
     return std::abs(x) < negligible ? 1.0 : std::sin(std::numbers::pi * x) / (std::numbers::pi * x);
 }
 
-double kaiser(double x) {  // -1..1
-    return std::cyl_bessel_i(0.0, beta * std::sqrt(std::max(0.0, 1.0 - x * x)));
+// For -1..1. The Bessel function that it is made of, as a series: not every C++ library has it.
+double kaiser(double x) {
+    double const square = beta * beta * std::max(0.0, 1.0 - x * x) / 4.0;
+    double sum = 1.0;
+    double term = 1.0;
+    for (int k = 1; term > 1e-17 * sum; ++k) sum += term *= square / (k * k);
+    return sum;
 }
 
 // Delay by reach - fraction.
