@@ -1,9 +1,9 @@
 #include "weights/halves.h"
 
-#include <bit>
 #include <cstdint>
 #include <cstring>
 #include <sstream>
+#include <utility>
 
 #include "weights/bounded_reader.h"
 
@@ -14,7 +14,10 @@ namespace {
 // The exponent of a half counts from 15, that of a float from 127; the product is exact, that of
 // numbers without a leading one included.
 float widened(std::uint16_t half) {
-    auto const magnitude = std::bit_cast<float>((half & 0x7fffU) << 13U) * 0x1p112F;
+    std::uint32_t const bits = (half & 0x7fffU) << 13U;
+    float magnitude = 0.0F;
+    std::memcpy(&magnitude, &bits, sizeof magnitude);
+    magnitude *= 0x1p112F;
     return (half & 0x8000U) != 0 ? -magnitude : magnitude;
 }
 
