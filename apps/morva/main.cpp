@@ -44,6 +44,7 @@ int run(int argc, char** argv) {
         "Real-time voice processing on sound files: noise suppression, voice activity, noise level",
         "morva"};
     app.require_subcommand(1);
+    app.allow_windows_style_options(false);  // "/" begins a path everywhere
     app.set_version_flag("--version", MORVA_VERSION);
     Action action;
     addDenoise(app, action);
