@@ -16,6 +16,7 @@ from setuptools.command.build_py import build_py
 from wheel.bdist_wheel import bdist_wheel
 
 ROOT = Path(__file__).resolve().parent.parent
+LIBRARIES = ("lib/libmorva.so", "lib/libmorva.dylib", "bin/morva.dll")
 
 
 def cmake(*arguments):
@@ -41,7 +42,7 @@ class BuildWithEngine(build_py):
             tree = install_tree(folder)
             shutil.copytree(tree / "share/morva/models", bundled / "models")
             shutil.copytree(tree / "share/doc/morva", bundled / "licenses", ignore=shutil.ignore_patterns("CHANGELOG*"))
-            library = next(file for kind in ("so", "dylib", "dll") for file in tree.glob(f"*/libmorva.{kind}"))
+            library = next(file for name in LIBRARIES if (file := tree / name).exists())
             shutil.copyfile(library, bundled / library.name)
 
 

@@ -54,7 +54,7 @@ _FUNCTIONS = {
 @functools.cache
 def library() -> ctypes.CDLL:
     """The library of MORVA_LIBRARY, else the one in this package, else the one built in this source tree."""
-    own = next(_BUNDLED.glob("libmorva.*")) if _INSTALLED else _TREE / "build/release/libmorva.so"
+    own = next(_BUNDLED.glob("*morva.*")) if _INSTALLED else _TREE / "build/release/libmorva.so"
     loaded = ctypes.CDLL(os.environ.get("MORVA_LIBRARY") or str(own))
     for name, (result, arguments) in _FUNCTIONS.items():
         function = getattr(loaded, name)
