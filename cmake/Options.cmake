@@ -26,7 +26,8 @@ target_link_options(morva_options INTERFACE
     $<IF:$<PLATFORM_ID:Darwin>,-Wl$<COMMA>-dead_strip,-Wl$<COMMA>--gc-sections>)
 if(MORVA_SANITIZE)
     target_compile_options(morva_options INTERFACE -fsanitize=${MORVA_SANITIZE} -fno-omit-frame-pointer
-                           -fno-sanitize-recover=all -O1)
+                           -fno-sanitize-recover=all -O1
+                           $<$<CXX_COMPILER_ID:GNU>:-Wno-maybe-uninitialized>)  # false alarms on std::regex in GCC 12
     target_link_options(morva_options INTERFACE -fsanitize=${MORVA_SANITIZE})
 endif()
 if(MORVA_FUZZ)
