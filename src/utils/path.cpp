@@ -2,6 +2,7 @@
 
 #include <filesystem>
 #include <string_view>
+#include <system_error>
 
 #include "utils/utf8.h"
 
@@ -89,7 +90,14 @@ std::wstring Path::convertMBString2WString(std::string const& bytes) const {
 }
 
 bool Path::openIfstream(std::ifstream& stream, std::ios_base::openmode mode) const {
-    return openStream(stream, convertWString2MBString(path_), mode | std::ios_base::in);
+    auto const name = convertWString2MBString(path_);
+    // Not every C++ library tells a folder from an empty file when it is read.
+    std::error_code unknown;
+    if (std::filesystem::is_directory(std::u8string(name.begin(), name.end()), unknown)) {
+        stream.setstate(std::ios_base::failbit);
+        return false;
+    }
+    return openStream(stream, name, mode | std::ios_base::in);
 }
 
 bool Path::openOfstream(std::ofstream& stream, std::ios_base::openmode mode) const {

@@ -36,8 +36,8 @@ public:
     std::string convertWString2MBString(std::wstring const& wide) const;
     std::wstring convertMBString2WString(std::string const& bytes) const;
 
-    // Opens the stream with `mode` plus input (output); returns whether it is open, else the
-    // stream's fail flag is set. Throw like the conversions.
+    // Opens the stream with `mode` plus input (output); returns whether it is open (a folder is
+    // not), else the stream's fail flag is set. Throw like the conversions.
     bool openIfstream(std::ifstream& stream, std::ios_base::openmode mode) const;
     bool openOfstream(std::ofstream& stream, std::ios_base::openmode mode) const;
 
