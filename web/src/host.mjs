@@ -2,6 +2,7 @@
 import { MorvaError } from './errors.mjs';
 
 const NO_SUCH_FILE = 8;
+const NO_ENTRY = 44; // both as the module's C library numbers them
 
 /**
  * @param {() => WebAssembly.Memory} memory the module's, once there is one
@@ -38,7 +39,7 @@ export function hostFor(memory, print) {
 
   const refuse = () => NO_SUCH_FILE;
   return {
-    env: { emscripten_notify_memory_growth() {} },
+    env: { emscripten_notify_memory_growth() {}, __syscall_stat64: () => -NO_ENTRY },
     wasi_snapshot_preview1: {
       environ_sizes_get,
       environ_get: () => 0,
