@@ -10,14 +10,16 @@ import { require } from './dependencies.mjs';
 export const recording = fileURLToPath(new URL('../../examples/audio/noisy.flac', import.meta.url));
 const TIMEOUT_MS = 180_000;
 
-/** Path of the browser, or null: $CHROMIUM, else one on the search path. */
-export function findChromium() {
-  if (process.env.CHROMIUM) return process.env.CHROMIUM;
+/** Path of the first of these programs on the search path, or null. */
+export function findProgram(...names) {
   const folders = (process.env.PATH ?? '').split(path.delimiter);
-  const names = ['chromium', 'chromium-browser', 'google-chrome'];
   const files = names.flatMap((name) => folders.map((folder) => path.join(folder, name)));
   return files.find((file) => existsSync(file)) ?? null;
 }
+
+/** Path of the browser, or null: $CHROMIUM, else one on the search path. */
+export const findChromium = () =>
+  process.env.CHROMIUM ?? findProgram('chromium', 'chromium-browser', 'google-chrome');
 
 /** @param {string} folder where the microphone's file may lie */
 export async function openBrowser(folder) {

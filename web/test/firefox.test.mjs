@@ -1,12 +1,17 @@
-// The page and a live node in Firefox, by hand: FIREFOX=/usr/bin/firefox-esr node --test web/test/firefox.test.mjs. It
-// needs a machine on which Firefox has somewhere to play to.
+// The page and a live node in Firefox, which plays only where there is a sound server: one of its own, into nothing.
 import assert from 'node:assert/strict';
+import { spawn } from 'node:child_process';
+import { existsSync, mkdtempSync, rmSync } from 'node:fs';
+import os from 'node:os';
+import path from 'node:path';
 import { test } from 'node:test';
 import puppeteer from 'puppeteer-core';
+import { findProgram } from '../../apps/live-page/browser.mjs';
 import { serveFolder } from '../scripts/serve.mjs';
 
-const executablePath = process.env.FIREFOX;
-const skip = !executablePath && 'FIREFOX names no browser';
+const executablePath = process.env.FIREFOX ?? findProgram('firefox-esr', 'firefox');
+const soundServer = findProgram('pulseaudio');
+const skip = !(executablePath && soundServer) && 'needs Firefox and PulseAudio';
 const TIMEOUT_MS = 180_000;
 
 // A node on a sound that lasts; the fake microphone of this browser is a tone.
@@ -26,6 +31,29 @@ const PLAY = async () => {
   return [Math.min(...scores), Math.max(...scores)];
 };
 
+/** The environment of a program that plays into nothing, once there is one. */
+async function silence(t) {
+  const folder = mkdtempSync(path.join(os.tmpdir(), 'morva-sound-'));
+  const env = { ...process.env, XDG_RUNTIME_DIR: folder };
+  const modules = ['module-null-sink', 'module-native-protocol-unix'].flatMap((name) => [
+    '-L',
+    name,
+  ]);
+  const server = spawn(soundServer, ['-n', '--exit-idle-time=-1', ...modules], {
+    env,
+    stdio: 'ignore',
+  });
+  t.after(() => {
+    server.kill();
+    rmSync(folder, { recursive: true, force: true });
+  });
+  while (!existsSync(path.join(folder, 'pulse/native'))) {
+    assert.equal(server.exitCode, null, 'the sound server ended');
+    await new Promise((resolve) => setTimeout(resolve, 100));
+  }
+  return env;
+}
+
 test('Firefox runs the page and the node', { skip }, async (t) => {
   const server = await serveFolder();
   t.after(() => server.close());
@@ -33,6 +61,7 @@ test('Firefox runs the page and the node', { skip }, async (t) => {
     browser: 'firefox',
     executablePath,
     headless: true,
+    env: await silence(t),
     timeout: TIMEOUT_MS,
     protocolTimeout: TIMEOUT_MS,
     extraPrefsFirefox: { 'media.autoplay.default': 0 },
