@@ -20,14 +20,29 @@ import soundfile
 
 import tree  # noqa: F401
 from metrics import at_rate
+from morva_training import mvw
 
 import morva
 
 Process = Callable[[np.ndarray, int, str], np.ndarray]  # samples, rate, the recording's name
 
 
+_told_apart: dict[tuple, Path] = {}
+
+
+def weight_file(path: Path) -> str:
+    """What the engine is to open. It takes files of one name and minute for one model: of two, the second is refused."""
+    weight = mvw.read(path)
+    identity = tuple(weight.get(key) for key in ("Version", "SampleRate", "FrameLength", "ModelName", "TimeStamp"))
+    other = _told_apart.setdefault(identity, path)
+    if other.read_bytes() != path.read_bytes():
+        raise SystemExit(f"{other} and {path} are one model to the engine: made in the same minute")
+    return str(path.resolve())
+
+
 def from_weight(path: Path) -> Process:
-    return lambda samples, rate, _name: morva.denoise(samples, rate, model=str(path.resolve()))
+    model = weight_file(path)
+    return lambda samples, rate, _name: morva.denoise(samples, rate, model=model)
 
 
 def read(path: Path, rate: int) -> np.ndarray:

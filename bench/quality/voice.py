@@ -40,6 +40,7 @@ import mixtures
 import tree  # noqa: F401
 from morva_training.corpus import UNSEEN, Corpus
 from morva_training.measures import best_f1, block_labels, frame_labels, roc_auc
+from systems import weight_file
 
 import morva
 
@@ -69,9 +70,11 @@ def remembered(scorer: Scorer) -> Scorer:
 
 
 def from_weight(path: Path) -> Scorer:
+    model = weight_file(path)
+
     def scores(samples: np.ndarray, rate: int, blocks: int) -> np.ndarray:
         heard = metrics.at_rate(samples, rate, LABEL_RATE)  # its own rate, as peers get theirs
-        return morva.voice(heard, LABEL_RATE, frame_ms=10 * blocks, model=str(path.resolve()))
+        return morva.voice(heard, LABEL_RATE, frame_ms=10 * blocks, model=model)
 
     return remembered(scores)
 
