@@ -25,7 +25,13 @@ from .spectra import FULL_32K, SMALL_8K, SMALL_16K
 
 LAYOUTS = {"32k": FULL_32K, "16k": SMALL_16K, "8k": SMALL_8K}
 HIDDEN = {"32k": 304, "16k": 208, "8k": 160}
-LEVEL_CHANGES = {"snr_db": (-8.0, 40.0), "hard_share": None, "noise_only_share": 0.15, "synthetic_share": 0.25}
+LEVEL_CHANGES = {
+    "snr_db": (-8.0, 40.0),
+    "hard_share": None,
+    "noise_only_share": 0.15,
+    "synthetic_share": 0.25,
+    "early_only": False,
+}
 TERMS = tuple(vars(LossWeights()))
 
 
