@@ -1,19 +1,19 @@
 # The math library behind src/kernels, as the target morva::math, and the vector layer, morva::vectors.
 #   MORVA_MATH=mkl        oneMKL (x86-64 only; the default there on Linux)
-#   MORVA_MATH=portable   none: transforms, products and functions over the vector layer alone
+#   MORVA_MATH=portable   transforms of DUCC, products and functions over the vector layer
 if(CMAKE_SYSTEM_NAME STREQUAL Linux AND CMAKE_SYSTEM_PROCESSOR STREQUAL x86_64)
     set(math_default mkl)
 else()
     set(math_default portable)
 endif()
-set(MORVA_MATH ${math_default} CACHE STRING "Math library: mkl (oneMKL) or portable (none)")
+set(MORVA_MATH ${math_default} CACHE STRING "Math library: mkl (oneMKL) or portable (DUCC)")
 set_property(CACHE MORVA_MATH PROPERTY STRINGS mkl portable)
 if(NOT MORVA_MATH MATCHES "^(mkl|portable)$")
     message(FATAL_ERROR "MORVA_MATH is neither mkl nor portable: ${MORVA_MATH}")
 endif()
 
 # What engine products hold of others; MORVA_LICENSE_<part> names the text that goes along with it.
-set(MORVA_engine_PARTS Highway oneMKL LLVM MinGW)
+set(MORVA_engine_PARTS Highway DUCC oneMKL LLVM MinGW)
 
 # Headers only: what the kernels use of Highway needs no library at run time.
 find_path(MORVA_HIGHWAY_INCLUDE hwy/highway.h REQUIRED)
@@ -27,6 +27,14 @@ add_library(morva_math INTERFACE)
 add_library(morva::math ALIAS morva_math)
 target_link_libraries(morva_math INTERFACE Threads::Threads)
 if(MORVA_MATH STREQUAL portable)
+    # The sources that scripts/setup puts there.
+    find_path(MORVA_DUCC_INCLUDE ducc0/fft/fft1d_impl.h PATHS ${PROJECT_SOURCE_DIR}/.deps/ducc/src
+              NO_DEFAULT_PATH NO_CMAKE_FIND_ROOT_PATH)
+    if(NOT MORVA_DUCC_INCLUDE)
+        message(FATAL_ERROR "DUCC not found: run ./scripts/setup, or name the folder src of its sources with "
+                            "-DMORVA_DUCC_INCLUDE")
+    endif()
+    find_file(MORVA_LICENSE_DUCC LICENSE.txt PATHS ${MORVA_DUCC_INCLUDE}/.. NO_DEFAULT_PATH NO_CMAKE_FIND_ROOT_PATH)
     return()
 endif()
 

@@ -19,6 +19,8 @@ License: Apache-2.0
 Comment:
  The models in /usr/share/morva/models were trained on the recordings that ATTRIBUTIONS.md there names.
  The libraries contain parts of Highway under the same licence: Copyright 2019-2022 Google LLC.
+ They also contain the Fourier transforms of DUCC, BSD-3-Clause: Copyright 2010-2026 Max-Planck-Society, 2019 Peter
+ Bell. The text of this licence is in /usr/share/doc/morva/LICENSE.DUCC.txt.
 ")
 file(REMOVE ${doc}/LICENSE)
 

@@ -76,7 +76,7 @@ TEST_P(Transform, ComesBackAndDoesNotDependOnAlignment) {
 
 INSTANTIATE_TEST_SUITE_P(Lengths, Transform,
                          testing::Values(1, 2, 3, 16, 160, 240, 256, 320, 441, 480, 512, 640, 960,
-                                         1024));
+                                         1024, 1301));
 
 class Products : public testing::TestWithParam<std::uint64_t> {};
 

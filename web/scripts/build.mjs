@@ -41,6 +41,7 @@ async function layOutPackage() {
     if (!AUDIO_THREAD.includes(name)) cpSync(path.join(web, 'src', name), path.join(dist, name));
   }
   cpSync(path.join(repository, 'LICENSE'), path.join(dist, 'LICENSE'));
+  cpSync(path.join(repository, 'build/wasm/licences'), dist, { recursive: true });
   writeFileSync(path.join(dist, 'models.mjs'), modelList());
   // One file: bundlers copy it as it stands.
   await build({
