@@ -15,6 +15,13 @@ set(CMAKE_POSITION_INDEPENDENT_CODE ON)
 set(CMAKE_CXX_VISIBILITY_PRESET hidden)
 set(CMAKE_C_VISIBILITY_PRESET hidden)
 set(CMAKE_VISIBILITY_INLINES_HIDDEN ON)
+set(origin $ORIGIN)  # a program's own folder, where it looks for libraries
+if(APPLE)
+    set(origin @loader_path)
+    foreach(kind SHARED_LIBRARY_RUNTIME_C SHARED_LIBRARY_RUNTIME_CXX EXECUTABLE_RUNTIME_CXX)
+        set(CMAKE_${kind}_FLAG -Wl,-rpath,)  # CMake knows this where it runs on the system itself
+    endforeach()
+endif()
 
 add_library(morva_options INTERFACE)
 target_compile_options(morva_options INTERFACE
@@ -41,6 +48,11 @@ function(morva_export target map)
     if(CMAKE_SYSTEM_NAME STREQUAL Linux)
         target_link_options(${target} PRIVATE -Wl,--version-script=${map})
         set_target_properties(${target} PROPERTIES LINK_DEPENDS ${map})
+    elseif(APPLE)
+        set(operators ${PROJECT_SOURCE_DIR}/src/utils/allocation_darwin.cpp)
+        target_sources(${target} PRIVATE ${operators})
+        set_source_files_properties(${operators} TARGET_DIRECTORY ${target} PROPERTIES
+            COMPILE_OPTIONS -fvisibility-global-new-delete=force-hidden)
     elseif(WIN32)
         file(READ ${map} patterns)
         string(REPLACE ";" "," patterns "${patterns}")

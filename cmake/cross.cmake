@@ -48,6 +48,9 @@ set(CMAKE_CXX_COMPILER ${tools}/clang++)
 set(CMAKE_RC_COMPILER ${tools}/rc)
 set(CMAKE_AR ${tools}/ar CACHE FILEPATH "")
 set(CMAKE_RANLIB ${tools}/ranlib CACHE FILEPATH "")
+if(CMAKE_SYSTEM_NAME STREQUAL Darwin)
+    set(CMAKE_BUILD_WITH_INSTALL_RPATH ON)  # a change at the install would break the signature
+endif()
 foreach(kind EXE SHARED MODULE)
     set(CMAKE_${kind}_LINKER_FLAGS_INIT -s)  # products are stripped
 endforeach()

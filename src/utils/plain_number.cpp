@@ -2,6 +2,9 @@
 
 #include <locale.h>
 #include <stdlib.h>
+#ifdef __APPLE__
+#include <xlocale.h>
+#endif
 
 #include <algorithm>
 #include <limits>
