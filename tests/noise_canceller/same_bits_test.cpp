@@ -11,6 +11,7 @@
 #include "morva-sdk/morva-ext.h"
 #include "morva-sdk/morva-sdk.h"
 #include "support/captured_output.h"
+#include "support/weight_writer.h"
 
 namespace {
 
@@ -56,11 +57,21 @@ constexpr Row kRows[] = {
     {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xef25d1da53ebb0b8, 0xe452eb32b1885647}},
     {"VAD_weight", Kind::voice, 48000, 6, {0x7b28db1de01a0189, 0x9884995e3fc1127c}},
     {"noise_level_16k", Kind::level, 44100, 24, {0xd588628ba5057216, 0x202828774a0b42bc}},
+    {"NC_1.0.0", Kind::cleaned, 16000, 12, {0, 0}},
 };
 // clang-format on
 
+// Made before any mode is set; of widths that fill whole registers and parts.
+std::string const kBandWeight =
+    test_support::randomNcWeight({.version = "NC_1.0.0", .hidden = 20, .gates = 28});
+
+// A file, or the weight above under the name of its version.
 int addModel(std::string const& name) {
     test_support::CapturedOutput const quiet(1);
+    if (name == "NC_1.0.0") {
+        auto const size = static_cast<unsigned>(kBandWeight.size());
+        return Morva_SDK_SetModel_Blob(kBandWeight.data(), size, name.c_str());
+    }
     std::string const file = MORVA_TEST_MODELS + name + ".mvw";
     std::wstring const path(file.begin(), file.end());
     return Morva_SDK_SetModel(path.c_str(), name.c_str());
