@@ -216,7 +216,7 @@ void normalise(RowNorm const& norm, Rows const& x, Rows& y) {
 
 // ---- gated recurrence ----
 
-// What the three gates of some units get from the state.
+// Sums of the three gates of some units.
 template <class V>
 struct Gates {
     V reset;
@@ -229,32 +229,22 @@ HWY_INLINE Gates<V> loadGates(D d, float const* first, std::size_t units) {
     return {hn::LoadU(d, first), hn::LoadU(d, first + units), hn::LoadU(d, first + 2 * units)};
 }
 
+// The new state of some units; `recalled` is what the state gives to the new value.
 template <class D, class V>
-HWY_INLINE void accumulate(D d, Gates<V>& into, float const* weights, std::size_t units, V x) {
-    auto const factors = loadGates(d, weights, units);
-    into.reset = hn::MulAdd(x, factors.reset, into.reset);
-    into.update = hn::MulAdd(x, factors.update, into.update);
-    into.fresh = hn::MulAdd(x, factors.fresh, into.fresh);
-}
-
-// The new state of some units.
-template <class D, class V>
-HWY_INLINE V newState(D d, Gates<V> const& input, Gates<V> const& state, V before) {
-    auto const reset = sigmoidOf(d, hn::Add(input.reset, state.reset));
-    auto const update = sigmoidOf(d, hn::Add(input.update, state.update));
-    auto const fresh = tanhOf(d, hn::MulAdd(reset, state.fresh, input.fresh));
+HWY_INLINE V newState(D d, Gates<V> const& sums, V recalled, V before) {
+    auto const update = sigmoidOf(d, sums.update);
+    auto const fresh = tanhOf(d, hn::MulAdd(sigmoidOf(d, sums.reset), recalled, sums.fresh));
     return hn::MulAdd(update, hn::Sub(before, fresh), fresh);
 }
 
-void step(Rows const& fromInput, Rows const& fromState, Rows& state, Rows& onto) {
+void step(Rows const& sums, Rows const& recalled, Rows& state, Rows& onto) {
     std::size_t const units = state.stride();
     for (std::size_t row = 0; row < state.count(); ++row) {
         float* const unit = state[row];
         float* const sum = onto[row];
         forRegisters(units, [&](auto d, std::size_t i) HWY_ATTR {
-            auto const after =
-                newState(d, loadGates(d, fromInput[row] + i, units),
-                         loadGates(d, fromState[row] + i, units), hn::LoadU(d, unit + i));
+            auto const after = newState(d, loadGates(d, sums[row] + i, units),
+                                        hn::LoadU(d, recalled[row] + i), hn::LoadU(d, unit + i));
             hn::StoreU(after, d, unit + i);
             hn::StoreU(hn::Add(hn::LoadU(d, sum + i), after), d, sum + i);
         });
@@ -269,23 +259,56 @@ struct Direction {
     float* after;
 };
 
+// Some units of one direction.
+template <class D>
+class Walker {
+public:
+    using V = hn::Vec<D>;
+
+    HWY_INLINE Walker(D d, Direction const& direction, std::size_t units, std::size_t i)
+        : at_(direction),
+          units_(units),
+          i_(i),
+          weights_(direction.layer.weights.data() + i),
+          input_(loadGates(d, direction.fromInput + i, units)) {
+        auto const bias = loadGates(d, direction.layer.bias.data() + i, units);
+        input_.reset = hn::Add(input_.reset, bias.reset);
+        input_.update = hn::Add(input_.update, bias.update);
+        recalled_ = bias.fresh;
+    }
+    // What unit k of the state gives.
+    HWY_INLINE void recall(D d, std::size_t k) {
+        auto const x = hn::Set(d, at_.before[k]);
+        auto const factors = loadGates(d, weights_ + 3 * k * units_, units_);
+        input_.reset = hn::MulAdd(x, factors.reset, input_.reset);
+        input_.update = hn::MulAdd(x, factors.update, input_.update);
+        recalled_ = hn::MulAdd(x, factors.fresh, recalled_);
+    }
+    HWY_INLINE void finish(D d) const {
+        auto const before = hn::LoadU(d, at_.before + i_);
+        hn::StoreU(newState(d, input_, recalled_, before), d, at_.after + i_);
+    }
+
+private:
+    Direction const& at_;
+    std::size_t units_;
+    std::size_t i_;
+    float const* weights_;
+    Gates<V> input_;
+    V recalled_;
+};
+
 // Both directions at once: neither waits for the other's sums.
 void bothRows(Direction const& a, Direction const& b, std::size_t units) {
     forRegisters(units, [&](auto d, std::size_t i) HWY_ATTR {
-        auto sumsA = loadGates(d, a.layer.bias.data() + i, units);
-        auto sumsB = loadGates(d, b.layer.bias.data() + i, units);
-        float const* weightsA = a.layer.weights.data() + i;
-        float const* weightsB = b.layer.weights.data() + i;
-        for (std::size_t k = 0; k < units; ++k, weightsA += 3 * units, weightsB += 3 * units) {
-            accumulate(d, sumsA, weightsA, units, hn::Set(d, a.before[k]));
-            accumulate(d, sumsB, weightsB, units, hn::Set(d, b.before[k]));
+        Walker walkerA(d, a, units, i);
+        Walker walkerB(d, b, units, i);
+        for (std::size_t k = 0; k < units; ++k) {
+            walkerA.recall(d, k);
+            walkerB.recall(d, k);
         }
-        auto const newA =
-            newState(d, loadGates(d, a.fromInput + i, units), sumsA, hn::LoadU(d, a.before + i));
-        auto const newB =
-            newState(d, loadGates(d, b.fromInput + i, units), sumsB, hn::LoadU(d, b.before + i));
-        hn::StoreU(newA, d, a.after + i);
-        hn::StoreU(newB, d, b.after + i);
+        walkerA.finish(d);
+        walkerB.finish(d);
     });
 }
 

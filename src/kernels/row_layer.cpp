@@ -51,15 +51,16 @@ Matrix rowsOf(Matrix const& matrix, std::size_t first, std::size_t count) {
     return {{begin, begin + static_cast<std::ptrdiff_t>(count * matrix.cols)}, count, matrix.cols};
 }
 
+Matrix columnsOf(Matrix const& matrix, std::size_t first, std::size_t count) {
+    return transposed(rowsOf(transposed(matrix), first, count));
+}
+
 Matrix besideEachOther(Matrix const& left, Matrix const& right) {
-    Matrix all{{}, left.rows, left.cols + right.cols};
-    for (std::size_t r = 0; r < left.rows; ++r) {
-        for (Matrix const* const matrix : {&left, &right}) {
-            auto const row = rowsOf(*matrix, r, 1);
-            all.data.insert(all.data.end(), row.data.begin(), row.data.end());
-        }
-    }
-    return all;
+    auto all = transposed(left);
+    auto const more = transposed(right);
+    all.data.insert(all.data.end(), more.data.begin(), more.data.end());
+    all.rows += more.rows;
+    return transposed(all);
 }
 
 RowLayer::RowLayer(Matrix const& matrix, std::vector<float> const& biases, Parts const& inputParts,

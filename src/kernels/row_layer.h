@@ -67,6 +67,7 @@ struct RowNorm {
 // The matrix for inputs that consist of padded parts.
 Matrix paddedInputs(Matrix const& matrix, Parts const& parts);
 Matrix rowsOf(Matrix const& matrix, std::size_t first, std::size_t count);
+Matrix columnsOf(Matrix const& matrix, std::size_t first, std::size_t count);
 Matrix besideEachOther(Matrix const& left, Matrix const& right);
 
 }  // namespace MORVA::CONTAINERS

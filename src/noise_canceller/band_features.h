@@ -32,10 +32,8 @@ private:
 
     BandLayout const& layout_;
     std::vector<std::complex<float>> before_;
+    std::vector<float> power_;  // of the bands
     std::vector<float> powerBefore_;
-    std::vector<float> power_;
-    std::vector<float> real_;
-    std::vector<float> imaginary_;
     std::vector<float> features_;
 };
 

@@ -58,29 +58,18 @@ void BandLayout::append(std::size_t width, std::size_t bands) {
 }
 
 void BandLayout::compress(std::vector<float>& powers) const {
-    float const* group = powers.data();
-    float* band = powers.data();
-    for (auto const& run : runs_) {
-        if (run.width == 1 && group == band) {
-            group += run.bands;
-            band += run.bands;
-            continue;
-        }
-        for (std::size_t i = 0; i < run.bands; ++i, group += run.width) {
-            *band++ = std::accumulate(group + 1, group + run.width, group[0]);
-        }
-    }
+    forEachBand([&](std::size_t band, std::size_t first, std::size_t last) {
+        float const* const bin = powers.data();
+        powers[band] = std::accumulate(bin + first + 1, bin + last, bin[first]);
+    });
     powers.resize(bands_);
 }
 
 void BandLayout::expand(std::span<float const> bands, std::vector<float>& bins) const {
     bins.resize(bins_);
-    auto band = bands.begin();
-    auto target = bins.begin();
-    for (auto const& run : runs_) {
-        for (std::size_t i = 0; i < run.bands; ++i)
-            target = std::fill_n(target, run.width, *band++);
-    }
+    forEachBand([&](std::size_t band, std::size_t first, std::size_t last) {
+        std::fill(bins.data() + first, bins.data() + last, bands[band]);
+    });
 }
 
 }  // namespace MORVA::NOISE_CANCELLER

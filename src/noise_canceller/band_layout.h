@@ -24,6 +24,18 @@ public:
     std::size_t bins() const { return bins_; }
     std::size_t bands() const { return bands_; }
 
+    // Calls body(band, first, last) for every band and its bins first <= k < last.
+    template <class Body>
+    void forEachBand(Body&& body) const {
+        std::size_t band = 0;
+        std::size_t bin = 0;
+        for (auto const& run : runs_) {
+            for (std::size_t i = 0; i < run.bands; ++i, bin += run.width) {
+                body(band++, bin, bin + run.width);
+            }
+        }
+    }
+
     // Sums powers of bins into bands, in place.
     void compress(std::vector<float>& powers) const;
 

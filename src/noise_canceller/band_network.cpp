@@ -19,11 +19,9 @@ BandNetwork::BandNetwork(std::shared_ptr<BandWeights const> weights)
       seen_(shape_.groups, shape_.seen()),
       channels_(shape_.groups, shape_.channels),
       normed_(shape_.groups, shape_.channels),
-      fromInput_(shape_.groups, std::max(6 * paddedTo(kRowUnit, shape_.across),
-                                         3 * paddedTo(kRowUnit, shape_.channels))),
-      fromState_(shape_.groups, 3 * paddedTo(kRowUnit, shape_.channels)),
+      sums_(shape_.groups, std::max({6 * paddedTo(kRowUnit, shape_.across),
+                                     3 * paddedTo(kRowUnit, shape_.channels), shape_.decoded})),
       across_(shape_.groups, 2 * paddedTo(kRowUnit, shape_.across)),
-      decoded_(shape_.groups, shape_.decoded),
       output_(shape_.groups, 2 * shape_.groupBands),
       scored_(shape_.scored),
       answers_(paddedTo(kRowUnit, 2 * shape_.bands + 1)) {}
@@ -49,22 +47,23 @@ void BandNetwork::see(std::span<float const> features) {
 
 void BandNetwork::runAcross(BandWeights::Across const& across) {
     kernels_.normalise(across.norm, channels_, normed_);
-    kernels_.product(across.input, normed_, nullptr, fromInput_, Finish::none);
-    kernels_.bothWays(across.forwards, across.backwards, fromInput_, across_);
+    kernels_.product(across.input, normed_, nullptr, sums_, Finish::none);
+    kernels_.bothWays(across.forwards, across.backwards, sums_, across_);
     kernels_.product(across.output, across_, &channels_, channels_, Finish::none);
 }
 
 void BandNetwork::runAlong(BandWeights::Along const& along, Rows& state) {
     kernels_.normalise(along.norm, channels_, normed_);
-    kernels_.product(along.input, normed_, nullptr, fromInput_, Finish::none);
-    kernels_.product(along.state, state, nullptr, fromState_, Finish::none);
-    kernels_.step(fromInput_, fromState_, state, channels_);
+    kernels_.product(along.input, normed_, nullptr, sums_, Finish::none);
+    kernels_.product(along.stateToGates, state, &sums_, sums_, Finish::none);
+    kernels_.product(along.stateToNew, state, nullptr, normed_, Finish::none);
+    kernels_.step(sums_, normed_, state, channels_);
 }
 
 void BandNetwork::decode() {
-    kernels_.product(weights_->spread, normed_, nullptr, decoded_, Finish::none);
-    kernels_.product(weights_->spreadSeen, seen_, &decoded_, decoded_, Finish::rectified);
-    kernels_.product(weights_->output, decoded_, nullptr, output_, Finish::none);
+    kernels_.product(weights_->spread, normed_, nullptr, sums_, Finish::none);
+    kernels_.product(weights_->spreadSeen, seen_, &sums_, sums_, Finish::rectified);
+    kernels_.product(weights_->output, sums_, nullptr, output_, Finish::none);
     float* masks = answers_.data();
     float* shares = masks + shape_.bands;
     for (std::size_t group = 0; group < shape_.groups; ++group) {

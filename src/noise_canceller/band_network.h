@@ -46,11 +46,9 @@ private:
     std::vector<float> standard_;  // features of one kind, with r zeros on either side
     CONTAINERS::Rows seen_;
     CONTAINERS::Rows channels_;
-    CONTAINERS::Rows normed_;
-    CONTAINERS::Rows fromInput_;  // of the gates of a recurrent layer
-    CONTAINERS::Rows fromState_;
+    CONTAINERS::Rows normed_;  // the channels normalised; then what a recurrent layer recalls
+    CONTAINERS::Rows sums_;    // of a recurrent layer's gates; at last what is decoded
     CONTAINERS::Rows across_;
-    CONTAINERS::Rows decoded_;
     CONTAINERS::Rows output_;
     std::vector<float> scored_;
     std::vector<float> answers_;

@@ -178,11 +178,18 @@ BandWeights::Across readAcross(LayerReader const& read, BandShape const& shape, 
 
 BandWeights::Along readAlong(LayerReader const& read, BandShape const& shape, std::size_t block) {
     auto const one = [&](char const* name) { return Entry{name, block, shape.depth}; };
-    Parts const units = {shape.channels};
-    Parts const three = gates(shape.channels);
-    return {read.norm(one("GainTimeNorm"), one("BiasTimeNorm"), shape.channels),
-            read.layer(one("WeightTimeIn"), one("BiasTimeIn"), units, three),
-            read.layer(one("WeightTimeState"), one("BiasTimeState"), units, three)};
+    std::size_t const units = shape.channels;
+    auto const stateTo = [&](std::size_t first, Parts const& parts) {
+        auto const& matrix = read.matrix(one("WeightTimeState"), units, 3 * units);
+        auto const bias = read.vector(one("BiasTimeState"), 3 * units).begin() +
+                          static_cast<std::ptrdiff_t>(first);
+        return RowLayer(CONTAINERS::columnsOf(matrix, first, sum(parts)),
+                        Values(bias, bias + static_cast<std::ptrdiff_t>(sum(parts))), {units},
+                        parts);
+    };
+    return {read.norm(one("GainTimeNorm"), one("BiasTimeNorm"), units),
+            read.layer(one("WeightTimeIn"), one("BiasTimeIn"), {units}, gates(units)),
+            stateTo(0, {units, units}), stateTo(2 * units, {units})};
 }
 
 std::vector<BandWeights::Block> readBlocks(LayerReader const& read, BandShape const& shape) {

@@ -42,7 +42,8 @@ struct BandWeights {
     struct Along {
         CONTAINERS::RowNorm norm;
         CONTAINERS::RowLayer input;
-        CONTAINERS::RowLayer state;
+        CONTAINERS::RowLayer stateToGates;
+        CONTAINERS::RowLayer stateToNew;
     };
     struct Block {
         std::optional<Across> across;

@@ -57,7 +57,7 @@ constexpr Row kRows[] = {
     {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xef25d1da53ebb0b8, 0xe452eb32b1885647}},
     {"VAD_weight", Kind::voice, 48000, 6, {0x7b28db1de01a0189, 0x9884995e3fc1127c}},
     {"noise_level_16k", Kind::level, 44100, 24, {0xd588628ba5057216, 0x202828774a0b42bc}},
-    {"NC_1.0.0", Kind::cleaned, 16000, 12, {0xa7a983c065742788, 0x6b5f82e8f0ed31f8}},
+    {"NC_1.0.0", Kind::cleaned, 16000, 12, {0x0cdc00e9c16db94c, 0x7097761402659c7c}},
 };
 // clang-format on
 
