@@ -56,8 +56,9 @@ private:
     std::string optionalName() {
         auto const end = optionalNames.find(' ', below(optionalNames.size()));
         auto const start = optionalNames.rfind(' ', end - 1) + 1;
-        return "CONTROL_MORVA_" + std::string(optionalNames.substr(start, end - start)) + "_v0_0_" +
-               std::to_string(1 + below(6));
+        auto const generation = 1 + below(7);
+        return "CONTROL_MORVA_" + std::string(optionalNames.substr(start, end - start)) +
+               (generation < 7 ? "_v0_0_" + std::to_string(generation) : "_v1_0_0");
     }
 
     void change(float& value) {
@@ -67,14 +68,14 @@ private:
         value = below(2) == 0 ? oneOf(values) : std::normal_distribution<float>(0, 10)(engine_);
     }
     void change(int& value) {
-        constexpr std::array values = {0, 1, -1, 2, 31, 32, 80, 160, 8000, 16000, 32000};
+        constexpr std::array values = {0, 1, -1, 2, 31, 32, 80, 160, 8000, 16000, 32000, 48000};
         auto const bits = static_cast<unsigned>(value);
         std::array const near = {bits + 1, bits - 1, bits * 2, bits / 2, 1U << 31U};
         value = below(2) == 0 ? oneOf(values) : static_cast<int>(oneOf(near));
     }
     void change(std::string& value) {
-        constexpr std::array values = {"0.0.1", "0.0.2",     "0.0.3", "0.0.4", "0.0.5",
-                                       "0.0.6", "VAD_0.0.1", "t",     "TRUE",  ""};
+        constexpr std::array values = {"0.0.1",    "0.0.2",     "0.0.3", "0.0.4", "0.0.5", "0.0.6",
+                                       "NC_1.0.0", "VAD_0.0.1", "t",     "TRUE",  ""};
         value = oneOf(values);
     }
     void change(Matrix& matrix) {

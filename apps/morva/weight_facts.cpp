@@ -18,7 +18,8 @@ using MORVA::CONTAINERS::Matrix;
 // What a value's type means for the facts: one overload for each.
 class Describer {
 public:
-    Describer(ValueFacts& facts, WeightFacts& whole) : facts_(facts), whole_(whole) {}
+    Describer(ValueFacts& facts, WeightFacts& whole, std::size_t runs)
+        : facts_(facts), whole_(whole), runs_(runs) {}
 
     void operator()(float value) { number("float", std::to_string(value), value); }
     void operator()(int value) { number("int", std::to_string(value), static_cast<float>(value)); }
@@ -57,7 +58,7 @@ private:
     void parts(std::vector<float> const& vector) { part(std::to_string(vector.size()), vector); }
     void parts(Matrix const& matrix) {
         part(std::to_string(matrix.rows) + 'x' + std::to_string(matrix.cols), matrix.data);
-        whole_.multiplyAddsPerStep += matrix.data.size();
+        whole_.multiplyAddsPerStep += runs_ * matrix.data.size();
     }
     void part(std::string const& shape, std::vector<float> const& data) {
         if (!facts_.shape.empty()) facts_.shape += ' ';
@@ -82,17 +83,9 @@ private:
 
     ValueFacts& facts_;
     WeightFacts& whole_;
+    std::size_t runs_;  // of a step
     double sum_ = 0.0;
 };
-
-// The facts of one value; adds its share to the sums in `whole`.
-ValueFacts describe(std::string const& name, AnyMap const& values, WeightFacts& whole) {
-    ValueFacts facts{.name = name, .type = "", .shape = "", .text = ""};
-    Describer describer(facts, whole);
-    MORVA::WEIGHTS::visitValue(values, name, describer);
-    describer.finish();
-    return facts;
-}
 
 std::string textValue(AnyMap const& values, char const* name) {
     auto const text = values.find<std::string>(name);
@@ -106,7 +99,26 @@ std::optional<int> intValue(AnyMap const& values, char const* name) {
 
 ModelKind kindOf(std::string const& version) {
     if (version.find("VAD") != std::string::npos) return ModelKind::voiceActivity;
-    return version.starts_with("0.0.") ? ModelKind::noiseCancellation : ModelKind::unknown;
+    bool const isNoise = version.starts_with("0.0.") || version == MORVA::WEIGHTS::BAND_VERSION;
+    return isNoise ? ModelKind::noiseCancellation : ModelKind::unknown;
+}
+
+// How often a step runs a value's matrices: those of version NC_1.0.0 once for every group of
+// bands, except for what all groups have together.
+std::size_t runsPerStep(std::string const& name, AnyMap const& values) {
+    auto const place = values.find<Matrix>("WeightPlace");
+    if (textValue(values, "Version") != MORVA::WEIGHTS::BAND_VERSION || !place) return 1;
+    if (name == "WeightPlace") return 0;  // added, not multiplied
+    return name == "WeightScore" ? 1 : place->rows;
+}
+
+// The facts of one value; adds its share to the sums in `whole`.
+ValueFacts describe(std::string const& name, AnyMap const& values, WeightFacts& whole) {
+    ValueFacts facts{.name = name, .type = "", .shape = "", .text = ""};
+    Describer describer(facts, whole, runsPerStep(name, values));
+    MORVA::WEIGHTS::visitValue(values, name, describer);
+    describer.finish();
+    return facts;
 }
 
 }  // namespace

@@ -1,4 +1,8 @@
 // The engine as a subject of the comparison.
+#include <algorithm>
+#include <filesystem>
+#include <utility>
+
 #include "bench_engine.h"
 #include "subject.h"
 
@@ -20,19 +24,34 @@ private:
     std::vector<float> frame_;
 };
 
+int rateOf(std::string const& model) {
+    std::vector<MorvaExtModelInfo> models(
+        static_cast<std::size_t>(MorvaExt_ListModels(nullptr, 0)));
+    MorvaExt_ListModels(models.data(), static_cast<int>(models.size()));
+    auto const found = std::ranges::find_if(
+        models, [&](MorvaExtModelInfo const& info) { return info.name == model; });
+    return found != models.end() ? found->sampleRate : 0;
+}
+
 }  // namespace
 
-void addOurs(Contestants& all) {
+void addOurs(Contestants& all, std::vector<std::string> const& files) {
     startEngine();
-    struct Place {
-        char const* model;
-        int rate;
-    };
-    for (auto const [model, rate] :
-         {Place{"full_NC-ca03f4", 48000}, Place{"full_NC-ca03f4", 32000}, Place{"small_NC", 48000},
-          Place{"small_NC", 16000}, Place{"small_NC_8k", 8000}}) {
-        all.push_back(
-            {std::string("this engine, ") + model, rate, std::make_unique<Ours>(model, rate)});
+    std::vector<std::pair<std::string, int>> places = {{"full_NC-ca03f4", 48000},
+                                                       {"full_NC-ca03f4", 32000},
+                                                       {"small_NC", 48000},
+                                                       {"small_NC", 16000},
+                                                       {"small_NC_8k", 8000}};
+    for (auto const& file : files) {
+        auto const path = std::filesystem::absolute(file);
+        auto const name = path.filename().string();
+        if (Morva_SDK_SetModel(path.wstring().c_str(), name.c_str()) != 0) std::exit(1);
+        int const rate = rateOf(name);
+        places.emplace_back(name, rate);
+        if (rate != 48000) places.emplace_back(name, 48000);
+    }
+    for (auto const& [model, rate] : places) {
+        all.push_back({"this engine, " + model, rate, std::make_unique<Ours>(model.c_str(), rate)});
     }
 }
 

@@ -1,5 +1,6 @@
 // What a second of sound costs: this engine and its peers, interleaved in one run on one thread.
-//   build/release/morva_peers [--rnnoise LABEL=LIBRARY] [--command LABEL=COMMAND] [--rounds N]
+//   build/release/morva_peers [--model FILE] [--rnnoise LABEL=LIBRARY] [--command LABEL=COMMAND]
+//                             [--rounds N]
 // Times are processor time of the thread, so that other work on the machine only adds the noise of
 // shared caches; a round runs one second of sound through everyone in turn.
 #include <CLI/CLI.hpp>
@@ -100,16 +101,18 @@ void printFloor(std::vector<Line> const& lines, Machine const& machine) {
 
 int main(int argc, char** argv) {
     CLI::App app("Processor time of this engine and of its peers");
+    std::vector<std::string> models;
     std::vector<std::string> libraries;
     std::vector<std::string> commands;
     int rounds = 60;
+    app.add_option("--model", models, "FILE.mvw of one more of our noise models; repeatable");
     app.add_option("--rnnoise", libraries, "LABEL=PATH of a native RNNoise library; repeatable");
     app.add_option("--command", commands, "LABEL=COMMAND, called with in.wav out.wav; repeatable");
     app.add_option("--rounds", rounds, "seconds of sound for everyone")->check(CLI::PositiveNumber);
     CLI11_PARSE(app, argc, argv);
 
     Contestants all;
-    addOurs(all);
+    addOurs(all, models);
     std::string reference;
     if (libraries.empty()) std::puts("skipped: RNNoise, no --rnnoise LABEL=LIBRARY given");
     for (auto const& library : libraries) {

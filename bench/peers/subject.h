@@ -22,8 +22,9 @@ struct Contestant {
 
 using Contestants = std::vector<Contestant>;
 
-// The shipped noise models, each at its own rate and at 48000 Hz.
-void addOurs(Contestants& all);
+// The shipped noise models and those of the given weight files, each at its own rate and at 48000
+// Hz.
+void addOurs(Contestants& all, std::vector<std::string> const& files);
 // These print a line and add nothing when the peer was not there at build time.
 void addSpeexDsp(Contestants& all);
 void addWebRtc(Contestants& all);

@@ -10,9 +10,8 @@
 
 #include <cstddef>
 #include <cstdint>
-#include <new>
-#include <vector>
 
+#include "kernels/aligned_vector.h"
 #include "kernels/matrix.h"
 #include "kernels/panel_product.h"
 
@@ -30,24 +29,11 @@ public:
     void affine(float const* x, float const* bias, float* out) const;
 
 private:
-    template <class T>
-    struct CacheLineAllocator {
-        using value_type = T;
-        CacheLineAllocator() = default;
-        template <class U>
-        CacheLineAllocator(CacheLineAllocator<U> const&) {}
-        T* allocate(std::size_t n) {
-            return static_cast<T*>(::operator new (n * sizeof(T), std::align_val_t{64}));
-        }
-        void deallocate(T* p, std::size_t) { ::operator delete (p, std::align_val_t{64}); }
-        bool operator==(CacheLineAllocator const&) const { return true; }
-    };
-
     std::size_t rows_;
     std::size_t cols_;
     PanelProduct product_;
-    std::vector<std::uint16_t, CacheLineAllocator<std::uint16_t>> half_;
-    std::vector<float, CacheLineAllocator<float>> single_;
+    AlignedVector<std::uint16_t> half_;
+    AlignedVector<float> single_;
 };
 
 }  // namespace MORVA::CONTAINERS

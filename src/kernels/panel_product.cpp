@@ -1,6 +1,6 @@
 #include "kernels/panel_product.h"
 
-#include "utils/processor.h"
+#include "kernels/wide_registers.h"
 
 #define HWY_TARGET_INCLUDE "kernels/panel_product.cpp"  // compiled once for every width
 #include "kernels/vector_layer.h"
@@ -79,10 +79,7 @@ namespace MORVA::CONTAINERS {
 
 PanelProduct const& panelProduct() {
 #if HWY_TARGETS & HWY_AVX3
-    // Wide registers from the generation on that does not slow its clock down for them.
-    using enum UTILS::CpuRegister;
-    static bool const wide = UTILS::processorHas({"AVX512_VBMI2", 7, ecx, 6, UTILS::kWidestState});
-    if (wide) return N_AVX3::kProduct;
+    if (UTILS::wideRegistersPay()) return N_AVX3::kProduct;
 #endif
     return HWY_STATIC_DISPATCH(kProduct);
 }

@@ -54,7 +54,9 @@ MORVA_API int MorvaExt_NC_EnableVoice(void* session, char const* vadModel);
 
 /* [audio thread] Meters of the last cleaned frame: the voice score (NaN unless enabled) and the
  * level of what was removed, in decibels as noise-level sessions report it (with an attenuation
- * limit, of the part that was removed). Either pointer may be null. */
+ * limit, of the part that was removed). A model of version NC_1.0.0 says both by itself: its own
+ * score until another model is enabled, and the level of the noise whatever the limit. Either
+ * pointer may be null. */
 MORVA_API int MorvaExt_NC_FrameMeters(void* session, float* voice, float* noiseDb);
 
 /* ---- noise level ---- */

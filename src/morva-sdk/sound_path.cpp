@@ -65,7 +65,7 @@ void SoundPath::enableVoice(std::unique_ptr<VoiceMeter> voice) {
 }
 
 float SoundPath::voiceScore() const {
-    return voice_ ? voice_->score() : std::numeric_limits<float>::quiet_NaN();
+    return voice_ ? voice_->score() : controls_.voiceScore();
 }
 
 float SoundPath::noiseLevelDb() const {

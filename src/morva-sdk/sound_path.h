@@ -59,9 +59,10 @@ public:
 
     void enableVoice(std::unique_ptr<VoiceMeter> voice);
 
-    // Of the last frame. A NaN unless voice is enabled.
+    // Of the last frame: that of the enabled voice-activity model, or the model's own; a NaN where
+    // there is neither.
     float voiceScore() const;
-    // Of what was removed, as noise-level sessions report it.
+    // Of the noise, as noise-level sessions report it.
     float noiseLevelDb() const;
 
 private:

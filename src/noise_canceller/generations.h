@@ -8,6 +8,9 @@
 //   0.0.4    Vorbis                mean energy          compressed  gated
 //   0.0.5    Vorbis                mean energy          compressed  gated
 //   0.0.6    Vorbis                mean energy          compressed  gated, layer-normalised speaker
+//
+// Version NC_1.0.0 shares the frames around its network with them, and is a model of its own
+// (band_model.h).
 #pragma once
 
 #include <type_traits>

@@ -44,7 +44,8 @@ public:
                                                 MORVA_SDK::MorvaSessionType type);
 
     // The environment with the highest weight rate not above `rate` among those that suit the
-    // session's type (the first registered on ties), or an empty pointer.
+    // session's type (the first registered on ties), or an empty pointer. For voice and noise level
+    // the models of version NC_1.0.0 suit where no other does.
     static ModelEnvironment selectModel(std::vector<ModelEnvironment> const& environments,
                                         MorvaSamplingRate rate, MORVA_SDK::MorvaSessionType type);
 

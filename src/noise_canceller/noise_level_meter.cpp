@@ -16,7 +16,10 @@ void NoiseLevelMeter::measure(HopPipeline::CompletedHop const& hop) {
         float const removed = hop.input[i] - hop.output[i];
         sum += static_cast<double>(removed) * static_cast<double>(removed);
     }
-    auto const power = static_cast<float>(sum / static_cast<double>(hop.input.size()));
+    add(static_cast<float>(sum / static_cast<double>(hop.input.size())));
+}
+
+void NoiseLevelMeter::add(float power) {
     power_ = power_ * kSmoothing + power * (1.0f - kSmoothing);
 }
 

@@ -1,6 +1,5 @@
-// Smoothed level of what a cleaner removes: the mean square of input minus output over a hop,
-// smoothed by 0.9 per hop, in decibels re one squared unit of the 16-bit sample scale (-60 for
-// nothing).
+// Smoothed level of the noise: its mean square over a hop, smoothed by 0.9 per hop, in decibels re
+// one squared unit of the 16-bit sample scale (-60 for nothing).
 #pragma once
 
 #include "noise_canceller/hop_pipeline.h"
@@ -9,7 +8,9 @@ namespace MORVA::NOISE_CANCELLER {
 
 class NoiseLevelMeter {
 public:
+    // For models that do not say what noise is: it is what they remove, input minus output.
     void measure(HopPipeline::CompletedHop const& hop);
+    void add(float power);
     float levelDb() const;
     void reset() { power_ = 0.0f; }
 

@@ -3,6 +3,7 @@
 #pragma once
 
 #include <cstddef>
+#include <limits>
 
 namespace MORVA::NOISE_CANCELLER {
 
@@ -17,9 +18,12 @@ public:
     // False when the model has no background-speaker stage. Prints nothing. [any thread]
     virtual bool switchBackgroundSpeaker(bool on) = 0;
 
-    // Level of what the last hops removed, as noise-level sessions report it. [the session's
+    // Level of the noise in the last hops, as noise-level sessions report it. [the session's
     // thread]
     virtual float noiseLevelDb() const = 0;
+
+    // Voice score of the last hop; a NaN where the model has none. [the session's thread]
+    virtual float voiceScore() const { return std::numeric_limits<float>::quiet_NaN(); }
 
     // From sound in to sound out, in samples at the model's rate. [any thread]
     virtual std::size_t delay() const = 0;

@@ -31,11 +31,11 @@ void calcFeatures(std::vector<std::complex<float>> const& spectrum, std::vector<
     UTILS::logarithms(out);
 }
 
-void applyClipFix(std::vector<float>& frame, SpectralParams const& params) {
+void applyClipFix(std::vector<float>& frame, FrameTunables const& tunables) {
     if (frame.empty()) return;
     float const peak = *std::max_element(frame.begin(), frame.end());
-    if (!(peak > params.clipFixPoint)) return;
-    float const scale = params.clipFixPoint / peak;
+    if (!(peak > tunables.clipFixPoint)) return;
+    float const scale = tunables.clipFixPoint / peak;
     for (float& sample : frame) sample *= scale;
 }
 

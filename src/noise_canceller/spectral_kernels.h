@@ -6,6 +6,7 @@
 
 namespace MORVA::NOISE_CANCELLER {
 
+struct FrameTunables;
 struct SpectralParams;
 
 namespace NOISE_CLEANER_FUNCTIONS {
@@ -20,7 +21,7 @@ void calcFeatures(std::vector<std::complex<float>> const& spectrum, std::vector<
 
 // Peak limiter: scales the frame so that its most positive sample is the clip point when it is
 // above. Negative peaks are not considered.
-void applyClipFix(std::vector<float>& frame, SpectralParams const& params);
+void applyClipFix(std::vector<float>& frame, FrameTunables const& tunables);
 
 }  // namespace NOISE_CLEANER_FUNCTIONS
 }  // namespace MORVA::NOISE_CANCELLER

@@ -79,7 +79,10 @@ std::string Weight::getWeightVersion() const {
 std::pair<MorvaSamplingRate, MorvaFrameDuration> Weight::getWeightInfo() const {
     auto const rate = values_.find<int>(SAMPLERATE);
     auto const length = values_.find<int>(FRAMELENGHT);
-    if (rate != nullptr && length != nullptr && isOneOf(sampleRates, *rate)) {
+    auto const version = values_.find<std::string>(VERSION);
+    bool const higher = version != nullptr && *version == BAND_VERSION && rate != nullptr &&
+                        *rate == MORVA_RATE_48000;
+    if (rate != nullptr && length != nullptr && (higher || isOneOf(sampleRates, *rate))) {
         // Wider than the stored values: a hostile length must not overflow into a legal duration.
         auto const duration = std::int64_t{*length} * 1000 / *rate;
         if (isOneOf(frameDurations, duration)) {

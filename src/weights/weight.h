@@ -12,6 +12,7 @@
 
 #include <cstddef>
 #include <string>
+#include <string_view>
 #include <utility>
 
 #include "morva-sdk/morva-sdk.h"
@@ -25,6 +26,9 @@ namespace MORVA::WEIGHTS {
 inline std::string const SAMPLERATE = "SampleRate";    // int, hertz
 inline std::string const FRAMELENGHT = "FrameLength";  // int, samples
 inline std::string const VERSION = "Version";          // string
+
+// The version of the noise models that know voice and noise level too, and the rate of 48000 Hz.
+inline constexpr std::string_view BAND_VERSION = "NC_1.0.0";
 
 class Weight {
 public:

@@ -15,12 +15,21 @@ using test_support::randomNcWeight;
 TEST(SessionMemory, IsSmallBesideTheModel) {
     Engine engine;
     ASSERT_EQ(Engine::addFile(MORVA_TEST_MODELS "c6.xs.f.ca03f4.mvw", "c6").result, 0);
-    openNc(48000, 48000, 10, "c6");
-    std::size_t const before = test_support::heldBytes;
-    openNc(48000, 48000, 10, "c6");
-    std::size_t const held = test_support::heldBytes - before;
-    EXPECT_LE(held, std::size_t{256} << 10);
-    EXPECT_GT(held, std::size_t{16} << 10);
+    Engine::add("band", randomNcWeight({.version = "NC_1.0.0",
+                                        .sampleRate = 48000,
+                                        .frameLength = 960,
+                                        .compressRate = 3,
+                                        .hidden = 32,
+                                        .gates = 16,
+                                        .groupBands = 5}));
+    for (char const* model : {"c6", "band"}) {
+        openNc(48000, 48000, 10, model);
+        std::size_t const before = test_support::heldBytes;
+        openNc(48000, 48000, 10, model);
+        std::size_t const held = test_support::heldBytes - before;
+        EXPECT_LE(held, std::size_t{256} << 10) << model;
+        EXPECT_GT(held, std::size_t{16} << 10) << model;
+    }
 }
 
 namespace {

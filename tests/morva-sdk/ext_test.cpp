@@ -33,6 +33,7 @@ protected:
         Engine::add("random", randomNcWeight({}));
         Engine::add("closed", closedNcWeight({}));
         Engine::add("level", randomNcWeight({.version = "0.0.5", .timeStamp = "l"}));
+        Engine::add("band", randomNcWeight({.version = "NC_1.0.0"}));
         Engine::add("vad", test_support::randomVadWeight({}));
         Engine::addIdentity("narrow", 8000, 20);
     }
@@ -123,22 +124,28 @@ TEST_F(Extension, SwitchingFadesBetweenNeverAndAlways) {
 // ---- meters ----
 
 TEST_F(Extension, MetersEqualSeparateSessions) {
+    auto const check = [](int hz, int ms, std::string const& model, std::string const& vad) {
+        auto* const nc = openNc(hz, hz, ms, model.c_str());
+        bool const asks = vad != model;
+        ASSERT_EQ(asks ? MorvaExt_NC_EnableVoice(nc, vad.c_str()) : 0, 0);
+        auto const sound = toPcm(voice(hz, 1.0, 6));
+        auto const scores = Stream(Kind::voice, hz, hz, ms, vad).run(sound);
+        auto const levels = Stream(Kind::level, hz, hz, ms, model).run(sound);
+        std::vector<short> out(samples(hz, ms));
+        forEachFrame(sound, out.size(), [&](std::size_t k, auto const& in) {
+            float voiceScore = NAN;
+            float noiseDb = NAN;
+            ASSERT_EQ(clean(nc, in, out), 0);
+            ASSERT_EQ(MorvaExt_NC_FrameMeters(nc, &voiceScore, &noiseDb), 0);
+            ASSERT_EQ(voiceScore, scores[k]) << hz << " Hz, frame " << k;
+            ASSERT_NEAR(noiseDb, levels[k], 0.01F);  // but for rounding
+        });
+    };
     for (int const hz : {8000, 16000, 44100, 48000}) {
         for (int const ms : {10, 30}) {
-            auto* const nc = openNc(hz, hz, ms, "level");
-            ASSERT_EQ(MorvaExt_NC_EnableVoice(nc, "vad"), 0);
-            auto const sound = toPcm(voice(hz, 1.0, 6));
-            auto const scores = Stream(Kind::voice, hz, hz, ms, "vad").run(sound);
-            auto const levels = Stream(Kind::level, hz, hz, ms, "level").run(sound);
-            std::vector<short> out(samples(hz, ms));
-            forEachFrame(sound, out.size(), [&](std::size_t k, auto const& in) {
-                float voiceScore = NAN;
-                float noiseDb = NAN;
-                ASSERT_EQ(clean(nc, in, out), 0);
-                ASSERT_EQ(MorvaExt_NC_FrameMeters(nc, &voiceScore, &noiseDb), 0);
-                ASSERT_EQ(voiceScore, scores[k]) << hz << " Hz, frame " << k;
-                ASSERT_NEAR(noiseDb, levels[k], 0.01F);  // but for rounding
-            });
+            check(hz, ms, "level", "vad");
+            check(hz, ms, "band", "band");  // by itself
+            check(hz, ms, "band", "vad");
         }
     }
 }
@@ -162,17 +169,17 @@ TEST_F(Extension, WhatASessionCanDo) {
 TEST_F(Extension, ListOfModels) {
     auto const longWeight = randomNcWeight({.frameLength = 512, .filtrEnd = 128, .timeStamp = "n"});
     Engine::add(std::string(300, 'z').c_str(), longWeight);
-    EXPECT_EQ(MorvaExt_ListModels(nullptr, 0), 6);
-    std::vector<MorvaExtModelInfo> models(8);
-    EXPECT_EQ(MorvaExt_ListModels(models.data(), 8), 6);
+    EXPECT_EQ(MorvaExt_ListModels(nullptr, 0), 7);
+    std::vector<MorvaExtModelInfo> models(9);
+    EXPECT_EQ(MorvaExt_ListModels(models.data(), 9), 7);
     std::vector<std::string> seen;
     for (auto const& model : models) {
         seen.push_back(std::string(model.name) + " " + model.version + " " +
                        std::to_string(model.sampleRate) + " " + std::to_string(model.frameMs));
     }
     EXPECT_THAT(seen, ::testing::ElementsAre(
-                          "closed 0.0.6 16000 20", "level 0.0.5 16000 20", "narrow 0.0.6 8000 20",
-                          "random 0.0.6 16000 20", "vad VAD_0.0.1 8000 30",
+                          "band NC_1.0.0 16000 20", "closed 0.0.6 16000 20", "level 0.0.5 16000 20",
+                          "narrow 0.0.6 8000 20", "random 0.0.6 16000 20", "vad VAD_0.0.1 8000 30",
                           std::string(127, 'z') + " 0.0.6 16000 32", "  0 0", "  0 0"));
 }
 

@@ -21,6 +21,7 @@ struct Model {
     std::string weight;
 };
 Model const kNc = {Kind::noise, randomNcWeight({})};
+Model const kBand = {Kind::noise, randomNcWeight({.version = "NC_1.0.0"})};
 Model const kVad = {Kind::voice, test_support::randomVadWeight({})};
 
 // The first value of a name counts: what is written in front of a weight replaces its own.
@@ -78,16 +79,17 @@ TEST(RefusedWeights, WhatDoesNotFit) {
     int count = 0;
     int unread = 0;
     for (auto const& model :
-         {kNc, Model{Kind::noise, randomNcWeight({.version = "0.0.5"})}, kVad}) {
+         {kNc, Model{Kind::noise, randomNcWeight({.version = "0.0.5"})}, kBand, kVad}) {
         bool const isVad = model.kind == Kind::voice;
+        bool const readsModulo = !isVad && model.weight != kBand.weight;
         MORVA::WEIGHTS::Weight weight;
         ASSERT_TRUE(weight.read(model.weight.data(), model.weight.size()));
         for (auto const& entry : weight.values()) {
             auto const& name = entry.first;
-            // Parameters have ranges, and statistics of noise cleaners are read modulo their
+            // Parameters have ranges, and statistics of most noise cleaners are read modulo their
             // length.
             if (name.starts_with("Test_") || name.starts_with("CONTROL_")) continue;
-            if (!isVad && (name == "MU" || name == "SD")) continue;
+            if (readsModulo && (name == "MU" || name == "SD")) continue;
             MORVA::WEIGHTS::visitValue(weight.values(), name, [&](auto const& typed) {
                 for (auto const& bad : wrong(typed)) {
                     auto const seen = openWith(model, name, bad);
@@ -114,6 +116,20 @@ TEST(RefusedWeights, Reasons) {
     WeightWriter::Vector const two = {1.0F, -0.0F};
     EXPECT_THAT(openWith(kNc, "SD", two), because("SD holds a zero"));
     EXPECT_THAT(openWith(kVad, "SD", WeightWriter::Vector(61, -1.0F)), because("SD .*"));
+    // Bands: 40 bins, 20 twice and 20 four times as wide, two bins too many, half a bin.
+    WeightWriter::Vector widths(80, 1.0F);
+    std::fill(widths.begin() + 40, widths.end(), 2.0F);
+    EXPECT_THAT(openWith(kBand, "BandWidths", widths), because("BandWidths .* add up to 160"));
+    for (float const bad : {NAN, 0.5F, 0.0F, -1.0F, 1e10F, HUGE_VALF}) {
+        widths[3] = bad;
+        EXPECT_THAT(openWith(kBand, "BandWidths", widths), because("BandWidths holds .*"));
+        widths[3] = 1.0F;
+    }
+    for (float const bad : {NAN, 0.0F, -1.0F, 1e-42F}) {
+        EXPECT_THAT(openWith(kBand, "SD", WeightWriter::Vector(240, bad)), because("SD holds .*"));
+    }
+    EXPECT_THAT(openWith(kBand, "SampleRate", 8000), because("SampleRate is 8000.*"));
+    EXPECT_THAT(openWith(kBand, "GroupBands", 3), because("GroupBands is 3, must divide.*"));
 }
 
 // The background-speaker stage is built whether it is on or not.

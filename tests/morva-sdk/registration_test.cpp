@@ -120,17 +120,26 @@ TEST_F(Registration, AutomaticChoiceTakesTheHighestRateThatFits) {
     Engine::addIdentity("16k later", 16000, 30);
     Engine::addIdentity("8k", 8000, 30);
     Engine::addIdentity("32k", 32000, 32);
+    // Voice activity looks at its own kind, and where there is none at models that know voice, too.
+    auto const voiceAt = [](int hz) {
+        return observe([&] { return Morva_VAD_CreateSession(rate(hz), duration(10), nullptr); });
+    };
+    auto const scoreOf = [](void* session) {
+        return valueOf(Kind::voice, session, std::vector<short>(160, 5000));
+    };
+    auto const named = [](char const* model) { return Stream(Kind::voice, 16000, 0, 10, model); };
+    EXPECT_THAT(voiceAt(16000), none);
+    Engine::add("band", randomNcWeight({.version = "NC_1.0.0"}));
+    EXPECT_EQ(scoreOf(voiceAt(16000).result), scoreOf(named("band").handle));
+    EXPECT_THAT(voiceAt(12000), none);
     Engine::add("vad", randomVadWeight({.sampleRate = 16000, .frameLength = 480}));
+    EXPECT_EQ(scoreOf(voiceAt(16000).result), scoreOf(named("vad").handle));
+    EXPECT_NE(scoreOf(named("vad").handle), scoreOf(named("band").handle));
+    EXPECT_THAT(voiceAt(8000), none);
     char const* const expected[] = {"8k", "8k", "16k", "16k", "32k", "32k", "32k", "32k", "32k"};
     for (std::size_t i = 0; i < std::size(kRates); ++i) {
         EXPECT_EQ(MorvaExt_SessionLatencySamples(openNc(kRates[i], 48000, 10, nullptr)),
                   MorvaExt_SessionLatencySamples(openNc(kRates[i], 48000, 10, expected[i])))
             << kRates[i];
     }
-    // Voice activity looks at its own kind only.
-    auto const voiceAt = [](int hz) {
-        return observe([&] { return Morva_VAD_CreateSession(rate(hz), duration(10), nullptr); });
-    };
-    EXPECT_NE(voiceAt(16000).result, nullptr);
-    EXPECT_THAT(voiceAt(8000), none);
 }

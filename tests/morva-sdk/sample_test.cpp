@@ -21,6 +21,7 @@ protected:
             EXPECT_EQ(Engine::addFile(file, name.c_str()).result, 0);
         }
         Engine::addIdentity("id", 16000, 20);
+        Engine::add("band", test_support::randomNcWeight({.version = "NC_1.0.0"}));
         Engine::add("vad", test_support::randomVadWeight({}));
         Engine::add("db", test_support::randomNcWeight({.version = "0.0.5"}));
     }
@@ -63,7 +64,8 @@ TEST_F(Samples, HostileSoundStaysInRangeAndIsForgotten) {
                                     {48000, "id"},
                                     {48000, "NC_small_8k"},
                                     {48000, "NC_small_16k"},
-                                    {48000, "c6.xs.f.ca03f4"}}) {
+                                    {48000, "c6.xs.f.ca03f4"},
+                                    {48000, "band"}}) {
         bool const remembers = model != std::string("id");
         auto const sound = voice(hz, 2.2, 5);
         auto const frame = samples(hz, 10);
@@ -127,6 +129,7 @@ TEST_F(Samples, TheCallersRoundingChangesNoBit) {
             std::fesetround(mode);
             std::vector<Frame> const got = {cleanAll(openNc(hz, hz, 10, "c6.xs.f.ca03f4"), sound),
                                             cleanAll(openNc(hz, 24000, 20, "NC_small_8k"), sound),
+                                            cleanAll(openNc(hz, hz, 10, "band"), sound),
                                             scores(hz, 10).run(sound), levels(hz, 30).run(sound)};
             int const after = std::fegetround();
             std::fesetround(FE_TONEAREST);

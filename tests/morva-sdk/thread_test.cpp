@@ -20,9 +20,9 @@ constexpr std::size_t kThreads = 8;
 // Kinds, rates and models in turn.
 Stream open(std::size_t i) {
     int const hz = kRates[i % 9];
-    if (i % 4 == 1) return {Kind::voice, hz, hz, 10, "vad"};
-    if (i % 4 == 2) return {Kind::level, hz, hz, 10, "five"};
-    return {Kind::noise, hz, kRates[i % 7], 10, std::array{"six", "five", "c6"}[i % 3]};
+    if (i % 4 == 1) return {Kind::voice, hz, hz, 10, i % 8 == 1 ? "vad" : "band"};
+    if (i % 4 == 2) return {Kind::level, hz, hz, 10, i % 8 == 2 ? "five" : "band"};
+    return {Kind::noise, hz, kRates[i % 7], 10, std::array{"six", "five", "c6", "band"}[i % 5 % 4]};
 }
 
 std::vector<float> run(Stream const& stream, std::size_t i) {
@@ -36,7 +36,7 @@ void workOnTheControlThread(std::atomic<bool> const& done) {
         auto const blob = randomNcWeight({.seed = static_cast<unsigned>(turn), .timeStamp = name});
         auto const size = static_cast<unsigned>(blob.size());
         EXPECT_EQ(Morva_SDK_SetModel_Blob(blob.data(), size, name.c_str()), 0);
-        EXPECT_EQ(MorvaExt_ListModels(models.data(), 4), 5 + turn);
+        EXPECT_EQ(MorvaExt_ListModels(models.data(), 4), 6 + turn);
         for (char const* model : {name.c_str(), "c6", static_cast<char const*>(nullptr)}) {
             EXPECT_EQ(Morva_NC_CloseSession(openNc(48000, 16000, 20, model)), 0);
         }
@@ -49,6 +49,7 @@ TEST(Threads, SessionsGiveTheBitsThatTheyGiveAlone) {
     Engine engine;
     Engine::add("six", randomNcWeight({}));
     Engine::add("five", randomNcWeight({.version = "0.0.5"}));
+    Engine::add("band", randomNcWeight({.version = "NC_1.0.0"}));
     Engine::add("vad", test_support::randomVadWeight({}));
     ASSERT_EQ(Engine::addFile(MORVA_TEST_MODELS "c6.xs.f.ca03f4.mvw", "c6").result, 0);
 

@@ -8,6 +8,7 @@
 
 #include "noise_canceller/noise_cleaner_generations.h"
 #include "noise_canceller/noise_cleaner_v0_0_6.h"
+#include "noise_canceller/noise_cleaner_v1_0_0.h"
 #include "noise_canceller/noise_db_cleaner_v0_0_1.h"
 #include "noise_canceller/vad_cleaner_v0_0_1.h"
 #include "support/captured_output.h"
@@ -31,7 +32,8 @@ inline void setText(ModelEnvironment const& model, std::string const& key, char 
     model->second.insert<std::string>(key, text, MORVA::CONTAINERS::InsertMode::keep);
 }
 
-// The cleaner of a generation, 1 to 6, the noise-level model (0) or voice activity (7).
+// The cleaner of a generation, 1 to 6, the noise-level model (0) or voice activity (7); of version
+// NC_1.0.0 the sound (10), its voice score (11) and its noise level (12).
 inline std::unique_ptr<NoiseCleaner> makeCleaner(int generation, ModelEnvironment const& model,
                                                  std::size_t frameMs) {
     using namespace MORVA::NOISE_CANCELLER;
@@ -51,6 +53,12 @@ inline std::unique_ptr<NoiseCleaner> makeCleaner(int generation, ModelEnvironmen
             return std::make_unique<NoiseCleaner_v0_0_5>(model, frameMs);
         case 6:
             return std::make_unique<NoiseCleaner_v0_0_6>(model, frameMs);
+        case 10:
+            return std::make_unique<NoiseCleaner_v1_0_0>(model, frameMs);
+        case 11:
+            return std::make_unique<VadCleaner_v1_0_0>(model, frameMs);
+        case 12:
+            return std::make_unique<NoiseDBCleaner_v1_0_0>(model, frameMs);
         default:
             return std::make_unique<VadCleaner_v0_0_1>(model, frameMs);
     }

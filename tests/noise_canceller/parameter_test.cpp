@@ -131,6 +131,13 @@ TEST(Parameters, MissingValuesAreNamedInTheOrderOfReading) {
     auto const older = randomNcWeight({.version = "0.0.5"});
     expectOrder(6, randomNcWeight({}), structure + learned + normed);
     for (int const model : {0, 5}) expectOrder(model, older, learned + structure);
+    expectOrder(10, randomNcWeight({.version = "NC_1.0.0"}),
+                "SampleRate Step FrameLength BandWidths GroupBands GroupReach MU WeightGather "
+                "WeightTimeIn WeightGroupsState WeightSpread WeightScore BiasSpread SD BiasGather "
+                "WeightPlace BiasGroupsIn GainGroupsNorm BiasGroupsNorm WeightGroupsIn "
+                "BiasGroupsState WeightGroupsOut BiasGroupsOut GainTimeNorm BiasTimeNorm "
+                "BiasTimeIn WeightTimeState BiasTimeState GainNorm BiasNorm WeightOutput "
+                "BiasOutput BiasScore ");
     expectOrder(7, test_support::randomVadWeight({}), learned + "SampleRate FrameLength ");
 }
 

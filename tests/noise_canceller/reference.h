@@ -1,5 +1,6 @@
-// Noise cleaning of every generation and voice activity in plain double precision, written from the
-// formulas alone: no state is clever, nothing is fast. Tests compare the engine with it.
+// Noise cleaning of every generation (10: version NC_1.0.0) and voice activity in plain double
+// precision, written from the formulas alone: no state is clever, nothing is fast. Tests compare
+// the engine with it.
 #pragma once
 
 #include <algorithm>
@@ -134,6 +135,114 @@ inline Values hiddenLayers(Weight const& weight, int generation, Values& state,
     return x;
 }
 
+// The network of version NC_1.0.0, one group of bands after the other.
+class BandNetwork {
+public:
+    explicit BandNetwork(Weight const& weight) : weight_(weight) {}
+
+    // Masks of all bands, their shares of noise, the voice score.
+    Values answers(Values const& features) {
+        Values const x = (features - vector("MU")) / vector("SD");
+        auto const& place = weight_.getReference<Matrix>("WeightPlace");
+        states_.resize(weight_.getReference<Matrices>("WeightTimeIn").size(),
+                       Groups(place.rows, Values(place.cols)));
+        Groups seen;
+        Groups y;
+        for (std::size_t g = 0; g < place.rows; ++g) {
+            seen.push_back(seenBy(g, x));
+            Vector const row(&place.data[g * place.cols], &place.data[g * place.cols] + place.cols);
+            y.push_back(rectified(product("Gather", seen[g]) + valuesOf(row)));
+        }
+        for (std::size_t block = 0; block < states_.size(); ++block) {
+            if (weight_.values().contains("WeightGroupsIn")) runAcross(block, y);
+            for (std::size_t g = 0; g < y.size(); ++g) {
+                Values const x_g =
+                    normed(y[g], entry("GainTimeNorm", block), entry("BiasTimeNorm", block));
+                states_[block][g] = gated("Time", block, x_g, states_[block][g]);
+                y[g] += states_[block][g];
+            }
+        }
+        Values masks;
+        Values noise;
+        Values all;
+        for (std::size_t g = 0; g < y.size(); ++g) {
+            y[g] = normed(y[g], vector("GainNorm"), vector("BiasNorm"));
+            Values const each =
+                product("Output", rectified(product("Spread", joined(y[g], seen[g]))));
+            std::size_t const half = each.size() / 2;
+            masks = joined(masks, each[std::slice(0, half, 1)]);
+            noise = joined(noise, each[std::slice(half, half, 1)]);
+            all = joined(all, y[g]);
+        }
+        Values const voice = product("Score", 1, rectified(product("Score", 0, all)));
+        return sigmoid(joined(joined(masks, noise), voice));
+    }
+
+private:
+    using Groups = std::vector<Values>;
+
+    Values vector(std::string const& name) const {
+        return valuesOf(weight_.getReference<Vector>(name));
+    }
+    Values entry(std::string const& name, std::size_t i) const {
+        return valuesOf(weight_.getReference<Vectors>(name)[i]);
+    }
+    Values product(std::string const& name, Values const& x) const {
+        return affine(x, weight_.getReference<Matrix>("Weight" + name),
+                      weight_.getReference<Vector>("Bias" + name));
+    }
+    Values product(std::string const& name, std::size_t i, Values const& x) const {
+        return affine(x, weight_.getReference<Matrices>("Weight" + name)[i],
+                      weight_.getReference<Vectors>("Bias" + name)[i]);
+    }
+    static Values rectified(Values const& x) {
+        return x.apply([](double v) { return std::max(v, 0.0); });
+    }
+    static Values normed(Values x, Values const& gain, Values const& bias) {
+        x -= x.sum() / static_cast<double>(x.size());
+        return x / std::sqrt(meanSquare(x) + 1e-5) * gain + bias;
+    }
+    Values gated(std::string const& name, std::size_t i, Values const& x, Values const& h) const {
+        Values const a = product(name + "In", i, x);
+        Values const b = product(name + "State", i, h);
+        auto const gate = [&](std::size_t g) { return std::slice(g * h.size(), h.size(), 1); };
+        Values const z = sigmoid(Values(a[gate(1)]) + Values(b[gate(1)]));
+        Values const r = sigmoid(Values(a[gate(0)]) + Values(b[gate(0)]));
+        Values const n = std::tanh(Values(a[gate(2)]) + r * Values(b[gate(2)]));
+        return (1.0 - z) * n + z * h;
+    }
+    Values seenBy(std::size_t group, Values const& x) const {
+        int const bands = static_cast<int>(weight_.getReference<Vector>("BandWidths").size());
+        int const own = weight_.getReference<int>("GroupBands");
+        int const reach = weight_.getReference<int>("GroupReach");
+        int const first = static_cast<int>(group) * own;
+        History seen;
+        for (int kind = 0; kind < static_cast<int>(x.size()); kind += bands) {
+            for (int k = first - reach; k < first + own + reach; ++k)
+                seen.push_back(k < 0 || k >= bands ? 0.0 : x[static_cast<std::size_t>(kind + k)]);
+        }
+        return valuesOf(seen);
+    }
+    void runAcross(std::size_t block, Groups& y) const {
+        Groups both(y.size());
+        for (std::size_t direction = 0; direction < 2; ++direction) {
+            std::size_t const i = 2 * block + direction;
+            Values h(weight_.getReference<Matrices>("WeightGroupsState")[i].rows);
+            for (std::size_t step = 0; step < y.size(); ++step) {
+                std::size_t const g = direction == 0 ? step : y.size() - 1 - step;
+                Values const x =
+                    normed(y[g], entry("GainGroupsNorm", block), entry("BiasGroupsNorm", block));
+                h = gated("Groups", i, x, h);
+                both[g] = joined(both[g], h);
+            }
+        }
+        for (std::size_t g = 0; g < y.size(); ++g) y[g] += product("GroupsOut", block, both[g]);
+    }
+
+    Weight const& weight_;
+    std::vector<Groups> states_;
+};
+
 // Tunable parameters by name, flags as 0 and 1.
 using Tunables = std::map<std::string, double>;
 
@@ -210,6 +319,25 @@ public:
         input_.assign(hop_, 0.0);
         output_.assign(delayMs.at(modelMs).at(sessionMs) * rateHz_ / 1000, 0.0);
 
+        for (std::size_t i = 0; i < length_; ++i) {
+            double const part = static_cast<double>(i) / static_cast<double>(length_);
+            synthesis_[i] = generation == 1
+                                ? (1.0 - std::abs(2.0 * part - 1.0)) / analysis_[i]
+                                : std::sin(kPi / 2.0 * std::pow(std::sin(kPi * part), 2));
+        }
+        if (generation > 1) analysis_ = synthesis_;
+        if (generation >= 6 && on("ENABLE_BACKGROUND_SPEAKER_FIX"))
+            speaker_.emplace(t_, static_cast<double>(modelMs));
+        if (generation == 10) {
+            network_.emplace(weight);
+            std::size_t at = 0;
+            for (float const width : weight.getReference<Vector>("BandWidths")) {
+                groups_.emplace_back(at, static_cast<std::size_t>(width), 1);
+                at += groups_.back().size();
+            }
+            powerBefore_.resize(groups_.size());
+            return;
+        }
         // The width doubles each time the read position reaches twice the start of the octave.
         std::size_t const bins = number("FiltrEnd") - begin_;
         std::size_t const depth =
@@ -220,15 +348,6 @@ public:
             if (at == 2 * octave) width *= 2, octave = at;
             groups_.emplace_back(begin_ + at, width, 1);
         }
-        for (std::size_t i = 0; i < length_; ++i) {
-            double const part = static_cast<double>(i) / static_cast<double>(length_);
-            synthesis_[i] = generation == 1
-                                ? (1.0 - std::abs(2.0 * part - 1.0)) / analysis_[i]
-                                : std::sin(kPi / 2.0 * std::pow(std::sin(kPi * part), 2));
-        }
-        if (generation > 1) analysis_ = synthesis_;
-        if (generation == 6 && on("ENABLE_BACKGROUND_SPEAKER_FIX"))
-            speaker_.emplace(t_, static_cast<double>(modelMs));
         frames_.assign(number("PreviewFrames"), Values(groups_.size()));
         logFrames_.assign(10, Values(groups_.size()));
         auto const& layers = weight.getReference<Matrices>("WeightNonLinear");
@@ -246,7 +365,7 @@ public:
             double* const sum = output_.data() + output_.size() - length_;
             for (std::size_t i = 0; i < length_; ++i) sum[i] += cleaned[i];
             double const removed = meanSquare(in[std::slice(0, hop_, 1)] - Values(sum, hop_));
-            noisePower_ = 0.9 * noisePower_ + 0.1 * removed;
+            noisePower_ = 0.9 * noisePower_ + 0.1 * (network_ ? noise_ : removed);
             input_.erase(input_.begin(), input_.begin() + static_cast<long>(hop_));
         }
         Values const out(output_.data(), frame.size());
@@ -255,6 +374,8 @@ public:
     }
     // Level of what has been removed so far, dB.
     double noiseLevelDb() const { return 10.0 * std::log10(noisePower_ + 1e-6); }
+    // Of generation 10.
+    double voiceScore() const { return voice_; }
 
 private:
     std::size_t number(char const* name) const {
@@ -262,14 +383,20 @@ private:
     }
     bool on(char const* flag) const { return t_.at(flag) != 0.0; }
 
-    // The logarithms of the bands, with the level of the sound taken out.
-    Values bandsOf(Values const& in, Spectrum const& spectrum) {
+    // What brings the sound to the level of reference.
+    double gainFor(Values const& in) {
         double gain = 1.0;
         if (generation_ >= 3 && on("ENABLE_RESCALE")) {
             double const energy =
                 level_.next(meanSquare(in), rateHz_ * 3 / hop_, t_.at("RESCALE_REF_EN"));
             if (energy > 1e-6) gain = t_.at("RESCALE_REF_AMPL") / std::sqrt(energy);
         }
+        return gain;
+    }
+
+    // The logarithms of the bands, with the level of the sound taken out.
+    Values bandsOf(Values const& in, Spectrum const& spectrum) {
+        double const gain = gainFor(in);
         Values bands(groups_.size());
         for (std::size_t g = 0; g < bands.size(); ++g) {
             Spectrum const group = spectrum[groups_[g]];
@@ -293,11 +420,50 @@ private:
                               weight_.getReference<Vectors>("BaesNonLinear").back()));
     }
 
+    // The masks of generation 10, which says what is noise, too.
+    Values heard(Values const& in, Spectrum const& spectrum) {
+        double const offset = 1000.0 / std::pow(gainFor(in), 2);
+        std::size_t const bands = groups_.size();
+        Values power(bands);
+        Spectrum turned(bands);
+        for (std::size_t g = 0; g < bands; ++g) {
+            std::size_t const first = groups_[g].start();
+            for (std::size_t k = first; k < first + groups_[g].size(); ++k) {
+                power[g] += std::norm(spectrum[k]);
+                turned[g] += spectrum[k] * std::conj(before_[k]) * (k % 2 == 0 ? 1.0 : -1.0);
+            }
+        }
+        Values const scale = 1.0 / std::sqrt((power + offset) * (powerBefore_ + offset));
+        Values features = std::log(power * (1000.0 / offset) + 1000.0);
+        if (weight_.getReference<Vector>("MU").size() > bands) {
+            Values re(bands);
+            Values im(bands);
+            for (std::size_t g = 0; g < bands; ++g) {
+                re[g] = turned[g].real() * scale[g];
+                im[g] = turned[g].imag() * scale[g];
+            }
+            features = joined(features, joined(re, im));
+        }
+        before_ = spectrum;
+        powerBefore_ = power;
+        Values const answers = network_->answers(features);
+        auto const part = [&](std::size_t i) {
+            return Values(answers[std::slice(i * bands, bands, 1)]);
+        };
+        noise_ = (part(1) * power).sum() * 4.0 / std::pow(static_cast<double>(length_), 2);
+        voice_ = answers[2 * bands];
+        return part(0);
+    }
+
     void shapeMask(Values const& bands, double gateGain) {
         Values seen(mask_.size());
         for (std::size_t g = 0; g < groups_.size(); ++g) seen[groups_[g]] = bands[g];
         for (std::size_t k = 0; k < mask_.size(); ++k) {
             double m = seen[k];
+            if (network_) {
+                mask_[k] = m * gateGain;
+                continue;
+            }
             double const t = (m - 0.05) / 0.05;
             m = on("SMOOT_RM_MODIFY") ? m / (1.0 + std::exp(t)) + m * m / (1.0 + std::exp(-3.0 * t))
                                       : m * m;
@@ -317,9 +483,13 @@ private:
                                                  t_.at("THRESH_CUT_REF_EN"))
                                     : 1.0;
         Spectrum spectrum = dft(windowed);
-        frames_.pop_front();
-        frames_.push_back(bandsOf(in, spectrum));
-        shapeMask(silent ? Values(1.0, groups_.size()) : network(), gateGain);
+        if (network_) {
+            shapeMask(heard(in, spectrum), gateGain);
+        } else {
+            frames_.pop_front();
+            frames_.push_back(bandsOf(in, spectrum));
+            shapeMask(silent ? Values(1.0, groups_.size()) : network(), gateGain);
+        }
         // The inverse as the forward transform of the conjugate, which a real result does not mind.
         for (std::size_t k = 0; k < length_; ++k)
             spectrum[k] = std::conj(spectrum[k]) * mask_[std::min(k, length_ - k)];
@@ -343,7 +513,7 @@ private:
     std::size_t rateHz_ = number("SampleRate");
     std::size_t length_ = number("FrameLength");
     std::size_t hop_ = length_ / 2;
-    std::size_t begin_ = number("FiltrBegin");
+    std::size_t begin_ = generation_ == 10 ? 0 : number("FiltrBegin");
     std::vector<std::slice> groups_;  // the bins of every band
     Values analysis_ = hamming(length_);
     Values synthesis_ = Values(length_);
@@ -355,6 +525,12 @@ private:
     Values mask_ = Values(hop_ + 1);
     History input_, output_;
     double noisePower_ = 0.0;
+
+    std::optional<BandNetwork> network_;
+    Spectrum before_ = Spectrum(length_);
+    Values powerBefore_;
+    double noise_ = 0.0;
+    double voice_ = 0.0;
 };
 
 class VoiceActivity {

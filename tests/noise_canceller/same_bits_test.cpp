@@ -11,6 +11,7 @@
 #include "morva-sdk/morva-ext.h"
 #include "morva-sdk/morva-sdk.h"
 #include "support/captured_output.h"
+#include "support/weight_writer.h"
 
 namespace {
 
@@ -56,11 +57,21 @@ constexpr Row kRows[] = {
     {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xef25d1da53ebb0b8, 0xf765ea975aa6b1a9}},
     {"VAD_weight", Kind::voice, 48000, 6, {0x7b28db1de01a0189, 0xf3eb574eb70f1add}},
     {"noise_level_16k", Kind::level, 44100, 24, {0xd588628ba5057216, 0xe486acf16d9a8a7f}},
+    {"NC_1.0.0", Kind::cleaned, 16000, 12, {0x0cdc00e9c16db94c, 0x7097761402659c7c}},
 };
 // clang-format on
 
+// Made before any mode is set; of widths that fill whole registers and parts.
+std::string const kBandWeight =
+    test_support::randomNcWeight({.version = "NC_1.0.0", .hidden = 20, .gates = 28});
+
+// A file, or the weight above under the name of its version.
 int addModel(std::string const& name) {
     test_support::CapturedOutput const quiet(1);
+    if (name == "NC_1.0.0") {
+        auto const size = static_cast<unsigned>(kBandWeight.size());
+        return Morva_SDK_SetModel_Blob(kBandWeight.data(), size, name.c_str());
+    }
     std::string const file = MORVA_TEST_MODELS + name + ".mvw";
     std::wstring const path(file.begin(), file.end());
     return Morva_SDK_SetModel(path.c_str(), name.c_str());

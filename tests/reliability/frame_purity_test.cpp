@@ -140,16 +140,16 @@ std::function<void()> framesOf(Kind kind, std::string const& model, int hz, int 
 }
 
 // CONTROL_ entries that switch every stage of a version on.
-std::string withEveryStage(std::string version) {
-    auto const weight = test_support::randomNcWeight({.version = version, .timeStamp = version});
-    std::ranges::replace(version, '.', '_');
+std::string withEveryStage(std::string const& version) {
+    test_support::NcShape const shape{.version = version, .timeStamp = version};
+    auto const weight = test_support::randomNcWeight(shape);
     test_support::WeightWriter writer;
     for (std::string const name :
          {"SMOOT_RM_MODIFY", "HIGH_FREQ_SMOOT", "SKIP_FRAME", "VOLUME_UP", "ENABLE_THRESH_CUT",
           "ENABLE_RM_THRESHOLD", "ENABLE_BACKGROUND_SPEAKER_FIX"}) {
-        writer.add("CONTROL_MORVA_" + name + "_v" + version, "t");
+        writer.add("CONTROL_MORVA_" + name + shape.suffix(), "t");
     }
-    return weight + writer.add("CONTROL_MORVA_SMOOT_COEF_v" + version, 0.5F).bytes();
+    return weight + writer.add("CONTROL_MORVA_SMOOT_COEF" + shape.suffix(), 0.5F).bytes();
 }
 
 }  // namespace
@@ -163,10 +163,13 @@ TEST(FramePurity, NoAllocationNoLockNoSystemCall) {
         auto const valued = file[0] == 'V' ? Kind::voice : Kind::level;
         models.emplace_back(file[0] == 'V' || file[0] == 'n' ? valued : Kind::noise, file);
     }
-    for (std::string const version : {"0.0.1", "0.0.2", "0.0.3", "0.0.4", "0.0.5", "0.0.6"}) {
+    for (std::string const version :
+         {"0.0.1", "0.0.2", "0.0.3", "0.0.4", "0.0.5", "0.0.6", "NC_1.0.0"}) {
         Engine::add(version.c_str(), withEveryStage(version));
         models.emplace_back(Kind::noise, version);
     }
+    models.emplace_back(Kind::voice, "NC_1.0.0");
+    models.emplace_back(Kind::level, "NC_1.0.0");
     int const count = std::getenv("MORVA_TEST_FULL") != nullptr ? 100000 : 100;
     for (int const hz : kRates) {
         for (auto const& [kind, model] : models) {

@@ -79,9 +79,10 @@ private:
     std::string bytes_;
 };
 
-// A noise-cancellation weight of version "0.0.1" to "0.0.6". What a generation does not have is
-// left out: reset gate and normalisation before 0.0.6, band compression before 0.0.4, the gate
-// before 0.0.3.
+// A noise-cancellation weight of version "0.0.1" to "0.0.6" or "NC_1.0.0". What a generation does
+// not have is left out: reset gate and normalisation before 0.0.6, band compression before 0.0.4,
+// the gate before 0.0.3. Of NC_1.0.0, H is the number of channels, G of units across the groups,
+// P of kinds of features, L - 1 of blocks, and the band reaches from bin 0 to half the rate.
 struct NcShape {
     std::string version = "0.0.6";
     int sampleRate = 16000;
@@ -96,8 +97,14 @@ struct NcShape {
     unsigned seed = 1;
     std::string modelName = "test";
     std::string timeStamp = "210301";
+    int groupBands = 4;
+    int groupReach = 2;
 
-    int generation() const { return version.back() - '0'; }
+    // 10 for NC_1.0.0.
+    int generation() const { return version.starts_with("NC") ? 10 : version.back() - '0'; }
+    std::string suffix() const {
+        return generation() == 10 ? "_v1_0_0" : "_v0_0_" + std::to_string(generation());
+    }
     int compressedBands() const {
         int const depth = generation() >= 4 ? compressRate : 0;
         return (filtrEnd - filtrBegin) * (depth + 2) >> (depth + 1);
@@ -179,8 +186,7 @@ WeightWriter frontOf(Shape const& shape, std::string_view version) {
 
 // A `matrixGain` of 0 makes every product 0; `outputBias` is what the output layer adds.
 inline std::string ncWeight(NcShape const& shape, float matrixGain, float outputBias) {
-    auto suffix = "_v" + shape.version;
-    std::replace(suffix.begin(), suffix.end(), '.', '_');
+    auto const suffix = shape.suffix();
     int const h = shape.hidden;
     int const inputs = shape.inputs();
     int const k = shape.compressedBands();
@@ -216,10 +222,84 @@ inline std::string ncWeight(NcShape const& shape, float matrixGain, float output
     return writer.bytes();
 }
 
+// The bins of each band, as COMPRESS_RATE makes them of all bins below half the rate.
+inline std::vector<float> bandWidths(NcShape const& shape) {
+    int const single = shape.frameLength / 2 >> shape.compressRate;
+    std::vector<float> widths(static_cast<std::size_t>(single), 1.0F);
+    for (int octave = 1; octave <= shape.compressRate; ++octave) {
+        widths.insert(widths.end(), static_cast<std::size_t>(single / 2),
+                      static_cast<float>(1 << octave));
+    }
+    return widths;
+}
+
+inline std::string bandWeight(NcShape const& shape) {
+    auto const widths = bandWidths(shape);
+    int const bands = static_cast<int>(widths.size());
+    int const groups = bands / shape.groupBands;
+    int const features = shape.previewFrames * bands;
+    int const seen = shape.previewFrames * (shape.groupBands + 2 * shape.groupReach);
+    int const c = shape.hidden;
+    int const a = shape.gates;
+    int const depth = shape.layers - 1;
+    int const decoded = 12;
+    int const scored = 6;
+    RandomValues random(shape.seed);
+    auto writer = frontOf(shape, shape.version);
+    auto const vectors = [&](std::string const& name, int count, int size) {
+        bool const gain = name.starts_with("Gain");
+        writer.add(name, random.vectors(count, size, gain ? 0.5F : -0.5F, gain ? 1.5F : 0.5F));
+    };
+    auto const matrices = [&](std::string const& name, int count, int rows, int cols) {
+        WeightWriter::Matrices list;
+        while (count-- > 0) list.push_back(random.matrix(rows, cols));
+        writer.add(name, list);
+    };
+    auto mean = random.vector(features, -0.3F, 0.3F);
+    auto deviation = random.vector(features, 0.3F, 0.7F);
+    for (std::size_t k = 0; k < widths.size(); ++k) mean[k] += 9.0F, deviation[k] *= 5.0F;
+    writer.add("Step", shape.frameLength / 2)
+        .add("BandWidths", widths)
+        .add("GroupBands", shape.groupBands)
+        .add("GroupReach", shape.groupReach)
+        .add("MU", mean)
+        .add("SD", deviation)
+        .add("WeightGather", random.matrix(seen, c))
+        .add("BiasGather", random.vector(c, -0.5F, 0.5F))
+        .add("WeightPlace", random.matrix(groups, c));
+    if (a > 0) {
+        vectors("GainGroupsNorm", depth, c);
+        vectors("BiasGroupsNorm", depth, c);
+        matrices("WeightGroupsIn", 2 * depth, c, 3 * a);
+        matrices("WeightGroupsState", 2 * depth, a, 3 * a);
+        vectors("BiasGroupsIn", 2 * depth, 3 * a);
+        vectors("BiasGroupsState", 2 * depth, 3 * a);
+        matrices("WeightGroupsOut", depth, 2 * a, c);
+        vectors("BiasGroupsOut", depth, c);
+    }
+    vectors("GainTimeNorm", depth, c);
+    vectors("BiasTimeNorm", depth, c);
+    matrices("WeightTimeIn", depth, c, 3 * c);
+    matrices("WeightTimeState", depth, c, 3 * c);
+    vectors("BiasTimeIn", depth, 3 * c);
+    vectors("BiasTimeState", depth, 3 * c);
+    writer.add("GainNorm", random.vector(c, 0.5F, 1.5F))
+        .add("BiasNorm", random.vector(c, -0.5F, 0.5F))
+        .add("WeightSpread", random.matrix(c + seen, decoded))
+        .add("BiasSpread", random.vector(decoded, -0.5F, 0.5F))
+        .add("WeightOutput", random.matrix(decoded, 2 * shape.groupBands))
+        .add("BiasOutput", random.vector(2 * shape.groupBands, 0.0F, 1.0F))
+        .add("WeightScore",
+             WeightWriter::Matrices{random.matrix(groups * c, scored), random.matrix(scored, 1)})
+        .add("BiasScore", WeightWriter::Vectors{random.vector(scored, -0.5F, 0.5F), {0.2F}});
+    return writer.bytes();
+}
+
 }  // namespace DETAIL
 
 // Random parameters: the mask moves with the signal, nothing saturates.
 inline std::string randomNcWeight(NcShape const& shape) {
+    if (shape.generation() == 10) return DETAIL::bandWeight(shape);
     return DETAIL::ncWeight(shape, 1.0F, 0.5F);
 }
 
