@@ -15,20 +15,20 @@ import numpy as np
 import torch
 from torch import Tensor
 
-from . import mvw, train_noise
+from . import mvw
 from .batches import Batch, MixtureBatches
-from .losses import MaskLoss
+from .convert import layout_of, network_of
+from .losses import LossWeights, MaskLoss
 from .mixing import RECIPES
-from .networks import Network, network_input
+from .networks import Network, log_gains, network_input
 from .spectra import Layout
 from .trainer import keep_freed_memory
 
 Losses = dict[str, float]
 
 
-def judged(logits: Tensor, batch: Batch, layout: Layout, criterion: MaskLoss) -> Losses:
-    gains = 2.0 * torch.nn.functional.logsigmoid(logits)[..., layout.band_of_bin()]
-    loss, terms = criterion(gains, batch)
+def judged(gains: Tensor, batch: Batch, layout: Layout, criterion: MaskLoss) -> Losses:
+    loss, terms = criterion(gains[..., layout.band_of_bin()], batch)
     return {"loss": loss.item(), **terms}
 
 
@@ -38,9 +38,9 @@ def stretches(
 ) -> list[tuple[Losses, Losses]]:
     """Of each of `count` parts: what the network makes of it that has heard everything, and one that began `before`
     frames before."""
-    criterion = MaskLoss(layout, train_noise.LossWeights(), batch.features.device)
+    criterion = MaskLoss(layout, LossWeights(), batch.features.device)
     x = network_input(batch.features, *standard, layout.preview)
-    run = functools.partial(_logits, network)
+    run = functools.partial(_gains, network)
     whole, size, results = run(x), x.shape[1] // count, []
     for number, part in enumerate(batch.parts(count, 0)):
         first, last = number * size, (number + 1) * size
@@ -50,22 +50,21 @@ def stretches(
     return results
 
 
-def _logits(network: Network, x: Tensor) -> Tensor:
-    return network(x, network.initial_state(len(x)))[0]
+def _gains(network: Network, x: Tensor) -> Tensor:
+    return log_gains(network, network(x, network.initial_state(len(x)))[0])
 
 
-def network_from(source: Path, layout: Layout) -> tuple[Network, Layout, tuple[Tensor, Tensor]]:
-    """From a weight file of the layout's model, or the folder of any run."""
+def network_from(source: Path) -> tuple[Network, Layout, tuple[Tensor, Tensor]]:
+    """From a weight file or the folder of a run."""
     if source.is_dir():
         network, extra = torch.load(source / "best.pt", map_location="cpu", weights_only=False)
         return network, extra["layout"], (torch.tensor(extra["mean"]), torch.tensor(extra["spread"]))
     weight = mvw.read(source)
-    return train_noise.network_of(weight), layout, tuple(torch.from_numpy(weight[key]) for key in ("MU", "SD"))
+    return network_of(weight), layout_of(weight), tuple(torch.from_numpy(weight[key]) for key in ("MU", "SD"))
 
 
 def main(arguments: list[str] | None = None) -> None:
     parser = argparse.ArgumentParser(description=__doc__, formatter_class=argparse.RawDescriptionHelpFormatter)
-    parser.add_argument("model", choices=train_noise.LAYOUTS)
     parser.add_argument("network", type=Path, help="weight file, or folder of a run")
     parser.add_argument("--store", type=Path, required=True)
     parser.add_argument("--recipe", choices=RECIPES, default="plain")
@@ -76,7 +75,7 @@ def main(arguments: list[str] | None = None) -> None:
     args = parser.parse_args(arguments)
     torch.set_num_threads(1)
     keep_freed_memory()
-    network, layout, standard = network_from(args.network, train_noise.LAYOUTS[args.model])
+    network, layout, standard = network_from(args.network)
     count, hop = round(args.seconds / args.stretch), layout.hop / layout.rate
     recipe = replace(RECIPES[args.recipe], seconds=args.seconds)
     source = iter(MixtureBatches(args.store, recipe, 4, 1, 1, "dev"))

@@ -23,7 +23,7 @@ from torch import Tensor, nn
 
 from .batches import Batch
 from .measures import PAUSE_DB
-from .spectra import Layout
+from .spectra import Layout, compress_bands
 
 EXPONENT = 0.3  # of magnitudes in the compressed spectra
 EVEN_UP_TO_HZ = 2000.0  # bins above have less and less say
@@ -35,6 +35,7 @@ SYLLABLE_HOPS = 32
 OFFSET, SYMMETRIC, ASYMMETRIC = 4.41, 0.107, 0.0547
 SPOKEN_DB, SPOKEN_RANGE_DB = -40.0, 10.0  # below a band's loud moments nothing is missed; how that comes up
 MOST_LOST_DB = 30.0
+AUDIBLE = 1e-4  # of a band's mean power
 PREDICTION_ORDER, PREDICTION_FLOOR_DB, UNLIKELIEST = 16, -45.0, 2.0
 
 
@@ -286,6 +287,11 @@ class MaskLoss:
         }
 
 
+def pooled(power: Tensor) -> Tensor:
+    """Means over 0.3 s of powers [B, T]."""
+    return nn.functional.avg_pool1d(power[:, None], 30, 10)[:, 0]
+
+
 class LevelLoss:
     """Loss of the noise-level model: error in dB of the power that the mask removes.
 
@@ -294,7 +300,6 @@ class LevelLoss:
     of the mask loss keeps the model a noise suppressor.
     """
 
-    WINDOW, STRIDE = 30, 10
     FAINTEST = 10**-5.0
 
     def __init__(self, layout: Layout, weights: LossWeights, device: torch.device, mask_share: float = 0.15) -> None:
@@ -308,10 +313,43 @@ class LevelLoss:
         removed = ((1.0 - kept).square() * px).sum(-1)
         noise = (px - 2.0 * pxs + ps).clamp_min(0.0).sum(-1)
         floor = self.FAINTEST * px.sum(-1).mean(1, keepdim=True) + 1e-9
-        error_db = 10.0 * (torch.log10(self._pooled(removed) + floor) - torch.log10(self._pooled(noise) + floor))
+        error_db = 10.0 * (torch.log10(pooled(removed) + floor) - torch.log10(pooled(noise) + floor))
         level = error_db.abs().mean()
         mask, parts = self.mask_loss(log_gain, batch, skip)
         return 0.1 * level + self.mask_share * mask, {"level_error_db": level.item(), **parts}
 
-    def _pooled(self, power: Tensor) -> Tensor:
-        return nn.functional.avg_pool1d(power[:, None], self.WINDOW, self.STRIDE)[:, 0]
+
+class ThreeAnswersLoss:
+    """Loss of a network that answers with masks, shares of noise and a voice score [B, T, 2 K + 1], all as logits."""
+
+    NOISE, VOICE = 0.5, 0.3
+
+    def __init__(self, layout: Layout, weights: LossWeights, device: torch.device) -> None:
+        self.layout = layout
+        self.mask_loss = MaskLoss(layout, weights, device)
+        self.band_of_bin = torch.from_numpy(layout.band_of_bin()).to(device)
+
+    def __call__(self, logits: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
+        mask, noise, voice = logits.split([self.layout.bands, self.layout.bands, 1], -1)
+        loss, parts = self.mask_loss(nn.functional.logsigmoid(mask)[..., self.band_of_bin], batch, skip)
+        share, level = self.noise_errors(noise[:, skip:], batch, skip)
+        score = loss.new_zeros(())
+        if batch.voice is not None:
+            labels, sure = batch.voice[:, skip:], batch.voice_weight[:, skip:]
+            score = nn.functional.binary_cross_entropy_with_logits(voice[:, skip:, 0], labels, sure)
+        total = loss + self.NOISE * (share + 0.1 * level) + self.VOICE * score
+        mask_part = {"mask": loss.item(), "share": share.item(), "level_error_db": level.item(), "voice": score.item()}
+        return total, {**mask_part, **parts}
+
+    def noise_errors(self, logits: Tensor, batch: Batch, skip: int) -> tuple[Tensor, Tensor]:
+        """Of each band's share, where anything is heard, and of the level of all noise in dB over 0.3 s."""
+        px, ps, pxs = batch.noisy_power[:, skip:], batch.speech_power[:, skip:], batch.product[:, skip:]
+        heard = compress_bands(px, self.layout)
+        noise = compress_bands((px - 2.0 * pxs + ps).clamp_min(0.0), self.layout)
+        target = (noise / heard).clamp_max(1.0)
+        audible = (heard > heard.mean(1, keepdim=True) * AUDIBLE).float()
+        entropy = nn.functional.binary_cross_entropy_with_logits(logits, target, audible)
+        floor = LevelLoss.FAINTEST * heard.sum(-1).mean(1, keepdim=True) + 1e-9
+        found, wanted = pooled((torch.sigmoid(logits) * heard).sum(-1)), pooled(noise.sum(-1))
+        level = 10.0 * (torch.log10(found + floor) - torch.log10(wanted + floor)).abs()
+        return entropy, level.mean()

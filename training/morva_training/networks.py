@@ -10,6 +10,7 @@ Shapes: features [B, T, F], state [B, H], results [B, T, K] before the output si
 from __future__ import annotations
 
 import math
+from dataclasses import dataclass
 from typing import List, Tuple
 
 import torch
@@ -173,63 +174,99 @@ class PlainGatedNetwork(nn.Module):
         return (layers[-1] @ self.output + self.output_bias).transpose(0, 1), state
 
 
-class Both(nn.Module):
-    """Recurrence over the bands, both ways, then over time; the weights are those of every band and frame.
+class Block(nn.Module):
+    """Recurrence over the groups of bands, both ways, then over time; the weights are those of every group and frame.
 
-    x [T, B, F, C] to the same shape; states [B * F, C].
+    x [T, B, G, C] to the same shape; states [B * G, C]. Without `across` units groups do not hear of each other.
     """
 
     def __init__(self, channels: int, across: int) -> None:
         super().__init__()
-        self.norms = nn.ModuleList(nn.LayerNorm(channels) for _ in range(2))
-        self.bands = nn.GRU(channels, across, bidirectional=True)
-        self.mixed = nn.Linear(2 * across, channels)
+        self.across = across
+        if across:
+            self.norm_groups = nn.LayerNorm(channels)
+            self.groups = nn.GRU(channels, across, bidirectional=True)
+            self.mixed = nn.Linear(2 * across, channels)
+        self.norm_time = nn.LayerNorm(channels)
         self.time = nn.GRU(channels, channels)
 
     def forward(self, x: Tensor, state: Tensor) -> tuple[Tensor, Tensor]:
-        x = x + self.mixed(recurrent(self.bands, self.norms[0](x), -2))
-        y = recurrent(self.time, self.norms[1](x), 0, state)
+        if self.across:
+            x = x + self.mixed(recurrent(self.groups, self.norm_groups(x), -2))
+        y = recurrent(self.time, self.norm_time(x), 0, state)
         return x + y, y[-1].flatten(0, 1)
 
 
-class BandSharedNetwork(nn.Module):
-    """A network that treats all bands alike: bins are gathered in two steps, recurrent layers run over bands and over
-    time with shared weights, and the way back to single bins sees what the way there saw. No weight version yet.
+@dataclass(frozen=True)
+class Shape:
+    """Of a `BandNetwork`."""
+
+    bands: int  # K
+    features: int  # per band
+    group: int = 4  # bands
+    reach: int = 2  # bands that a group sees beyond its own, on either side
+    channels: int = 32
+    across: int = 16
+    depth: int = 2
+    decoded: int = 48
+    scored: int = 24  # units between all groups and the voice score
+
+
+class BandNetwork(nn.Module):
+    """Network of version NC_1.0.0: neighbouring bands are gathered to groups, recurrent layers run over groups and
+    over time with shared weights, and each group says for each of its bands what to keep and how much is noise. What
+    all groups know together is the voice score.
+
+    Features [B, T, F K], one kind after the other; results [B, T, 2 K + 1]: masks, shares of noise, voice.
     """
 
-    def __init__(self, context: int, bins: int, channels: int = 20, across: int = 12, depth: int = 2) -> None:
+    def __init__(self, shape: Shape) -> None:
         super().__init__()
-        self.context, self.bins, self.channels = context, bins, channels
-        half = channels * 3 // 4
-        self.gather = nn.ModuleList([nn.Linear(5 * context, half), nn.Linear(3 * half, channels)])
-        self.place = nn.Parameter(torch.zeros(bins // 4, channels))  # where in the spectrum a band is
-        self.blocks = nn.ModuleList(Both(channels, across) for _ in range(depth))
-        self.spread = nn.ModuleList([nn.Linear(channels, 2 * half), nn.Linear(half, 2 * half)])
-        self.output = nn.Linear(half + context, 3)  # what a bin says about the one above, itself and the one below
-        nn.init.constant_(self.output.bias, 1.0 / 3.0)
+        self.shape = shape
+        seen, c = (shape.group + 2 * shape.reach) * shape.features, shape.channels
+        self.gather = nn.Linear(seen, c)
+        self.place = nn.Parameter(torch.zeros(shape.bands // shape.group, c))  # where in the spectrum a group is
+        self.blocks = nn.ModuleList(Block(c, shape.across) for _ in range(shape.depth))
+        self.norm = nn.LayerNorm(c)
+        self.spread = nn.Linear(c + seen, shape.decoded)
+        self.output = nn.Linear(shape.decoded, 2 * shape.group)
+        self.score = nn.ModuleList([nn.Linear(len(self.place) * c, shape.scored), nn.Linear(shape.scored, 1)])
+        with torch.no_grad():
+            self.output.bias[: shape.group] = 1.0
+            self.score[1].bias.zero_()
+
+    @property
+    def context(self) -> int:
+        return 1
 
     def initial_state(self, batch: int) -> Tensor:
-        return self.place.new_zeros(len(self.blocks), batch * len(self.place), self.channels)
+        return self.place.new_zeros(len(self.blocks), batch * len(self.place), self.shape.channels)
 
-    @staticmethod
-    def neighbours(x: Tensor, count: int, step: int) -> Tensor:
-        """Windows of `count` bins [..., F / step, count * C] of x [..., F, C]."""
-        size, padded = x.shape[-2], functional.pad(x, (0, 0, count // 2, count // 2))
-        return torch.cat([padded[..., i : i + size : step, :] for i in range(count)], -1)
+    def neighbourhoods(self, x: Tensor) -> Tensor:
+        """What each group sees [T, B, G, F * (group + 2 reach)] of x [T, B, F, K]."""
+        padded = functional.pad(x, (self.shape.reach, self.shape.reach))
+        windows = padded.unfold(-1, self.shape.group + 2 * self.shape.reach, self.shape.group)
+        return windows.transpose(-2, -3).flatten(-2)
 
     def forward(self, x: Tensor, state: Tensor) -> Tuple[Tensor, Tensor]:
-        seen = x.unflatten(-1, (self.context, self.bins)).permute(1, 0, 3, 2)
-        fine = functional.relu(self.gather[0](self.neighbours(seen, 5, 2)))
-        y = functional.relu(self.gather[1](self.neighbours(fine, 3, 2))) + self.place
+        seen = self.neighbourhoods(x.unflatten(-1, (self.shape.features, -1)).transpose(0, 1))
+        y = functional.relu(self.gather(seen) + self.place)
         states = []
         for block, before in zip(self.blocks, state):
             y, after = block(y, before)
             states.append(after)
-        y = functional.relu(self.spread[0](y).unflatten(-1, (2, -1)).flatten(-3, -2) + fine)
-        y = functional.relu(self.spread[1](y).unflatten(-1, (2, -1)).flatten(-3, -2))
-        above, same, below = self.output(torch.cat([y, seen], -1)).unbind(-1)
-        logits = same + functional.pad(above, (1, 0))[..., :-1] + functional.pad(below, (0, 1))[..., 1:]
-        return logits.transpose(0, 1), torch.stack(states)
+        y = self.norm(y)
+        each = self.output(functional.relu(self.spread(torch.cat([y, seen], -1))))
+        masks, noise = (part.flatten(-2) for part in each.split(self.shape.group, -1))
+        voice = self.score[1](functional.relu(self.score[0](y.flatten(-2))))
+        return torch.cat([masks, noise, voice], -1).transpose(0, 1), torch.stack(states)
 
 
-Network = LayerNormGatedNetwork | PlainGatedNetwork | BandSharedNetwork
+Network = LayerNormGatedNetwork | PlainGatedNetwork | BandNetwork
+
+
+def log_gains(network: Network, y: Tensor) -> Tensor:
+    """Natural logarithms of the amplitude gains of the bands [B, T, K] that a noise model's results stand for."""
+    if isinstance(network, BandNetwork):
+        return functional.logsigmoid(y[..., : network.shape.bands])
+    return 2.0 * functional.logsigmoid(y)  # the engine squares the mask

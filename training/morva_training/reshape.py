@@ -2,11 +2,13 @@
 
 from __future__ import annotations
 
+from dataclasses import replace
+
 import torch
 from scipy.linalg import qr
 from torch import Tensor
 
-from .networks import Network, PlainGatedNetwork
+from .networks import BandNetwork, Network, PlainGatedNetwork
 
 NOISE = 0.02  # of a matrix's standard deviation
 
@@ -104,4 +106,18 @@ def with_outputs(network: Network, outputs: int) -> Network:
                 target[..., :kept] = value[..., :kept]
             else:
                 target.copy_(value)
+    return result
+
+
+def with_bands(network: BandNetwork, bands: int) -> BandNetwork:
+    """A network that hears more bands above those of another one: new groups begin as the highest that is known."""
+    if bands == network.shape.bands:
+        return network
+    result = BandNetwork(replace(network.shape, bands=bands))
+    known = len(network.place)
+    values = network.state_dict()
+    score = result.score[0].weight.detach().clone().zero_()
+    score[:, : known * network.shape.channels] = values["score.0.weight"]
+    more = values["place"][-1:].expand(len(result.place) - known, -1)
+    result.load_state_dict({**values, "place": torch.cat([values["place"], more]), "score.0.weight": score})
     return result

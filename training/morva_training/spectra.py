@@ -25,13 +25,20 @@ class Layout:
 
     rate: int
     frame: int
-    compress: int
+    compress: int = 0
     preview: int = 3
     first_bin: int = 0
+    widths: tuple[int, ...] = ()  # bins per band, narrow ones first, where `compress` does not say it
+    advance: bool = False  # features hold each band's phase advance beside its power
 
     @property
     def hop(self) -> int:
         return self.frame // 2
+
+    @property
+    def mixed_at(self) -> int:
+        """Rate of the mixtures that it is trained on, Hz."""
+        return max(self.rate, 32000)
 
     @property
     def bins(self) -> int:
@@ -40,7 +47,12 @@ class Layout:
 
     @property
     def bands(self) -> int:
-        return self.bins * (self.compress + 2) >> (self.compress + 1)
+        return len(self.widths) or self.bins * (self.compress + 2) >> (self.compress + 1)
+
+    @property
+    def features(self) -> int:
+        """Of one frame."""
+        return self.bands * (3 if self.advance else 1)
 
     @property
     def active_frames(self) -> int:
@@ -49,6 +61,8 @@ class Layout:
 
     def band_widths(self) -> np.ndarray:
         """Bins per band: single bins first, then doubling widths, one width per octave."""
+        if self.widths:
+            return np.array(self.widths)
         single = self.bins >> self.compress
         widths = [1] * single
         width, start = 2, single
@@ -67,6 +81,9 @@ class Layout:
 FULL_32K = Layout(rate=32000, frame=640, compress=3)
 SMALL_16K = Layout(rate=16000, frame=320, compress=2)
 SMALL_8K = Layout(rate=8000, frame=160, compress=1)
+# Of version NC_1.0.0: 50 Hz wide bins up to 4.8 kHz, then 200 Hz, and 800 Hz from 8 kHz on.
+BANDS_16K = Layout(rate=16000, frame=320, preview=1, widths=(1,) * 96 + (4,) * 16, advance=True)
+BANDS_48K = Layout(rate=48000, frame=960, preview=1, widths=(1,) * 96 + (4,) * 16 + (16,) * 20, advance=True)
 
 
 def vorbis_window(size: int) -> Tensor:
@@ -142,3 +159,24 @@ def log_features(power: Tensor, gains: Tensor, layout: Layout) -> Tensor:
     """Log band powers [..., T, K] before standardisation."""
     seen = power[..., layout.first_bin : layout.first_bin + layout.bins]
     return torch.log(compress_bands(seen, layout) * gains.square()[..., None] + FEATURE_OFFSET)
+
+
+def phase_advances(spectra: Tensor, gains: Tensor, layout: Layout) -> Tensor:
+    """Real and imaginary parts [..., T, 2 K] of how each band has turned since the frame before, relative to the
+    centres of its bins: a steady tone is near the unit circle, noise anywhere within, silence at zero.
+    """
+    bins = torch.arange(layout.bins, device=spectra.device)
+    seen = spectra[..., layout.first_bin : layout.first_bin + layout.bins]
+    before = nn.functional.pad(torch.view_as_real(seen), (0, 0, 0, 0, 1, 0))[..., :-1, :, :]
+    turned = seen * torch.view_as_complex(before.contiguous()).conj() * (1 - 2 * (bins % 2))
+    power = compress_bands(power_of(seen), layout)
+    offset = (FEATURE_OFFSET / gains.square())[..., None]
+    previous = nn.functional.pad(power, (0, 0, 1, 0))[..., :-1, :]
+    scale = ((power + offset) * (previous + offset)).rsqrt()
+    return torch.cat([compress_bands(part, layout) * scale for part in (turned.real, turned.imag)], -1)
+
+
+def features_of(spectra: Tensor, gains: Tensor, layout: Layout) -> Tensor:
+    """What the network sees of each frame [..., T, F], before standardisation."""
+    logs = log_features(power_of(spectra), gains, layout)
+    return torch.cat([logs, phase_advances(spectra, gains, layout)], -1) if layout.advance else logs

@@ -50,7 +50,7 @@ class Task(ABC):
     def prepared(self, batch: dict[str, Tensor]) -> Iterator[dict[str, Tensor]]:
         """What was drawn as network and loss take it, on the device: one or several parts, in their order.
 
-        The first `lead` frames of a part's features, if there are any, are the last of the part before, whose
+        A part that `goes_on` begins with the last context - 1 frames of the features of the part before, whose
         state goes on.
         """
         yield batch
@@ -58,6 +58,10 @@ class Task(ABC):
     @abstractmethod
     def statistics(self, features: Tensor) -> tuple[Tensor, Tensor]:
         """Mean and spread of features [n, F]."""
+
+    def start_statistics(self, start: Weight, fresh: tuple[Tensor, Tensor]) -> tuple[Tensor, Tensor]:
+        """Mean and spread for a network that starts from a weight file; `fresh` are those of the features."""
+        return torch.from_numpy(start["MU"]), torch.from_numpy(start["SD"])
 
     @abstractmethod
     def network(self, start: Weight | None) -> Network:
@@ -78,15 +82,14 @@ class Task(ABC):
 
     def outputs(self, model: nn.Module, batch: dict[str, Tensor]) -> Tensor:
         """Logits [B, T, K] of the whole pieces."""
-        lead = int(batch.get("lead", 0))
         x = self.inputs(batch)
-        goes_on = lead > 0 and self.state is not None  # a run may begin in the middle of a piece
+        goes_on = batch.get("goes_on", False) and self.state is not None  # a run may begin in the middle of a piece
         y, state = model(x, self.state if goes_on else model.initial_state(len(x)))
         self.state = state.detach().nan_to_num()
         return y
 
     def inputs(self, batch: dict[str, Tensor]) -> Tensor:
-        goes_on = int(batch.get("lead", 0)) > 0
+        goes_on = bool(batch.get("goes_on", False))
         return network_input(batch["features"].to(self.device), self.mean, self.input_scale, self.context, goes_on)
 
     def standardise(self, mean: list[float], spread: list[float]) -> None:
@@ -135,11 +138,10 @@ def train_as(task: Task, rank: int) -> Run:
     seed = args.seed + 7919 * steps_done(args.run) + 104729 * rank
     batches = chain.from_iterable(map(task.prepared, task.batches(seed)))
     start = mvw.read(args.start) if args.start else None
+    some = torch.cat([next(batches)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
+    mean, spread = (together.from_the_first(v) for v in task.statistics(some))
     if start:
-        mean, spread = (torch.from_numpy(start[key]) for key in ("MU", "SD"))
-    else:
-        some = torch.cat([next(batches)["features"].flatten(0, 1) for _ in range(STATISTICS_BATCHES)])
-        mean, spread = (together.from_the_first(v) for v in task.statistics(some))
+        mean, spread = task.start_statistics(start, (mean, spread))
     extra = {"mean": mean.tolist(), "spread": spread.tolist(), "layout": task.layout}
     task.standardise(**{key: extra[key] for key in ("mean", "spread")})
     run = Run(task.network(start).to(task.device), args.run, Schedule(args.steps, args.rate, args.core_minutes), extra)

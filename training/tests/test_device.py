@@ -68,24 +68,24 @@ def test_other_speeds_keep_the_level_and_add_nothing(speed: float) -> None:
     assert spectrum[np.abs(frequency - 7000 * speed) > 40].max() < 30.0
 
 
-@pytest.mark.parametrize("network", [["--hidden", "8"], ["--band-shared"]])
+@pytest.mark.parametrize("network", [["8k", "--hidden", "8"], ["16k", "--band-shared", "--channels", "8"]])
 def test_a_state_that_is_carried_is_that_of_the_whole(
     store: Path, tmp_path: Path, capsys: pytest.CaptureFixture, network: list[str]
 ) -> None:
     """And a run on the device goes on from part to part."""
-    options = ["8k", "--store", store, "--run", tmp_path, "--on-device", "--carry", 3, "--seconds", 1, "--batch", 4]
+    options = ["--store", store, "--run", tmp_path, "--on-device", "--carry", 3, "--seconds", 1, "--batch", 4]
     options += ["--made-hours", 0, "--steps", 4, "--workers", 0, *network]
     arguments = [*map(str, options)]
     task = train_noise.NoiseTask(train_noise.parse(arguments))
     batch = next(iter(task.batches(1)))
     whole, parts = Batch.of(batch, task.layout, CPU), list(task.prepared(batch))
-    bands = task.layout.bands
-    task.standardise([5.0] * bands, [2.0] * bands)
+    count = task.layout.features
+    task.standardise([5.0] * count, [2.0] * count)
     model = task.network(None)
     at_once = task.outputs(model, vars(whole))
     assert torch.allclose(torch.cat([task.outputs(model, part) for part in parts], 1), at_once, atol=1e-4)
     train_noise.main(arguments)
-    drift.main(["8k", str(tmp_path), "--store", str(store), "--seconds", "2", "--stretch", "1", "--pieces", "1"])
+    drift.main([str(tmp_path), "--store", str(store), "--seconds", "2", "--stretch", "1", "--pieces", "1"])
     first, second = capsys.readouterr().out.splitlines()[1:]
     assert first.split()[3:6] == first.split()[6:], "both have heard all there was"
     assert float(second.split()[3]) == pytest.approx(float(second.split()[6]), abs=1e-3), (
