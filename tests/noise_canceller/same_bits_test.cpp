@@ -57,7 +57,7 @@ constexpr Row kRows[] = {
     {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xef25d1da53ebb0b8, 0xf765ea975aa6b1a9}},
     {"VAD_weight", Kind::voice, 48000, 6, {0x7b28db1de01a0189, 0xf3eb574eb70f1add}},
     {"noise_level_16k", Kind::level, 44100, 24, {0xd588628ba5057216, 0xe486acf16d9a8a7f}},
-    {"NC_1.0.0", Kind::cleaned, 16000, 12, {0x0cdc00e9c16db94c, 0x7097761402659c7c}},
+    {"NC_1.0.0", Kind::cleaned, 16000, 12, {0x0cdc00e9c16db94c, 0xef3e82002c928da9}},
 };
 // clang-format on
 
