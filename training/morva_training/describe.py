@@ -11,9 +11,12 @@ from pathlib import Path
 import numpy as np
 
 from . import mvw
+from .convert import BAND_VERSION
 
 
 def described(weight: mvw.Weight) -> dict[str, object]:
+    if bytes(weight["Version"]) == BAND_VERSION:
+        return described_bands(weight)
     voice = b"VAD" in bytes(weight["Version"])
     last = weight["WeightNonLinear"][-1]
     matrices = [m for key, value in weight.items() if key.startswith("Weight") for m in _matrices(value)]
@@ -28,6 +31,25 @@ def described(weight: mvw.Weight) -> dict[str, object]:
         "outputs": last.shape[1],
         "multiply-adds per frame": cost,
         "millions per second": round(cost * frames / 1e6, 1),
+    }
+
+
+def described_bands(weight: mvw.Weight) -> dict[str, object]:
+    """All groups of bands run through the same matrices, but for those of the voice score."""
+    groups, channels = weight["WeightPlace"].shape
+    shared = [k for k in weight if k.startswith("Weight") and k not in ("WeightPlace", "WeightScore")]
+    sizes = {key: sum(m.size for m in _matrices(weight[key])) for key in (*shared, "WeightScore")}
+    cost = groups * sum(sizes[key] for key in shared) + sizes["WeightScore"]
+    return {
+        "version": BAND_VERSION.decode(),
+        "rate": weight["SampleRate"],
+        "frame": weight["FrameLength"],
+        "bands": len(weight["BandWidths"]),
+        "groups": groups,
+        "channels": channels,
+        "blocks": len(weight["WeightTimeIn"]),
+        "multiply-adds per frame": cost,
+        "millions per second": round(cost * weight["SampleRate"] / weight["Step"] / 1e6, 1),
     }
 
 
