@@ -1,5 +1,5 @@
 """What scripts/package made, used as people outside of the project use it: each cleans a recording as MORVA_COMMAND
-(build/release/morva) does. What was not made, and targets that nothing runs here (scripts/runtimes), are skipped.
+(build/release/morva) does. What was not made, and targets that nothing runs here (scripts/run_on), are skipped.
 """
 
 import json
