@@ -78,7 +78,7 @@ def main(arguments: list[str] | None = None) -> None:
     network, layout, standard = network_from(args.network)
     count, hop = round(args.seconds / args.stretch), layout.hop / layout.rate
     recipe = replace(RECIPES[args.recipe], seconds=args.seconds)
-    source = iter(MixtureBatches(args.store, recipe, 4, 1, 1, "dev"))
+    source = iter(MixtureBatches(args.store, recipe, 4, 1, 1, "dev", rate=layout.mixed_at))
     batches = (Batch.of(next(source), layout, torch.device("cpu")) for _ in range(-(-args.pieces // 4)))
     found = [stretches(network, layout, standard, b, count, round(args.before / hop)) for b in batches]
     print("seconds   whole: loss quality pause_db   fresh: loss quality pause_db")

@@ -235,10 +235,6 @@ class BandNetwork(nn.Module):
             self.output.bias[: shape.group] = 1.0
             self.score[1].bias.zero_()
 
-    @property
-    def context(self) -> int:
-        return 1
-
     def initial_state(self, batch: int) -> Tensor:
         return self.place.new_zeros(len(self.blocks), batch * len(self.place), self.shape.channels)
 

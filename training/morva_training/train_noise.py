@@ -152,7 +152,12 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     parser.add_argument("--reuse", type=int, default=4, help="mixtures made of one draw, unless --on-device")
     for term in TERMS:
         parser.add_argument(f"--{term.replace('_', '-')}", type=float, help="weight of this part of the loss")
-    return parser.parse_args(arguments)
+    args = parser.parse_args(arguments)
+    if args.model not in (BAND_LAYOUTS if args.band_shared else LAYOUTS):
+        parser.error(f"{args.model} is {'no' if args.band_shared else 'only a'} --band-shared model")
+    if args.on_device and args.model == "48k":
+        parser.error("a pool holds 32 kHz: 48k is mixed by --workers")
+    return args
 
 
 def main(arguments: list[str] | None = None) -> None:
