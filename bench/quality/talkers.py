@@ -2,16 +2,16 @@
 
     python bench/quality/talkers.py --store STORE none full=models/c6.xs.f.ca03f4.mvw "peer=some-program --flag"
 
-Near talkers are dry or have the early reflections of a room; far ones are heard through whole measured rooms in which the
-direct sound has less energy than the rest (DIRECT_DB), and talk all the time, 10, 15 or 20 dB below. Everything has
-the noise of a quiet room. Systems get the store's rate (`--rate` for another one); what they make is measured below 8 kHz,
-so that no system is told by its rate. IDEAL is no system: the far talker himself comes in 12 dB lower.
+Near talkers are dry or have the early reflections of a room; far ones are heard through whole measured rooms in which
+the direct sound has less energy than the rest (DIRECT_DB), and talk all the time, 10, 15 or 20 dB below. Everything has
+the noise of a quiet room. Systems get the store's rate (`--rate` for another one); what they make is measured below
+8 kHz, so that no system is told by its rate. IDEAL is no system: the far talker himself comes in 12 dB lower.
 
-First table, by distance in level: how far the far talker goes down where only he speaks (the energy of those blocks before
-and after; in pauses, so after the near one's first word; median), the share of cases with 10 dB or more, and the near
-one's PESQ without and with him: what he costs (means). Second table: changes of level, in dB. A near talker speaks aloud,
-then the same words 20 dB lower or whispers them as low: change of the low part, median and worst of the cases, and
-of its half seconds the worst (median of the cases). Then a far talker whom nobody nearer is there to tell from.
+First table, by distance in level: how far the far talker goes down where only he speaks (the energy of those blocks
+before and after, in pauses after the near one's first word; median), the share of cases with 10 dB or more, and the
+near one's PESQ without and with him: what he costs (means). Second table: changes of level, in dB. A near talker speaks
+aloud, then the same words 20 dB lower or whispers them as low: change of the low part, median and worst of the cases,
+and of its half seconds the worst (median of the cases). Then a far talker alone, whom nobody nearer shows to be far.
 """
 
 from __future__ import annotations
@@ -197,10 +197,12 @@ def table_of_far(results: dict[str, list[dict]]) -> str:
     for part, levels in parts.items():
         for system, every in results.items():
             rows = [row for row in every if row["below_db"] in levels]
+            if not rows:
+                continue
             down = column(rows, "down")
             pesq = " | ".join(f"{column(rows, name).mean():.2f}" for name in ("pesq_alone", "pesq", "lost"))
             far = f"{np.median(down):.1f} dB | {100 * np.mean(down >= 10):.0f} %"
-            lines.append(f"| {part} | {system} | {far} | {pesq} | {len(down)} |")
+            lines.append(f"| {part} | {system} | {far} | {pesq} | {np.isfinite(down).sum()} |")
     return "\n".join(lines)
 
 
