@@ -9,8 +9,8 @@
 namespace MORVA::NOISE_CANCELLER {
 namespace {
 
-// Both queues hold ten hops: the longest session frame (40 ms) beside what the hops leave over.
-constexpr std::size_t kQueueHops = 10;
+// Both queues hold the longest session frame (40 ms) beside what the hops leave over.
+constexpr std::size_t kQueueHops = 8;
 
 struct DelayRow {
     std::size_t modelFrameMs;

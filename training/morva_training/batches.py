@@ -17,7 +17,7 @@ from torch.utils.data import IterableDataset
 from .corpus import BASE_RATE
 from .measures import block_labels
 from .mixing import MixtureMaker, Recipe, Waves
-from .spectra import Layout, analyse, features_of, frame_energies, level_gains, power_of
+from .spectra import Layout, analyse, earlier_frames, features_of, frame_energies, level_gains, power_of
 
 SILENCE = 1e-10  # power that every bin has at least
 QUIET = 1e-3  # of a piece's mean power; nobody speaks in a part that is below
@@ -36,6 +36,9 @@ class Batch:
     goes_on: bool = False  # where the part before ended; features then begin with what the context sees of that
     voice: Tensor | None = None  # [B, T] whether somebody speaks in the newer half of a frame
     voice_weight: Tensor | None = None  # [B, T] how sure that is
+    heard: Tensor | None = None  # [B, T, taps, filtered], complex: what a filter adds up
+    speech: Tensor | None = None  # [B, T, filtered], complex
+    ahead: int = 0  # which of the taps is the frame itself
 
     @staticmethod
     @torch.no_grad()
@@ -49,15 +52,21 @@ class Batch:
         gains = level_gains(energies, layout.active_frames, waves["history"] * energies.mean(1))
         reference = torch.where(waves["has_speech"][:, None, None], speech_power, noisy_power)
         scale = (reference.mean((1, 2)).sqrt() + 1e-3)[:, None, None] ** -2
+        cut = slice(0, noisy.shape[1] - layout.ahead)
+        labels = {key: waves[key][:, cut] for key in ("voice", "voice_weight") if key in waves}
+        if layout.taps:
+            low = (spectra[..., : layout.filtered] * scale.sqrt() for spectra in (noisy, speech))
+            labels["heard"] = earlier_frames(next(low), layout.taps)[:, layout.ahead :]
+            labels["speech"] = next(low)[:, cut]
         return Batch(
-            features=features_of(noisy, gains, layout),
-            noisy_power=noisy_power * scale + SILENCE,
-            speech_power=speech_power * scale + SILENCE,
-            product=(noisy.real * speech.real + noisy.imag * speech.imag) * scale,
+            features=features_of(noisy, gains, layout)[:, layout.ahead :],
+            noisy_power=(noisy_power * scale + SILENCE)[:, cut],
+            speech_power=(speech_power * scale + SILENCE)[:, cut],
+            product=((noisy.real * speech.real + noisy.imag * speech.imag) * scale)[:, cut],
             wideband=waves["wideband"],
             has_speech=waves["has_speech"],
-            voice=waves.get("voice"),
-            voice_weight=waves.get("voice_weight"),
+            ahead=layout.ahead,
+            **labels,
         )
 
     def parts(self, count: int, lead: int) -> Iterator[Batch]:
@@ -67,7 +76,8 @@ class Batch:
         for start in range(0, count * frames, frames):
             cut, before = slice(start, start + frames), lead if start else 0
             spoken = loud[:, cut].mean(1) > QUIET * loud.mean(1)
-            labels = [None if each is None else each[:, cut] for each in (self.voice, self.voice_weight)]
+            others = (self.voice, self.voice_weight, self.heard, self.speech)
+            others = [None if each is None else each[:, cut] for each in others]
             yield Batch(
                 self.features[:, start - before : start + frames],
                 self.noisy_power[:, cut],
@@ -76,7 +86,8 @@ class Batch:
                 self.wideband,
                 self.has_speech & spoken,
                 start > 0,
-                *labels,
+                *others,
+                self.ahead,
             )
 
 

@@ -23,7 +23,8 @@ from torch import Tensor, nn
 
 from .batches import Batch
 from .measures import PAUSE_DB
-from .spectra import Layout, compress_bands
+from .networks import filter_factors
+from .spectra import Layout, compress_bands, power_of
 
 EXPONENT = 0.3  # of magnitudes in the compressed spectra
 EVEN_UP_TO_HZ = 2000.0  # bins above have less and less say
@@ -36,6 +37,7 @@ OFFSET, SYMMETRIC, ASYMMETRIC = 4.41, 0.107, 0.0547
 SPOKEN_DB, SPOKEN_RANGE_DB = -40.0, 10.0  # below a band's loud moments nothing is missed; how that comes up
 MOST_LOST_DB = 30.0
 AUDIBLE = 1e-4  # of a band's mean power
+INAUDIBLE = 1e-7, 1e-20  # power beside unit speech that the results of a filter and of masks have at least
 PREDICTION_ORDER, PREDICTION_FLOOR_DB, UNLIKELIEST = 16, -45.0, 2.0
 
 
@@ -217,6 +219,19 @@ class Envelope:
         return torch.log(errors[1] / errors[0]).clamp(0.0, UNLIKELIEST).mean()
 
 
+def result_of(log_gain: Tensor, batch: Batch, factors: Tensor | None) -> tuple[Tensor, Tensor]:
+    """|Y|^2 and Re(Y S*) of what the masks make of X, and on the lowest bins the filter's factors [B, T, taps, bins]
+    of the frames that it spans."""
+    gain = log_gain.exp()
+    after, product = gain.square() * batch.noisy_power + INAUDIBLE[1], gain * batch.product
+    if factors is None:
+        return after, product
+    low = factors.shape[-1]
+    y = gain[..., :low] * batch.heard[:, :, batch.ahead] + (factors * batch.heard).sum(2)
+    both = power_of(y) + INAUDIBLE[0], y.real * batch.speech.real + y.imag * batch.speech.imag
+    return tuple(torch.cat([part, whole[..., low:]], -1) for part, whole in zip(both, (after, product)))
+
+
 class MaskLoss:
     """Loss of gains [B, T, bins], given as natural logarithms, against a batch."""
 
@@ -233,9 +248,11 @@ class MaskLoss:
         trusted = np.where(lower < TRUSTED_EDGE_HZ, 1.0, np.where(lower >= HIGH_EDGE_HZ, HIGH_SHARE, 0.0))
         self.trusted = torch.tensor(trusted, dtype=torch.float32, device=device)
 
-    def __call__(self, log_gain: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
+    def __call__(
+        self, log_gain: Tensor, batch: Batch, skip: int = 0, factors: Tensor | None = None
+    ) -> tuple[Tensor, dict[str, float]]:
         """The loss and its terms; the first `skip` frames, where the memory is empty, do not count."""
-        parts = self.terms(log_gain, batch, skip)
+        parts = self.terms(log_gain, batch, skip, factors)
         w = self.weights
         loss = (
             w.compressed * parts["magnitude"]
@@ -249,24 +266,22 @@ class MaskLoss:
         )
         return loss, {name: part.item() for name, part in parts.items()}
 
-    def terms(self, log_gain: Tensor, batch: Batch, skip: int = 0) -> dict[str, Tensor]:
+    def terms(self, log_gain: Tensor, batch: Batch, skip: int = 0, factors: Tensor | None = None) -> dict[str, Tensor]:
         cut = slice(skip, None)
-        log_gain = log_gain[:, cut]
-        px, ps, product = batch.noisy_power[:, cut], batch.speech_power[:, cut], batch.product[:, cut]
+        px, ps = batch.noisy_power[:, cut], batch.speech_power[:, cut]
+        after, product = (part[:, cut] for part in result_of(log_gain, batch, factors))
         heard = torch.where(batch.wideband[:, None], torch.ones_like(self.trusted), self.trusted)[:, None]
         speech = batch.has_speech.float()
         count = speech.sum().clamp_min(1.0)
-        after = (2.0 * log_gain).exp() * px
 
-        s, x = ps ** (EXPONENT / 2), px ** (EXPONENT / 2)
-        y = (EXPONENT * log_gain).exp() * x
-        cosine = product * torch.rsqrt(px * ps)
+        s, y = ps ** (EXPONENT / 2), after ** (EXPONENT / 2)
+        cosine = product * torch.rsqrt(after * ps)
         bins = heard * self.bin_weight
 
         def mean(values: Tensor) -> Tensor:
             return (bins * values).sum(-1).mean()
 
-        error = (heard * (after - 2.0 * log_gain.exp() * product + ps)).sum((1, 2))
+        error = (heard * (after - 2.0 * product + ps)).sum((1, 2))
         signal = (heard * ps).sum((1, 2))
         ratio = -10.0 * torch.log10((error + 1e-3 * signal + 1e-9) / (signal + 1e-9))
 
@@ -330,8 +345,10 @@ class ThreeAnswersLoss:
         self.band_of_bin = torch.from_numpy(layout.band_of_bin()).to(device)
 
     def __call__(self, logits: Tensor, batch: Batch, skip: int = 0) -> tuple[Tensor, dict[str, float]]:
-        mask, noise, voice = logits.split([self.layout.bands, self.layout.bands, 1], -1)
-        loss, parts = self.mask_loss(nn.functional.logsigmoid(mask)[..., self.band_of_bin], batch, skip)
+        bands = self.layout.bands
+        mask, noise, voice, _ = logits.tensor_split([bands, 2 * bands, 2 * bands + 1], -1)
+        factors = filter_factors(logits, self.layout) if self.layout.taps else None
+        loss, parts = self.mask_loss(nn.functional.logsigmoid(mask)[..., self.band_of_bin], batch, skip, factors)
         share, level = self.noise_errors(noise[:, skip:], batch, skip)
         score = loss.new_zeros(())
         if batch.voice is not None:

@@ -56,6 +56,8 @@ class Recipe:
     # speech
     pause_share: float = 0.5
     pause_seconds: float = 0.5  # mean length
+    soft_share: float = 0.0  # of sentences that are said more softly than the others
+    soft_db: tuple[float, float] = (6.0, 20.0)
     speed_share: float = 0.25
     speed: tuple[float, float] = (0.9, 1.1)
     formant_share: float = 0.0
@@ -66,6 +68,10 @@ class Recipe:
     room_share: float = 0.30
     simulated_room_share: float = 0.4  # of the rooms
     early_only: bool = False  # late reverberation is no part of the wanted speech
+    near_metres: tuple[float, float] = (0.3, 1.0)  # of who speaks while others speak in the background
+    far_metres: tuple[float, float] = (1.5, 6.0)  # of those others
+    far_share: float = 0.0
+    far_db: tuple[float, float] = (10.0, 30.0)  # that they are below the near one
     # noise
     second_noise_share: float = 0.35
     synthetic_share: float = 0.06
@@ -127,7 +133,8 @@ WIDENED = replace(
     overload_share=0.03,
     codec_share=0.12,
 )
-RECIPES = {"plain": PLAIN, "noise": MORE_NOISE, "rooms": MORE_ROOMS, "widened": WIDENED}
+TALKERS = replace(WIDENED, far_share=0.15, soft_share=0.1)
+RECIPES = {"plain": PLAIN, "noise": MORE_NOISE, "rooms": MORE_ROOMS, "widened": WIDENED, "talkers": TALKERS}
 
 
 @dataclass(frozen=True)
@@ -141,6 +148,7 @@ class Waves:
     has_speech: bool
     noisy: bool  # False for a piece that is clean but for a faint background
     late: np.ndarray | None = None  # late reverberation of the speech, where it is not wanted
+    far: bool = False  # the noise is talkers in the background
     channel: Channel = field(default_factory=Channel)
 
     def heard(self) -> np.ndarray:
@@ -150,7 +158,7 @@ class Waves:
     def remixed(self, other: Waves, snr_db: float) -> Waves:
         """This speech in the noise of another piece."""
         noise = at_level(other.noise, self.rate, active_level(self.speech, self.rate), -snr_db)
-        return replace(self, noise=noise, noisy=True)
+        return replace(self, noise=noise, noisy=True, far=other.far)
 
 
 def at_level(samples: np.ndarray, rate: int, reference: float, db: float) -> np.ndarray:
@@ -246,6 +254,8 @@ class MixtureMaker:
             else:
                 piece = self.corpus.read(clip, offset, self.count)
             piece = faded(piece[: self.count - position], self.fade)
+            if self.recipe.soft_share and self.rng.random() < self.recipe.soft_share:
+                piece *= 10 ** (-self.rng.uniform(*self.recipe.soft_db) / 20)
             out[position : position + len(piece)] = piece
             position += len(piece)
             if pauses and self.rng.random() < self.recipe.pause_share:
@@ -256,6 +266,16 @@ class MixtureMaker:
         if self.rooms and self.rng.random() > self.recipe.simulated_room_share:
             return self.rooms[self.rng.integers(len(self.rooms))]
         return simulated_room(self.rng, self.rate)
+
+    def far_talkers(self) -> np.ndarray:
+        """One or two at the other end of a room, mostly with some other noise."""
+        out = np.zeros(self.count, np.float32)
+        for _ in range(1 + int(self.rng.random() < 0.3)):
+            room = simulated_room(self.rng, self.rate, self.recipe.far_metres)
+            out += at_level(convolved(self.talk(self.voice()[1]), [room])[0], self.rate, 1.0, 0.0)
+        if self.rng.random() < 0.7:
+            out += at_level(self.one_noise(), self.rate, 1.0, self.rng.uniform(-30.0, 3.0))
+        return out
 
     def babble(self) -> np.ndarray:
         """Many talkers at similar levels, in two places of a room."""
@@ -376,7 +396,7 @@ class MixtureMaker:
         spectra[-1] *= smooth_gain(self.rng, bins, self.rate, r.equaliser_db)
         return sfft.irfft(spectra, n=self.count, axis=-1)
 
-    def spoken(self, band: str, clips: list[Clip]) -> np.ndarray:
+    def spoken(self, band: str, clips: list[Clip], near: bool = False) -> np.ndarray:
         """[1 or 2, n]: what is wanted of a speaker in a room, and what is not."""
         r = self.recipe
         speech = self.talk(clips)
@@ -387,7 +407,7 @@ class MixtureMaker:
             speech = formants_moved(speech, self.rate, self.rng.uniform(*r.formants), highest)
         if self.rng.random() >= r.room_share:
             return speech[None]
-        room = self.one_room()
+        room = simulated_room(self.rng, self.rate, r.near_metres) if near else self.one_room()
         return convolved(speech, list(parted(room, self.rate)) if r.early_only else [room])
 
     def over_time(self, parts: np.ndarray) -> np.ndarray:
@@ -411,15 +431,16 @@ class MixtureMaker:
         kind = self.rng.random()
         band, clips = self.voice()
         has_speech = kind >= r.noise_only_share
-        speech = self.spoken(band, clips) if has_speech else np.zeros((1, self.count), np.float32)
         clean = has_speech and kind < r.noise_only_share + r.clean_share
-        noise = self.background() if clean else self.noises()
+        far = has_speech and kind >= 1.0 - r.far_share
+        speech = self.spoken(band, clips, far) if has_speech else np.zeros((1, self.count), np.float32)
+        noise = self.background() if clean else self.far_talkers() if far else self.noises()
         *speech, noise = self.over_time(self.equalised(speech, noise))
         level = FULL_SCALE * 10 ** (self.rng.uniform(*r.level_db) / 20)
         if has_speech and self.rng.random() < r.overload_share:
             wanted = FULL_SCALE / self.rng.uniform(0.25, 0.9)
             level = wanted * active_level(speech[0], self.rate) / (np.abs(speech[0]).max() + 1e-3)
-        snr = self.rng.uniform(35.0, 70.0) if clean else r.snr(self.rng)
+        snr = self.rng.uniform(35.0, 70.0) if clean else self.snr(far)
         scale = np.float32(level / (active_level(speech[0], self.rate) + 1e-3))
         return Waves(
             speech=speech[0] * scale,
@@ -429,8 +450,12 @@ class MixtureMaker:
             has_speech=has_speech,
             noisy=not clean,
             late=speech[1] * scale if len(speech) > 1 else None,
+            far=far,
             channel=self.channel(),
         )
+
+    def snr(self, far: bool) -> float:
+        return self.rng.uniform(*self.recipe.far_db) if far else self.recipe.snr(self.rng)
 
     def draws(self, count: int, reuse: int) -> list[Waves]:
         """So many pieces; every draw is used `reuse` times, each time in another noise."""
@@ -439,6 +464,7 @@ class MixtureMaker:
         while len(pieces) < count:
             base = pieces[len(pieces) % drawn]
             if base.noisy and base.has_speech:
-                base = base.remixed(sources[self.rng.integers(len(sources))], self.recipe.snr(self.rng))
+                source = sources[self.rng.integers(len(sources))]
+                base = base.remixed(source, self.snr(source.far))
             pieces.append(base)
         return pieces

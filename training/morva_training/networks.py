@@ -18,6 +18,7 @@ from torch import Tensor, nn
 from torch.nn import functional
 
 from .recurrence import recurrent
+from .spectra import Layout
 
 
 @torch.jit.script
@@ -210,6 +211,9 @@ class Shape:
     depth: int = 2
     decoded: int = 48
     scored: int = 24  # units between all groups and the voice score
+    taps: int = 0  # frames that a complex filter of the lowest bands spans
+    filtered: int = 0  # of the bands
+    kernels: int = 0  # matrices that `spread` is mixed of, frame by frame
 
 
 class BandNetwork(nn.Module):
@@ -217,7 +221,8 @@ class BandNetwork(nn.Module):
     over time with shared weights, and each group says for each of its bands what to keep and how much is noise. What
     all groups know together is the voice score.
 
-    Features [B, T, F K], one kind after the other; results [B, T, 2 K + 1]: masks, shares of noise, voice.
+    Features [B, T, F K], one kind after the other; results [B, T, 2 K + 1]: masks, shares of noise, voice; with `taps`
+    another 2 * taps * filtered: real parts of each tap's factors, then imaginary ones, one tap after the other.
     """
 
     def __init__(self, shape: Shape) -> None:
@@ -230,6 +235,14 @@ class BandNetwork(nn.Module):
         self.norm = nn.LayerNorm(c)
         self.spread = nn.Linear(c + seen, shape.decoded)
         self.output = nn.Linear(shape.decoded, 2 * shape.group)
+        if shape.taps:
+            self.filter = nn.Linear(shape.decoded, 2 * shape.taps * shape.group)
+            nn.init.zeros_(self.filter.weight)
+            nn.init.zeros_(self.filter.bias)
+        if shape.kernels:
+            self.choice = nn.Linear(c, shape.kernels)
+            self.bank = nn.Parameter(self.spread.weight.detach().repeat(shape.kernels, 1, 1))
+            nn.init.uniform_(self.bank, -((c + seen) ** -0.5), (c + seen) ** -0.5)
         self.score = nn.ModuleList([nn.Linear(len(self.place) * c, shape.scored), nn.Linear(shape.scored, 1)])
         with torch.no_grad():
             self.output.bias[: shape.group] = 1.0
@@ -252,13 +265,30 @@ class BandNetwork(nn.Module):
             y, after = block(y, before)
             states.append(after)
         y = self.norm(y)
-        each = self.output(functional.relu(self.spread(torch.cat([y, seen], -1))))
-        masks, noise = (part.flatten(-2) for part in each.split(self.shape.group, -1))
+        spread = functional.relu(self.decoded(torch.cat([y, seen], -1), y))
+        masks, noise = (part.flatten(-2) for part in self.output(spread).split(self.shape.group, -1))
         voice = self.score[1](functional.relu(self.score[0](y.flatten(-2))))
-        return torch.cat([masks, noise, voice], -1).transpose(0, 1), torch.stack(states)
+        results = [masks, noise, voice]
+        if self.shape.taps:
+            factors = self.filter(spread[..., : self.shape.filtered // self.shape.group, :])
+            results += [part.flatten(-2) for part in factors.split(self.shape.group, -1)]
+        return torch.cat(results, -1).transpose(0, 1), torch.stack(states)
+
+    def decoded(self, x: Tensor, y: Tensor) -> Tensor:
+        if not self.shape.kernels:
+            return self.spread(x)
+        shares = functional.softmax(self.choice(y.mean(-2)), -1)
+        return x @ torch.einsum("tbn,noi->tbio", shares, self.bank) + self.spread.bias
 
 
 Network = LayerNormGatedNetwork | PlainGatedNetwork | BandNetwork
+
+
+def filter_factors(y: Tensor, layout: Layout) -> Tensor:
+    """The complex factors [B, T, taps, filtered] of a band network's filter."""
+    last = 2 * layout.taps * layout.filtered
+    values = y[..., y.shape[-1] - last :].tanh().unflatten(-1, (layout.taps, 2, layout.filtered))
+    return torch.complex(*values.unbind(-2))
 
 
 def log_gains(network: Network, y: Tensor) -> Tensor:

@@ -19,7 +19,7 @@ constexpr int LANES = 8;
 #else
 constexpr int LANES = 4;
 #endif
-constexpr int ROWS = 2 * LANES, TILE = 4, CHUNK = 8;
+constexpr int ROWS = 2 * LANES, OUTS = 8, TILE = 4, CHUNK = 8;
 
 using Vector = float __attribute__((vector_size(4 * LANES)));
 using Whole = std::int32_t __attribute__((vector_size(4 * LANES)));
@@ -65,10 +65,10 @@ public:
     Packed(const float* matrix, int outs, int ins, int outStep, int inStep)
         : outs_(outs),
           ins_(ins),
-          values_(static_cast<std::size_t>((outs + TILE - 1) / TILE * TILE) * ins) {
+          values_(static_cast<std::size_t>((outs + OUTS - 1) / OUTS * OUTS) * ins) {
         for (int out = 0; out < outs; out++) {
             for (int in = 0; in < ins; in++) {
-                values_[(out / TILE * ins + in) * TILE + out % TILE] =
+                values_[(out / OUTS * ins + in) * OUTS + out % OUTS] =
                     matrix[out * outStep + in * inStep];
             }
         }
@@ -77,17 +77,25 @@ public:
     /// sums[out] += matrix * x; `sums` has room for whole tiles.
     void product(const Pair* x, Pair* sums) const {
         const float* weights = values_.data();
-        for (int out = 0; out < outs_; out += TILE) {
-            Pair sum[TILE];
-            std::copy_n(sums + out, TILE, sum);
-            for (int in = 0; in < ins_; in++, weights += TILE) {
-#pragma GCC unroll 4
-                for (int i = 0; i < TILE; i++) {
-                    sum[i].low += weights[i] * x[in].low;
-                    sum[i].high += weights[i] * x[in].high;
+        for (int out = 0; out < outs_; out += OUTS) {
+            Vector low[OUTS], high[OUTS];
+#pragma GCC unroll 8
+            for (int i = 0; i < OUTS; i++) {
+                low[i] = sums[out + i].low;
+                high[i] = sums[out + i].high;
+            }
+            for (int in = 0; in < ins_; in++, weights += OUTS) {
+                const Vector left = x[in].low, right = x[in].high;
+#pragma GCC unroll 8
+                for (int i = 0; i < OUTS; i++) {
+                    low[i] += weights[i] * left;
+                    high[i] += weights[i] * right;
                 }
             }
-            std::copy_n(sum, TILE, sums + out);
+#pragma GCC unroll 8
+            for (int i = 0; i < OUTS; i++) {
+                sums[out + i] = {low[i], high[i]};
+            }
         }
     }
 
@@ -104,7 +112,7 @@ public:
 
     int outs() const { return outs_; }
 
-    static int padded(int count) { return (count + TILE - 1) / TILE * TILE; }
+    static int padded(int count) { return (count + OUTS - 1) / OUTS * OUTS; }
 
     /// Adds `steps` steps of a [steps][padded outs] and b [steps][padded ins].
     void add(const Pair* a, const Pair* b, int steps) {
@@ -149,9 +157,47 @@ private:
     std::vector<Vector> sums_;
 };
 
+/// One step in which blocks of `apart` rows and columns change places, of LANES vectors.
+template <int apart>
+void swapBlocks(Vector* rows) {
+    Whole upper, lower;
+    for (int lane = 0; lane < LANES; lane++) {
+        const bool right = (lane & apart) != 0;
+        upper[lane] = right ? LANES + lane - apart : lane;
+        lower[lane] = right ? LANES + lane : lane + apart;
+    }
+    for (int row = 0; row < LANES; row++) {
+        if ((row & apart) == 0) {
+            const Vector above = rows[row], below = rows[row + apart];
+            rows[row] = __builtin_shuffle(above, below, upper);
+            rows[row + apart] = __builtin_shuffle(above, below, lower);
+        }
+    }
+    if constexpr (apart > 1) {
+        swapBlocks<apart / 2>(rows);
+    }
+}
+
+/// LANES values of each of as many rows, `stride` apart: rows and columns change places.
+void transposed(const float* source, long stride, Vector* block) {
+    for (int row = 0; row < LANES; row++) {
+        std::memcpy(block + row, source + row * stride, sizeof(Vector));
+    }
+    swapBlocks<LANES / 2>(block);
+}
+
 /// `count` values of each of `rows` rows, `stride` apart, side by side.
 void gather(const float* source, long stride, int rows, int count, Pair* to) {
-    for (int i = 0; i < count; i++) {
+    int first = 0;
+    for (; rows == ROWS && first + LANES <= count; first += LANES) {
+        Vector low[LANES], high[LANES];
+        transposed(source + first, stride, low);
+        transposed(source + LANES * stride + first, stride, high);
+        for (int i = 0; i < LANES; i++) {
+            to[first + i] = {low[i], high[i]};
+        }
+    }
+    for (int i = first; i < count; i++) {
         alignas(Pair) float lanes[ROWS] = {};
         for (int row = 0; row < rows; row++) {
             lanes[row] = source[row * stride + i];
@@ -161,8 +207,32 @@ void gather(const float* source, long stride, int rows, int count, Pair* to) {
 }
 
 template <bool Add>
+void store(Vector value, float* target) {
+    if constexpr (Add) {
+        Vector before;
+        std::memcpy(&before, target, sizeof before);
+        value += before;
+    }
+    std::memcpy(target, &value, sizeof value);
+}
+
+template <bool Add>
 void scatter(const Pair* from, long stride, int rows, int count, float* target) {
-    for (int i = 0; i < count; i++) {
+    int first = 0;
+    for (; rows == ROWS && first + LANES <= count; first += LANES) {
+        Vector low[LANES], high[LANES];
+        for (int i = 0; i < LANES; i++) {
+            low[i] = from[first + i].low;
+            high[i] = from[first + i].high;
+        }
+        swapBlocks<LANES / 2>(low);
+        swapBlocks<LANES / 2>(high);
+        for (int row = 0; row < LANES; row++) {
+            store<Add>(low[row], target + row * stride + first);
+            store<Add>(high[row], target + (LANES + row) * stride + first);
+        }
+    }
+    for (int i = first; i < count; i++) {
         alignas(Pair) float lanes[ROWS];
         std::memcpy(lanes, from + i, sizeof lanes);
         for (int row = 0; row < rows; row++) {

@@ -2,13 +2,12 @@
 
 from __future__ import annotations
 
-from dataclasses import replace
 
 import torch
 from scipy.linalg import qr
 from torch import Tensor
 
-from .networks import BandNetwork, Network, PlainGatedNetwork
+from .networks import BandNetwork, Network, PlainGatedNetwork, Shape
 
 NOISE = 0.02  # of a matrix's standard deviation
 
@@ -109,15 +108,22 @@ def with_outputs(network: Network, outputs: int) -> Network:
     return result
 
 
-def with_bands(network: BandNetwork, bands: int) -> BandNetwork:
-    """A network that hears more bands above those of another one: new groups begin as the highest that is known."""
-    if bands == network.shape.bands:
+def grown(network: BandNetwork, shape: Shape) -> BandNetwork:
+    """A network with more bands above those of another one, more blocks or a longer filter, that begins as what it was:
+    new groups like the highest that is known, new blocks and taps without a say.
+    """
+    if shape == network.shape:
         return network
-    result = BandNetwork(replace(network.shape, bands=bands))
-    known = len(network.place)
-    values = network.state_dict()
+    result = BandNetwork(shape)
+    known, values = len(network.place), network.state_dict()
+    fresh = {key: value for key, value in result.state_dict().items() if key not in values}
+    for key, value in fresh.items():
+        if ".mixed." in key:
+            value.zero_()
+        elif ".time." in key:
+            value[2 * shape.channels :] = 0.0  # of the candidate: the state stays where it is, at nothing
     score = result.score[0].weight.detach().clone().zero_()
-    score[:, : known * network.shape.channels] = values["score.0.weight"]
+    score[:, : known * shape.channels] = values["score.0.weight"]
     more = values["place"][-1:].expand(len(result.place) - known, -1)
-    result.load_state_dict({**values, "place": torch.cat([values["place"], more]), "score.0.weight": score})
+    result.load_state_dict({**values, **fresh, "place": torch.cat([values["place"], more]), "score.0.weight": score})
     return result

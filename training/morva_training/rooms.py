@@ -36,10 +36,10 @@ def _reflections(rng: np.random.Generator, rate: int, size: np.ndarray, distance
     return sfft.irfft(np.sum(sfft.rfft(trains) * dulling ** np.arange(5)[:, None], axis=0), n=count)
 
 
-def simulated_room(rng: np.random.Generator, rate: int) -> np.ndarray:
-    """A room response, the direct sound first and of height one; near and far talkers, dead and live rooms."""
+def simulated_room(rng: np.random.Generator, rate: int, metres: tuple[float, float] = (0.3, 3.6)) -> np.ndarray:
+    """A room response, the direct sound first and of height one; talkers so far away, dead and live rooms."""
     size = rng.uniform([2.0, 1.8, 2.2], [9.0, 7.0, 3.6])
-    distance = 0.3 * 12.0 ** rng.random()
+    distance = metres[0] * (metres[1] / metres[0]) ** rng.random()
     t60 = 0.12 * 6.0 ** rng.random()
     volume, surface = float(np.prod(size)), 2 * float(size[0] * size[1] + size[1] * size[2] + size[0] * size[2])
     absorbed = min(0.9, 0.161 * volume / (surface * t60))

@@ -30,6 +30,8 @@ class Layout:
     first_bin: int = 0
     widths: tuple[int, ...] = ()  # bins per band, narrow ones first, where `compress` does not say it
     advance: bool = False  # features hold each band's phase advance beside its power
+    taps: int = 0  # frames that a filter of single bins spans, the newest that the network sees first
+    ahead: int = 0  # frames that the network sees beyond the one that it answers for
 
     @property
     def hop(self) -> int:
@@ -53,6 +55,11 @@ class Layout:
     def features(self) -> int:
         """Of one frame."""
         return self.bands * (3 if self.advance else 1)
+
+    @property
+    def filtered(self) -> int:
+        """Bins that are bands of their own, where a filter over a few frames adds to the mask."""
+        return self.widths.count(1) if self.taps else 0
 
     @property
     def active_frames(self) -> int:
@@ -153,6 +160,17 @@ def compress_bands(power: Tensor, layout: Layout) -> Tensor:
         parts.append(power[..., first:last].unflatten(-1, (-1, int(width))).sum(-1))
         first = last
     return torch.cat(parts, -1)
+
+
+def earlier_frames(spectra: Tensor, taps: int) -> Tensor:
+    """[B, T, taps, bins]: each frame and those before it, turned as a tone in the middle of its bin goes on."""
+    bins = torch.arange(spectra.shape[-1], device=spectra.device)
+    if not taps:
+        return spectra[:, :, None][:, :, :0]
+    padded = torch.cat([spectra.new_zeros(len(spectra), taps - 1, spectra.shape[-1]), spectra], 1)
+    frames = padded.unfold(1, taps, 1).flip(-1).transpose(-1, -2)
+    turned = 1 - 2 * (bins * torch.arange(taps, device=spectra.device)[:, None] % 2)
+    return frames * turned
 
 
 def log_features(power: Tensor, gains: Tensor, layout: Layout) -> Tensor:

@@ -20,7 +20,7 @@ from .mixing import RECIPES, Recipe
 from .mvw import Weight
 from .networks import BandNetwork, LayerNormGatedNetwork, Network, PlainGatedNetwork, Shape, log_gains
 from .pool import Pool
-from .reshape import with_bands, widened
+from .reshape import grown, widened
 from .scenes import SceneMaker
 from .spectra import BANDS_16K, BANDS_48K, FULL_32K, SMALL_8K, SMALL_16K, Layout
 
@@ -36,12 +36,12 @@ LEVEL_CHANGES = {
 }
 FULL_BAND = {"band_limit_hz": (3400.0, 20000.0), "converter_share": 0.2}
 TERMS = tuple(vars(LossWeights()))
-SHAPES = ("channels", "across", "depth", "decoded")
+SHAPES = ("channels", "across", "depth", "decoded", "kernels")
 
 
 def band_layout(args: argparse.Namespace) -> Layout:
     """With as many narrow bands as asked for; the others have four times their width."""
-    layout = replace(BAND_LAYOUTS[args.model], advance=not args.no_advance)
+    layout = replace(BAND_LAYOUTS[args.model], advance=not args.no_advance, taps=args.taps, ahead=args.ahead)
     if args.narrow is None:
         return layout
     rest = [w for w in layout.widths if w > 4]
@@ -96,15 +96,19 @@ class NoiseTask(trainer.Task):
         if start:
             network = network_of(start)
             if isinstance(network, BandNetwork):
-                return with_bands(network, self.layout.bands)
+                return grown(network, replace(network.shape, **self.asked(), bands=self.layout.bands))
             return widened(network, self.args.hidden or network.hidden)
         if self.args.band_shared:
             per_band = self.layout.preview * self.layout.features // self.layout.bands
-            asked = {name: getattr(self.args, name) for name in SHAPES if getattr(self.args, name) is not None}
-            return BandNetwork(Shape(self.layout.bands, per_band, **asked))
+            return BandNetwork(Shape(self.layout.bands, per_band, **self.asked()))
         kind = PlainGatedNetwork if self.args.plain else LayerNormGatedNetwork
         features = self.layout.preview * self.layout.bands
         return kind(features, self.args.hidden or HIDDEN[self.args.model], self.layout.bands)
+
+    def asked(self) -> dict[str, int]:
+        """What of a shape is asked for."""
+        given = {name: getattr(self.args, name) for name in SHAPES if getattr(self.args, name) is not None}
+        return given | {"taps": self.layout.taps, "filtered": self.layout.filtered}
 
     def loss(self, model: nn.Module, batch: dict[str, Tensor]) -> tuple[Tensor, dict[str, float]]:
         logits, skipped = self.outputs(model, batch), 0 if batch["goes_on"] else self.skipped
@@ -141,6 +145,8 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     for name in SHAPES:
         parser.add_argument(f"--{name}", type=int, help="of such a network")
     parser.add_argument("--narrow", type=int, help="of its bands are single bins")
+    parser.add_argument("--taps", type=int, default=0, help="frames that its filter of those bins spans")
+    parser.add_argument("--ahead", type=int, default=0, help="frames that it sees beyond the one it answers for")
     parser.add_argument("--no-advance", action="store_true", help="it does not see how phases go on")
     parser.add_argument("--level", action="store_true", help="train for the level of the removed noise")
     parser.add_argument("--recipe", choices=RECIPES, default="plain", help="how mixtures are drawn")
@@ -155,6 +161,8 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
     args = parser.parse_args(arguments)
     if args.model not in (BAND_LAYOUTS if args.band_shared else LAYOUTS):
         parser.error(f"{args.model} is {'no' if args.band_shared else 'only a'} --band-shared model")
+    if args.out and (args.taps or args.ahead or args.kernels):
+        parser.error("the engine has no filter, look-ahead or mixed kernels: they are there to be compared")
     if args.on_device and args.model == "48k":
         parser.error("a pool holds 32 kHz: 48k is mixed by --workers")
     return args

@@ -107,6 +107,15 @@ def test_drawn_and_remixed_ratios_are_measured_alike(store: Path, snr: float) ->
     assert first.remixed(second, snr).speech is first.speech
 
 
+def test_talkers_in_the_background_stay_below_the_near_one(store: Path) -> None:
+    """Also in the speech of other pieces, whatever ratios noise may have."""
+    pieces = maker(store, far_share=0.5, snr_db=(-5.0, 0.0), second_noise_share=0.0).draws(16, 2)
+    assert {waves.far for waves in pieces} == {True, False}
+    for waves in pieces:
+        ratio = 20 * np.log10(active_level(waves.speech, 32000) / active_level(waves.noise, 32000))
+        assert (9.9 < ratio < 30.1) if waves.far else ratio < 0.1
+
+
 def test_pieces_without_speech_and_without_noise(store: Path) -> None:
     for seed in range(4):  # whoever would have spoken: nobody is heard, and all bands are known
         nobody = maker(store, seed, noise_only_share=1.0).draw()

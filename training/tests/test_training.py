@@ -4,6 +4,7 @@ from __future__ import annotations
 
 import json
 import socket
+from dataclasses import replace
 from pathlib import Path
 
 import numpy as np
@@ -16,13 +17,13 @@ from morva_training import clean, mvw, together, train_noise, train_voice
 from morva_training.convert import network_of
 from morva_training.loop import Run, Schedule
 from morva_training.optimisers import orthogonalised
-from morva_training.reshape import with_bands
+from morva_training.reshape import grown
 from morva_training.spectra import BANDS_16K, BANDS_48K
 
 
-def run(program, store: Path, folder: Path, out: Path, *arguments: object) -> None:
-    common = ("--store", store, "--run", folder, "--out", out, "--batch", 6, "--rate", 0.01, "--workers", 0)
-    program.main([*map(str, (*arguments, *common))])
+def run(program, store: Path, folder: Path, out: Path | None, *arguments: object) -> None:
+    common = ("--store", store, "--run", folder, "--batch", 6, "--rate", 0.01, "--workers", 0)
+    program.main([*map(str, (*arguments, *common, *(("--out", out) if out else ())))])
 
 
 def entries(folder: Path, key: str) -> list[float]:
@@ -47,7 +48,7 @@ def test_noise_model_learns_resumes_and_grows(store: Path, tmp_path: Path) -> No
 
 
 def test_network_shared_over_bands_learns_and_cleans(store: Path, tmp_path: Path) -> None:
-    """Frames do not depend on later ones; a network for 48 kHz starts from one for 16 kHz."""
+    """Frames do not depend on later ones; one for 48 kHz, with more blocks and a filter, starts from one for 16 kHz."""
     out, small = tmp_path / "bands.mvw", ("--channels", 8, "--across", 4, "--decoded", 8)
     run(train_noise, store, tmp_path, out, "16k", "--band-shared", *small, "--steps", 12)
     losses = entries(tmp_path, "dev_loss")
@@ -60,11 +61,20 @@ def test_network_shared_over_bands_learns_and_cleans(store: Path, tmp_path: Path
     clean.main([str(tmp_path / name) for name in ("", "in.wav", "out.wav")])
     result, _ = soundfile.read(tmp_path / "out.wav")
     assert 0 < np.std(result) < 0.1 and len(result) == 8000
-    wider = with_bands(network, BANDS_48K.bands)
+    wider = grown(network, replace(network.shape, bands=BANDS_48K.bands, depth=4, taps=2, filtered=96))
     low, y = slice(0, BANDS_16K.bands - 4), torch.zeros(1, 3, 3, BANDS_48K.bands)
     y[..., : BANDS_16K.bands] = x[:1, :3].unflatten(-1, (3, -1))
     known, more = (n(v, n.initial_state(1))[0][..., low] for n, v in ((network, x[:1, :3]), (wider, y.flatten(-2))))
     assert torch.allclose(known[..., :80], more[..., :80], atol=0.5)
+
+
+def test_parts_that_are_only_compared_learn(store: Path, tmp_path: Path) -> None:
+    parts = ("--channels", 8, "--taps", 2, "--ahead", 1, "--kernels", 2)
+    run(train_noise, store, tmp_path, None, "16k", "--band-shared", *parts, "--steps", 12)
+    ratios = entries(tmp_path, "dev_ratio_db")
+    assert ratios[-1] > ratios[0] and entries(tmp_path, "dev_loss")[-1] < entries(tmp_path, "dev_loss")[0]
+    with pytest.raises(SystemExit):
+        run(train_noise, store, tmp_path, tmp_path / "x.mvw", "16k", "--band-shared", *parts, "--steps", 0)
 
 
 def test_level_model_with_its_own_loss_weights(store: Path, tmp_path: Path) -> None:
