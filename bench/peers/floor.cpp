@@ -74,6 +74,26 @@ double productRate() {
     return 2.0 * 8.0 * kChains * kTimes / (cpuSeconds() - start);
 }
 
+// Calls add(matrix, times) for each of the network's matrices, `times` of which a hop multiplies
+// by: those of a band network run through once for every group of bands.
+template <class Add>
+void forEachMatrix(MORVA::WEIGHTS::Weight const& weight, Add&& add) {
+    auto const place = weight.values().find<Matrix>("WeightPlace");
+    double const groups = place ? static_cast<double>(place->rows) : 1.0;
+    for (char const* name :
+         {"WeightGRU", "WeightGRU_reset", "WeightGather", "WeightSpread", "WeightOutput"}) {
+        if (auto const matrix = weight.values().find<Matrix>(name)) add(*matrix, groups);
+    }
+    for (char const* name :
+         {"WeightLinear", "WeightNonLinear", "WeightGroupsIn", "WeightGroupsState",
+          "WeightGroupsOut", "WeightTimeIn", "WeightTimeState", "WeightScore"}) {
+        auto const list = weight.values().find<std::vector<Matrix>>(name);
+        if (!list) continue;
+        double const times = std::string(name) == "WeightScore" ? 1.0 : groups;
+        for (auto const& matrix : *list) add(matrix, times);
+    }
+}
+
 }  // namespace
 
 FrameWork frameWork(std::string const& model, std::string const& file, int rate) {
@@ -81,23 +101,18 @@ FrameWork frameWork(std::string const& model, std::string const& file, int rate)
     std::wstring const path = (modelFolder() / file).wstring();
     if (!weight.read(MORVA::UTILS::Path(path.c_str()))) std::exit(1);
     FrameWork work{model, rate, 0, 0.0, 0.0};
-    auto const add = [&](Matrix const& matrix) {
+    double products = 0.0;
+    forEachMatrix(weight, [&](Matrix const& matrix, double times) {
+        auto const size = static_cast<double>(matrix.data.size());
         work.parameters += matrix.data.size();
-        work.weightBytes += packedBytes(matrix);
-    };
-    for (char const* name : {"WeightGRU", "WeightGRU_reset"}) {
-        if (auto const matrix = weight.values().find<Matrix>(name)) add(*matrix);
-    }
-    for (char const* name : {"WeightLinear", "WeightNonLinear"}) {
-        if (auto const list = weight.values().find<std::vector<Matrix>>(name)) {
-            std::ranges::for_each(*list, add);
-        }
-    }
+        work.weightBytes += times > 1.0 ? sizeof(float) * size : packedBytes(matrix);
+        if (times > 1.0) products += times * size;  // what runs once hides behind the reading
+    });
     auto const [modelRate, frameMs] = weight.getWeightInfo();
     double const hopsPerFrame = 10.0 / (static_cast<double>(frameMs) / 2.0);
     double const points = static_cast<double>(modelRate) * static_cast<double>(frameMs) / 1000.0;
     work.weightBytes *= hopsPerFrame;
-    work.operations = hopsPerFrame * 2.0 * transformOperations(points) +
+    work.operations = hopsPerFrame * 2.0 * (transformOperations(points) + products) +
                       resamplerOperations(rate, modelRate) + resamplerOperations(modelRate, rate);
     return work;
 }

@@ -1,7 +1,7 @@
 // The least that a frame could cost on this machine: every weight read once at the measured
-// bandwidth, and the transforms' and resamplers' operations at the measured peak rate. What it
-// leaves out: logarithms, exponentials, statistics, copies, and the products of the network, which
-// hide behind the reading.
+// bandwidth, and the operations of transforms, resamplers and layers that many groups of bands run
+// through at the measured peak rate. What it leaves out: logarithms, exponentials, statistics,
+// copies, and the products of other layers, which hide behind the reading.
 #pragma once
 
 #include <cstddef>
@@ -15,7 +15,7 @@ struct FrameWork {
     int rate;                // of the caller, hertz
     std::size_t parameters;  // of the network's matrices
     double weightBytes;      // as laid out for the products, per frame of 10 ms
-    double operations;       // transforms and resamplers, per frame of 10 ms
+    double operations;       // transforms, resamplers, shared layers, per frame of 10 ms
 };
 
 // What one frame of the model in `file` needs. Its own rate decides whether it is resampled.

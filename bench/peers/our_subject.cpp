@@ -1,5 +1,6 @@
 // The engine as a subject of the comparison.
 #include <algorithm>
+#include <cstdlib>
 #include <filesystem>
 #include <utility>
 
@@ -22,6 +23,22 @@ private:
     static std::size_t frameSize(int rate) { return static_cast<std::size_t>(rate / 100); }
     Session session_;
     std::vector<float> frame_;
+};
+
+class OurVoice final : public Subject {
+public:
+    explicit OurVoice(int rate)
+        : handle_(Morva_VAD_CreateSession(static_cast<MorvaSamplingRate>(rate), MORVA_FRAME_10_MS,
+                                          "default_VAD")),
+          length_(static_cast<unsigned>(rate / 100)) {
+        if (handle_ == nullptr) std::exit(1);
+    }
+    ~OurVoice() override { Morva_VAD_CloseSession(handle_); }
+    void frame(float const* samples) override { Morva_VAD_FrameFloat(handle_, samples, length_); }
+
+private:
+    void* handle_;
+    unsigned length_;
 };
 
 int rateOf(std::string const& model) {
@@ -52,6 +69,9 @@ void addOurs(Contestants& all, std::vector<std::string> const& files) {
     }
     for (auto const& [model, rate] : places) {
         all.push_back({"this engine, " + model, rate, std::make_unique<Ours>(model.c_str(), rate)});
+    }
+    for (int const rate : {8000, 48000}) {
+        all.push_back({"this engine, default_VAD", rate, std::make_unique<OurVoice>(rate)});
     }
 }
 

@@ -23,7 +23,7 @@ struct Contestant {
 using Contestants = std::vector<Contestant>;
 
 // The shipped noise models and those of the given weight files, each at its own rate and at 48000
-// Hz.
+// Hz, and the voice-activity model.
 void addOurs(Contestants& all, std::vector<std::string> const& files);
 // These print a line and add nothing when the peer was not there at build time.
 void addSpeexDsp(Contestants& all);

@@ -3,8 +3,8 @@
     python bench/quality/spectrograms.py --store STORE --out docs/examples models/c6.xs.f.ca03f4.mvw
     python bench/quality/spectrograms.py --store STORE --out docs/images --only office models/c6.xs.f.ca03f4.mvw
 
-Speech and noise are held-out material; the whisper is synthesised by espeak-ng. Prints for every
-example the numbers that stand in its title.
+Speech and noise are held-out material, at the store's rate; the whisper is synthesised by espeak-ng.
+Prints for every example the numbers that stand in its title.
 """
 
 from __future__ import annotations
@@ -22,7 +22,7 @@ import metrics
 import mixtures
 import pictures
 import systems
-from morva_training.corpus import BASE_RATE, Corpus
+from morva_training.corpus import Corpus
 from morva_training.measures import si_sdr
 
 SECONDS = 6
@@ -57,16 +57,17 @@ class Material:
     def __init__(self, store: Path, seed: int) -> None:
         self.corpus = Corpus(store)
         self.rng = np.random.default_rng(seed)
-        self.count = SECONDS * BASE_RATE
+        self.rate = self.corpus.rate
+        self.count = SECONDS * self.rate
 
     def fitted(self, samples: np.ndarray) -> np.ndarray:
         return np.tile(samples, -(-self.count // len(samples)))[: self.count]
 
     def talk(self, talker: str) -> np.ndarray:
-        clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 3 * BASE_RATE and talker in c.path]
+        clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 3 * self.rate and talker in c.path]
         clip = clips[self.rng.integers(len(clips))]
         out = np.zeros(self.count, np.float32)
-        start = BASE_RATE
+        start = self.rate
         samples = self.corpus.read(clip)[: self.count - start]
         out[start : start + len(samples)] = samples
         return out
@@ -80,22 +81,22 @@ class Material:
             return float((power * np.arange(len(power))).sum() / power.sum() / len(power))
 
         loud = max(clips, key=lambda c: brightness(self.corpus.read(c)))
-        return self.fitted(np.concatenate([np.zeros(BASE_RATE, np.float32), self.corpus.read(loud)]))
+        return self.fitted(np.concatenate([np.zeros(self.rate, np.float32), self.corpus.read(loud)]))
 
     def whisper(self, _talker: str) -> np.ndarray:
         with tempfile.NamedTemporaryFile(suffix=".wav") as file:
             text = "Nobody in the room should hear what I am telling you now."
             subprocess.run(["espeak-ng", "-v", "en+whisper", "-s", "140", "-w", file.name, text], check=True)
             samples, rate = soundfile.read(file.name, dtype="float32")
-        samples = metrics.at_rate(samples, rate, BASE_RATE) * 32768.0
-        return self.fitted(np.concatenate([np.zeros(BASE_RATE), samples, np.zeros(BASE_RATE)]).astype(np.float32))
+        samples = metrics.at_rate(samples, rate, self.rate) * 32768.0
+        return self.fitted(np.concatenate([np.zeros(self.rate), samples, np.zeros(self.rate)]).astype(np.float32))
 
     def disturbance(self, category: str, recording: str) -> np.ndarray:
         if category == "babble":
-            clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 2 * BASE_RATE]
+            clips = [c for c in self.corpus.clips("speech", "heldout") if c.length > 2 * self.rate]
             chosen = self.rng.choice(len(clips), 6, replace=False)
             voices = [self.fitted(self.corpus.read(clips[i])) for i in chosen]
-            return np.sum([mixtures.scaled(v, 1.0, BASE_RATE) for v in voices], axis=0)
+            return np.sum([mixtures.scaled(v, 1.0, self.rate) for v in voices], axis=0)
         clips = [c for c in self.corpus.groups("noise", "heldout")[category] if recording in c.path]
         return self.fitted(self.corpus.read(max(clips, key=lambda c: c.length)))
 
@@ -104,11 +105,11 @@ def mixture(material: Material, example: Example) -> tuple[np.ndarray, np.ndarra
     """Noisy and clean, -1..1."""
     voice = {"": material.talk, "whisper": material.whisper, "shout": material.shout}[example.voice](example.talker)
     level = 10 ** ((-14 if example.voice == "shout" else -24) / 20)
-    voice = mixtures.scaled(voice, level, BASE_RATE)
+    voice = mixtures.scaled(voice, level, material.rate)
     if not example.noise:
         return voice, voice
     noise = material.disturbance(example.noise, example.recording)
-    noise = mixtures.scaled(noise, level * 10 ** (-example.snr_db / 20), BASE_RATE)
+    noise = mixtures.scaled(noise, level * 10 ** (-example.snr_db / 20), material.rate)
     return np.clip(voice + noise, -1, 1).astype(np.float32), voice
 
 
@@ -126,11 +127,12 @@ def main() -> None:
     for number, example in enumerate((*EXAMPLES, README)):
         if example.name not in wanted:
             continue
-        noisy, clean = mixture(Material(args.store, args.seed + number), example)
-        result = process(noisy, BASE_RATE, example.name)
+        material = Material(args.store, args.seed + number)
+        (noisy, clean), rate = mixture(material, example), material.rate
+        result = process(noisy, rate, example.name)
         before, after = si_sdr(clean, noisy), si_sdr(clean, result)
-        quality = [metrics.pesq_score(clean, x, BASE_RATE) for x in (noisy, result)]
-        pause = metrics.pause_attenuation(clean, noisy, result, BASE_RATE)
+        quality = [metrics.pesq_score(clean, x, rate) for x in (noisy, result)]
+        pause = metrics.pause_attenuation(clean, noisy, result, rate)
         title = f"{example.name}: PESQ {quality[0]:.2f} to {quality[1]:.2f}"
         if example.noise:
             title += f", SI-SDR {before:.1f} to {after:.1f} dB"
@@ -138,7 +140,7 @@ def main() -> None:
         else:
             title += f", SI-SDR {after:.1f} dB"
         size, words = ((10, 6), "") if example is README else ((6.4, 4.2), title)
-        pictures.draw(args.out / f"{example.name}.png", {"Before": noisy, "After": result}, BASE_RATE, size, words)
+        pictures.draw(args.out / f"{example.name}.png", {"Before": noisy, "After": result}, rate, size, words)
         print(title)
 
 

@@ -78,8 +78,11 @@ def constant_mask(mask: int = 1, name: str = "NC_small_16k.mvw") -> dict:
     """A cleaner or a noise-level model whose mask is 0 or 1 in all bins but the topmost, whatever it hears."""
     values = mvw.read(SOURCE / "models" / name)
     values["TimeStamp"] = b"%d" % mask  # by which the engine tells models apart
-    values["WeightNonLinear"][-1][:] = 0
-    values["BaesNonLinear"][-1][:] = 100 if mask else -100
+    weights, biases = values.get("WeightNonLinear", [])[-1:], values.get("BaesNonLinear", [])[-1:]
+    if "WeightOutput" in values:
+        weights, biases = [values["WeightOutput"]], [values["BiasOutput"]]
+    weights[0][:] = 0
+    biases[0][:] = 100 if mask else -100
     return values
 
 

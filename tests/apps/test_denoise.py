@@ -150,7 +150,7 @@ def test_the_shipped_model_follows_the_rate(morva, recording, tmp_path, name, ra
         assert name + ".mvw" in morva("denoise", source, tmp_path / "o.wav", "--models", SOURCE / "models").stderr
 
 
-@pytest.mark.parametrize("text", ["MORVA_VOLUME_UP_v0_0_6 TRUE\nMORVA_VOLUME_UP_PERCENT_v0_0_6 100\n", ""])
+@pytest.mark.parametrize("text", ["MORVA_VOLUME_UP_v1_0_0 TRUE\nMORVA_VOLUME_UP_PERCENT_v1_0_0 100\n", ""])
 @pytest.mark.parametrize("option", ["--model", "--control"])
 def test_control_files(morva, model, recording, tmp_path, option, text):
     """Laid over a weight, or naming one beside themselves, wherever one stands."""

@@ -53,8 +53,8 @@ struct Row {
 // clang-format off
 constexpr Row kRows[] = {
     {"NC_small_8k", Kind::cleaned, 44100, 24, {0xb2d417f349503c75, 0x5307c6bea9b7cb77}},
-    {"NC_small_16k", Kind::cleaned, 16000, 24, {0x29ab39b542b562c0, 0xb77a5d7a541164d9}},
-    {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xef25d1da53ebb0b8, 0xf765ea975aa6b1a9}},
+    {"NC_small_16k", Kind::cleaned, 16000, 24, {0x812be6bac0895df3, 0x0870f09c1bdba6a7}},
+    {"c6.xs.f.ca03f4", Kind::cleaned, 48000, 12, {0xc2502577d3789c3f, 0x4c821237df77bbec}},
     {"VAD_weight", Kind::voice, 48000, 6, {0x7b28db1de01a0189, 0xf3eb574eb70f1add}},
     {"noise_level_16k", Kind::level, 44100, 24, {0x75f55f692177e961, 0x183d76b196a9fd28}},
     {"NC_1.0.0", Kind::cleaned, 16000, 12, {0x0cdc00e9c16db94c, 0xef3e82002c928da9}},

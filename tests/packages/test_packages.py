@@ -56,7 +56,7 @@ def recording(tmp_path_factory):
     """A noisy recording, and what the command makes of it; machines without it bring the result along. At the full
     model's rate no delay is a part of a sample."""
     noisy, clean = tmp_path_factory.mktemp("sound") / "noisy.wav", PACKAGES / "clean.wav"
-    soundfile.write(noisy, soundfile.read(ROOT / "examples/audio/noisy.flac", 96000)[0], 32000, subtype="PCM_16")
+    soundfile.write(noisy, soundfile.read(ROOT / "examples/audio/noisy.flac", 144000)[0], 48000, subtype="PCM_16")
     if COMMAND.exists():
         run(COMMAND, "denoise", "-q", noisy, clean)
     return noisy, soundfile.read(clean)[0]

@@ -29,10 +29,10 @@ def test_sounds_of_every_kind_are_the_command_lines(command, speech, write, tmp_
         clean = morva.denoise(sound, rate, frame_ms=ms)
         assert clean.dtype == sound.dtype
         scale = 32768 if sound is pcm else 1
-        if rate in (8000, 16000, 32000, 96000):  # elsewhere the command line takes out a part of a sample, too
+        if rate in (8000, 16000, 48000, 96000):  # elsewhere the command line takes out a part of a sample, too
             np.testing.assert_allclose(clean / scale, wanted, rtol=0, atol=tolerance / 32768)
         for ours, theirs in zip(clean.T, wanted.T):
-            assert np.corrcoef(ours, theirs)[0, 1] > 0.95
+            assert np.corrcoef(ours, theirs)[0, 1] > 0.9
     for measure in (morva.voice, morva.noise_level):
         as_float = measure(pcm / 32768, rate, frame_ms=ms)
         np.testing.assert_array_equal(measure(pcm, rate, frame_ms=ms), as_float)
@@ -92,7 +92,7 @@ def test_limit_and_bypass(speech):
 
 
 def test_files(command, speech, write, tmp_path):
-    path = write("in.wav", np.stack([speech, speech[::-1]], axis=1), 32000, "PCM_24")
+    path = write("in.wav", np.stack([speech, speech[::-1]], axis=1), 48000, "PCM_24")
     morva.denoise_file(path, tmp_path / "ours.flac")
     command("denoise", "-q", path, tmp_path / "theirs.flac")
     ours, wanted = (soundfile.SoundFile(tmp_path / f"{n}.flac") for n in ("ours", "theirs"))

@@ -133,7 +133,7 @@ WIDENED = replace(
     overload_share=0.03,
     codec_share=0.12,
 )
-TALKERS = replace(WIDENED, far_share=0.15, soft_share=0.1)
+TALKERS = replace(WIDENED, far_share=0.15, soft_share=0.1, clean_share=0.14)
 RECIPES = {"plain": PLAIN, "noise": MORE_NOISE, "rooms": MORE_ROOMS, "widened": WIDENED, "talkers": TALKERS}
 
 

@@ -74,7 +74,7 @@ test('every rate, duration and kind of memory, in place and apart', () => {
 test('frames that are none', () => {
   const canceller = new NoiseCanceller(OPTIONS);
   const detector = new VoiceActivityDetector(OPTIONS);
-  assert.equal(new NoiseCanceller({ sampleRate: 32000, frameMs: 10 }).latency, 320);
+  assert.equal(new NoiseCanceller({ sampleRate: 48000, frameMs: 10 }).latency, 480);
   const frame = new Int16Array(160);
   const detached = new Int16Array(160);
   structuredClone(detached.buffer, { transfer: [detached.buffer] });
@@ -132,7 +132,7 @@ test('floating point, limit, bypass and meters', () => {
   const scores = [sound, floats(sound)].map((kind) => detector.process(kind.slice(0, 160)));
   for (const score of [session.voiceScore, ...scores])
     assert.ok(score >= 0 && score <= 1, `${score}`);
-  assert.ok(session.noiseLevel < 20, 'at that limit nothing is removed');
+  assert.ok(session.noiseLevel > 40, 'noise is heard, whatever is removed');
 });
 
 test('blocks of any length, and streams of any chunks, give what frames give', async () => {
