@@ -30,7 +30,7 @@ struct Settings {
 // Of the newest frame and its loudest channel.
 struct Meters {
     float voice = 0.0F;      // 0..1
-    float levelDb = -60.0F;  // of the removed noise, as noise-level sessions report it
+    float levelDb = -60.0F;  // of the noise, as noise-level sessions report it
 };
 
 class StreamAdapter {
