@@ -37,7 +37,10 @@ OFFSET, SYMMETRIC, ASYMMETRIC = 4.41, 0.107, 0.0547
 SPOKEN_DB, SPOKEN_RANGE_DB = -40.0, 10.0  # below a band's loud moments nothing is missed; how that comes up
 MOST_LOST_DB = 30.0
 AUDIBLE = 1e-4  # of a band's mean power
-INAUDIBLE = 1e-7, 1e-20  # power beside unit speech that the results of a filter and of masks have at least
+FAINTEST, FAINTEST_FILTERED = (
+    1e-20,
+    1e-7,
+)  # power beside unit speech that results of masks and of a filter have at least
 PREDICTION_ORDER, PREDICTION_FLOOR_DB, UNLIKELIEST = 16, -45.0, 2.0
 
 
@@ -223,12 +226,12 @@ def result_of(log_gain: Tensor, batch: Batch, factors: Tensor | None) -> tuple[T
     """|Y|^2 and Re(Y S*) of what the masks make of X, and on the lowest bins the filter's factors [B, T, taps, bins]
     of the frames that it spans."""
     gain = log_gain.exp()
-    after, product = gain.square() * batch.noisy_power + INAUDIBLE[1], gain * batch.product
+    after, product = gain.square() * batch.noisy_power + FAINTEST, gain * batch.product
     if factors is None:
         return after, product
     low = factors.shape[-1]
     y = gain[..., :low] * batch.heard[:, :, batch.ahead] + (factors * batch.heard).sum(2)
-    both = power_of(y) + INAUDIBLE[0], y.real * batch.speech.real + y.imag * batch.speech.imag
+    both = power_of(y) + FAINTEST_FILTERED, y.real * batch.speech.real + y.imag * batch.speech.imag
     return tuple(torch.cat([part, whole[..., low:]], -1) for part, whole in zip(both, (after, product)))
 
 

@@ -165,8 +165,6 @@ def compress_bands(power: Tensor, layout: Layout) -> Tensor:
 def earlier_frames(spectra: Tensor, taps: int) -> Tensor:
     """[B, T, taps, bins]: each frame and those before it, turned as a tone in the middle of its bin goes on."""
     bins = torch.arange(spectra.shape[-1], device=spectra.device)
-    if not taps:
-        return spectra[:, :, None][:, :, :0]
     padded = torch.cat([spectra.new_zeros(len(spectra), taps - 1, spectra.shape[-1]), spectra], 1)
     frames = padded.unfold(1, taps, 1).flip(-1).transpose(-1, -2)
     turned = 1 - 2 * (bins * torch.arange(taps, device=spectra.device)[:, None] % 2)

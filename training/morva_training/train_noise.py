@@ -163,6 +163,8 @@ def parse(arguments: list[str] | None = None) -> argparse.Namespace:
         parser.error(f"{args.model} is {'no' if args.band_shared else 'only a'} --band-shared model")
     if args.out and (args.taps or args.ahead or args.kernels):
         parser.error("the engine has no filter, look-ahead or mixed kernels: they are there to be compared")
+    if args.on_device and RECIPES[args.recipe].far_share:
+        parser.error("talkers in the background are mixed by --workers")
     if args.on_device and args.model == "48k":
         parser.error("a pool holds 32 kHz: 48k is mixed by --workers")
     return args
