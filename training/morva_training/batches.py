@@ -55,9 +55,9 @@ class Batch:
         cut = slice(0, noisy.shape[1] - layout.ahead)
         labels = {key: waves[key][:, cut] for key in ("voice", "voice_weight") if key in waves}
         if layout.taps:
-            low = (spectra[..., : layout.filtered] * scale.sqrt() for spectra in (noisy, speech))
-            labels["heard"] = earlier_frames(next(low), layout.taps)[:, layout.ahead :]
-            labels["speech"] = next(low)[:, cut]
+            low = slice(0, layout.filtered)
+            labels["heard"] = earlier_frames(noisy[..., low] * scale.sqrt(), layout.taps)[:, layout.ahead :]
+            labels["speech"] = (speech[..., low] * scale.sqrt())[:, cut]
         return Batch(
             features=features_of(noisy, gains, layout)[:, layout.ahead :],
             noisy_power=(noisy_power * scale + SILENCE)[:, cut],
